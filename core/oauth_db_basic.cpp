@@ -1,0 +1,467 @@
+#include "core/oauth_db_basic.h"
+
+#include <sqlite3.h>
+#include <syslog.h>
+
+#include <cstdint>
+#include <exception>
+#include <string>
+#include <utility>
+
+#include "core/clauses.h"
+#include "core/connection.h"
+#include "core/schema.h"
+#include "core/secrets.h"
+#include "utils/decimal.h"
+#include "utils/diagnostics.h"
+#include "utils/oauth_names.h"
+#include "utils/sql_text.h"
+
+namespace KELDOAUTHSERVER {
+namespace {
+
+constexpr char kSource[] = "oauth_db_basic";
+
+// Row callbacks -------------------------------------------------------------
+
+/// What SQLite is given to carry to runRowCallback.
+struct RowCall {
+  OAUTHDBBasic::RowCallback callback;
+  void* arg;
+  std::exception_ptr thrown;
+};
+
+/// Parks an exception of the callback: none may cross SQLite's own frames.
+int runRowCallback(void* arg, int count, char** values, char** columns) {
+  auto& call = *static_cast<RowCall*>(arg);
+  try {
+    return call.callback(call.arg, count, values, columns);
+  } catch (...) {
+    call.thrown = std::current_exception();
+    return SQLITE_ABORT;
+  }
+}
+
+const char* textOf(const char* value) {
+  return value != nullptr ? value : "";
+}
+
+void dumpRow(int line, int count, char** values, char** columns) {
+  if (!isTraced(kRowDump)) return;
+  for (int i = 0; i < count; ++i) {
+    syslog(LOG_ERR, "%s:%d ##### [%d][%s = %s]", kSource, line, i, columns[i], textOf(values[i]));
+  }
+}
+
+void logUnexpected(const char* source, int line, const char* what) {
+  syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", source, line, what);
+}
+
+/// The end of a static operation that has no object to keep an error.
+int failWithoutObject(int line) noexcept {
+  try {
+    throw;
+  } catch (const std::exception& thrown) {
+    logUnexpected(kSource, line, thrown.what());
+  } catch (...) {
+    logUnexpected(kSource, line, "unknown");
+  }
+  return 0;
+}
+
+}  // namespace
+
+// Opening and closing ---------------------------------------------------------
+
+OAUTHDBBasic::OAUTHDBBasic() {
+  Open();
+  DBInit();
+}
+
+OAUTHDBBasic::~OAUTHDBBasic() {
+  if (db_ == nullptr) return;
+
+  const int result = closeConnection(kSource, db_);
+  if (result != SQLITE_OK) {
+    syslog(LOG_ERR, "%s:%d Close DB failed!![%d]", kSource, __LINE__, result);
+  }
+}
+
+void OAUTHDBBasic::Open() try {
+  const int result = openConnection(kSource, db_);
+  if (result == SQLITE_OK) return;
+
+  errCode_ = result;
+  errMsg_ = errors::kOpenFailed;
+  syslog(LOG_ERR, "%s:%d Open DB failed!![%d]", kSource, __LINE__, result);
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+}
+
+// The last error --------------------------------------------------------------
+
+int OAUTHDBBasic::GetErrCode() const {
+  return errCode_;
+}
+
+void OAUTHDBBasic::SetErrCode(int code) {
+  errCode_ = code;
+}
+
+std::string OAUTHDBBasic::GetErrMsg() const try { return errMsg_; } catch (const std::exception&) {
+  return {};
+}
+
+void OAUTHDBBasic::SetErrMsg(const std::string& msg) try { errMsg_ = msg; } catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+}
+
+bool OAUTHDBBasic::Fail(const OAUTHError& error) {
+  errCode_ = error.code;
+  errMsg_ = error.message;
+  return false;
+}
+
+bool OAUTHDBBasic::FailUnexpectedly(const char* source, int line) noexcept {
+  try {
+    try {
+      throw;
+    } catch (const Json::LogicError&) {
+      return Fail(errors::kBadParameters);
+    } catch (const std::exception& thrown) {
+      logUnexpected(source, line, thrown.what());
+    } catch (...) {
+      logUnexpected(source, line, "unknown");
+    }
+    return Fail({SQLITE_NOMEM, sqlite3_errstr(SQLITE_NOMEM)});
+  } catch (...) {
+    errMsg_.clear();  // no room even for the message: the code says it all
+    return false;
+  }
+}
+
+// The table -------------------------------------------------------------------
+
+std::string OAUTHDBBasic::GetTabName() const try {
+  return tabName_;
+} catch (const std::exception&) {
+  return {};
+}
+
+void OAUTHDBBasic::SetTabName(const std::string& name) try { tabName_ = name; } catch (...) {
+  ready_ = 0;
+  FailUnexpectedly(kSource, __LINE__);
+}
+
+// Running statements ----------------------------------------------------------
+
+int OAUTHDBBasic::DBCmd(const std::string& sql, RowCallback callback, Json::Value* arg) {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  if (db_ == nullptr || ready_ == 0) {
+    syslog(LOG_ERR, "%s:%d DB is not ready!!", kSource, __LINE__);
+    return 0;
+  }
+  return DBCmdRun(sql, callback, arg);
+}
+
+int OAUTHDBBasic::DBCmdRun(const std::string& sql, RowCallback callback, Json::Value* arg) try {
+  if (isTraced(kCoreTrace)) {
+    syslog(LOG_ERR, "%s:%d ==> %s[%s]", kSource, __LINE__, __func__, sql.c_str());
+  }
+  RowCall call{callback, arg, nullptr};
+  char* text = nullptr;
+  const int result =
+      sqlite3_exec(db_, sql.c_str(), callback != nullptr ? runRowCallback : nullptr, &call, &text);
+  const SqliteText reason(text);
+  if (call.thrown != nullptr) std::rethrow_exception(call.thrown);
+  if (result == SQLITE_OK) return 1;
+
+  // SQLite has no text where it had no connection or no memory for one.
+  errCode_ = result;
+  errMsg_ = reason != nullptr ? reason.get() : sqlite3_errstr(result);
+  syslog(LOG_ERR, "%s:%d Run Command failed!![%s][%d]", kSource, __LINE__, errMsg_.c_str(), result);
+  return 0;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::TabCountCallback(void* arg, int /*count*/, char** values, char** /*columns*/) {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  static_cast<Json::Value*>(arg)->append(textOf(values[0]));
+  return 0;
+}
+
+int OAUTHDBBasic::IsTabExistCallback(void* arg, int count, char** values, char** columns) {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  dumpRow(__LINE__, count, values, columns);
+  (*static_cast<Json::Value*>(arg))[names::kExist] = true;
+  return 0;
+}
+
+int OAUTHDBBasic::TabGetCallback(void* arg, int count, char** values, char** columns) {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  dumpRow(__LINE__, count, values, columns);
+
+  Json::Value row(Json::objectValue);
+  for (int i = 0; i < count; ++i) row[columns[i]] = textOf(values[i]);
+  if (!decryptSecrets(kSource, row)) {
+    syslog(LOG_ERR, "%s:%d Decrypt data failed", kSource, __LINE__);
+  }
+  static_cast<Json::Value*>(arg)->append(std::move(row));
+  return 0;
+}
+
+// Schema ----------------------------------------------------------------------
+
+int OAUTHDBBasic::DBInit() try {
+  ready_ = 0;
+  if (db_ == nullptr) return ready_;
+
+  if (isTraced(kCoreTrace)) {
+    syslog(LOG_ERR, "%s:%d ==> %s[init meta table]", kSource, __LINE__, __func__);
+  }
+  if (IsDBTabExist(names::kMetaTable) == 0) {
+    if (CreateDBTab(schema::kCreateMeta) == 0) {
+      syslog(LOG_ERR, "%s:%d Create Table failed!![meta]", kSource, __LINE__);
+      return ready_;
+    }
+    AddMetaData();
+  }
+  for (const schema::Step& step : schema::kSteps) {
+    if (isTraced(step.mask)) {
+      syslog(LOG_ERR, step.trace, kSource, __LINE__, __func__);
+    }
+    if (CreateDBTab(step.statement) == 0) {
+      syslog(LOG_ERR, "%s:%d Create Table failed!![%s]", kSource, __LINE__, step.table);
+      return ready_;
+    }
+  }
+  ready_ = 1;
+  return ready_;
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+  return ready_;
+}
+
+void OAUTHDBBasic::AddMetaData() try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  for (const char* table : schema::kVersionedTables) {
+    const std::string sql = std::string("INSERT INTO ") + names::kMetaTable +
+                            "(tab_name, version) VALUES('" + table + "', " + schema::kVersion +
+                            ");";
+    if (DBCmdRun(sql, nullptr, nullptr) == 0) {
+      syslog(LOG_ERR, "%s:%d Add Meta failed", kSource, __LINE__);
+    }
+  }
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::CreateDBTab(const std::string& statement) try {
+  if (DBCmdRun(statement, nullptr, nullptr) == 0) return Fail(errors::kCreateTableFailed);
+  if (isTraced(kCoreTrace)) {
+    syslog(LOG_ERR, "%s:%d Create tab success", kSource, __LINE__);
+  }
+  return 1;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::IsDBTabExist(const std::string& name) try {
+  Json::Value found;
+  found[names::kExist] = false;
+  const std::string sql = "SELECT * FROM sqlite_master WHERE name='" + name + "' and type='table';";
+  if (DBCmdRun(sql, IsTabExistCallback, &found) == 0 || !found[names::kExist].asBool()) return 0;
+
+  if (isTraced(kCoreTrace)) {
+    syslog(LOG_ERR, "%s:%d Tab[%s] is exist", kSource, __LINE__, name.c_str());
+  }
+  return 1;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::DBGetRowCount(Json::Value& result) try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  result = Json::Value(Json::arrayValue);
+  const int status = DBCmd("SELECT COUNT(*) FROM " + tabName_ + ";", TabCountCallback, &result);
+  if (status == 0) {
+    syslog(LOG_ERR, "%s:%d Get Row Count failed[%s]", kSource, __LINE__, tabName_.c_str());
+  }
+  return status;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::DBCheckRowMax(unsigned long max) try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  Json::Value counts;
+  if (DBGetRowCount(counts) == 0) {
+    syslog(LOG_ERR, "%s:%d Check Row Max failed[%s]", kSource, __LINE__, tabName_.c_str());
+    return 0;
+  }
+  const unsigned long count = static_cast<std::uint32_t>(decimalValue(counts[0U]));
+  if (isTraced(kStoreTrace)) {
+    syslog(LOG_ERR, "%s:%d Table Row Count[%lu]", kSource, __LINE__, count);
+  }
+  return count < max ? 1 : 0;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::DBDrop() try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  const int status = DBCmdRun("DROP TABLE IF EXISTS " + tabName_ + ";", nullptr, nullptr);
+  if (status == 0 && isTraced(kStoreTrace)) {
+    syslog(LOG_ERR, "%s:%d Drop [%s] failed", kSource, __LINE__, tabName_.c_str());
+  }
+  return status;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+// Request documents to SQL ----------------------------------------------------
+//
+// What is returned in place of a clause is short enough to need no memory, and
+// SQLite refuses the statement that it would stand in.
+
+std::string OAUTHDBBasic::GetInsertParam(const Json::Value& row) try {
+  return insertClause(kSource, row);
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+  return {};
+}
+
+std::string OAUTHDBBasic::ConcateParam(const Json::Value& pairs, const std::string& separator) try {
+  return joinPairs(kSource, pairs, separator);
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+  return {};
+}
+
+std::string OAUTHDBBasic::GetConditionParam(const Json::Value& condition) try {
+  return conditionClause(kSource, condition);
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+  return " WHERE ";
+}
+
+std::string OAUTHDBBasic::GetUpdateParam(const Json::Value& request) try {
+  return updateClause(kSource, request);
+} catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+  return " SET ";
+}
+
+// Rows ------------------------------------------------------------------------
+
+bool OAUTHDBBasic::DBAdd(Json::Value& row) try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  if (!isPairs(row)) return Fail(errors::kBadParameters);
+  if (!encryptSecrets(kSource, row)) return Fail(errors::kEncryptFailed);
+
+  if (DBCmd("INSERT INTO " + tabName_ + insertClause(kSource, row) + ";", nullptr, nullptr) == 0) {
+    syslog(LOG_ERR, "%s:%d Add failed[%s]", kSource, __LINE__, tabName_.c_str());
+    return false;
+  }
+  if (isTraced(kStoreTrace)) {
+    syslog(LOG_ERR, "%s:%d [%s] Add success, changed[%d]", kSource, __LINE__, tabName_.c_str(),
+           sqlite3_changes(db_));
+  }
+  return true;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+bool OAUTHDBBasic::DBGet(Json::Value& request, Json::Value* result) try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  const Json::Value& asked = request;
+  if (result == nullptr || !isRequest(asked) || !isPairs(asked[names::kCondition]) ||
+      !hasText(asked[names::kConditionLike]) || !hasText(asked[names::kOption])) {
+    return Fail(errors::kBadParameters);
+  }
+  if (!encryptSecrets(kSource, request[names::kCondition])) return Fail(errors::kDecryptFailed);
+
+  *result = Json::Value(Json::arrayValue);
+  std::string sql = "SELECT * FROM " + tabName_;
+  sql += asked.isMember(names::kConditionLike) ? " WHERE " + asked[names::kConditionLike].asString()
+                                               : conditionClause(kSource, asked[names::kCondition]);
+  sql += " " + asked[names::kOption].asString() + ";";
+
+  if (DBCmd(sql, TabGetCallback, result) == 0) {
+    syslog(LOG_ERR, "%s:%d Get failed[%s]", kSource, __LINE__, tabName_.c_str());
+    return false;
+  }
+  if (isTraced(kStoreTrace)) {
+    syslog(LOG_ERR, "%s:%d ClientInfo Get Done", kSource, __LINE__);
+  }
+  return true;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+bool OAUTHDBBasic::DBEdit(Json::Value& request) try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  const Json::Value& asked = request;
+  if (!isRequest(asked) || !isPairs(asked[names::kCondition]) ||
+      !isPairs(asked[names::kModified])) {
+    return Fail(errors::kBadParameters);
+  }
+  if (!encryptSecrets(kSource, request[names::kCondition])) return Fail(errors::kEncryptFailed);
+  if (!encryptSecrets(kSource, request[names::kModified])) return Fail(errors::kEncryptFailed);
+
+  int changed = 0;
+  if (!RunChange("UPDATE " + tabName_ + updateClause(kSource, request) + ";", changed)) {
+    syslog(LOG_ERR, "%s:%d Edit failed[%s]", kSource, __LINE__, tabName_.c_str());
+    return false;
+  }
+  if (isTraced(kStoreTrace)) {
+    syslog(LOG_ERR, "%s:%d ClientInfo Edit success, changed[%d]", kSource, __LINE__, changed);
+  }
+  return true;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+bool OAUTHDBBasic::DBDel(Json::Value& request) try {
+  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  const Json::Value& asked = request;
+  if (!isRequest(asked) || !isPairs(asked[names::kCondition])) return Fail(errors::kBadParameters);
+  if (!encryptSecrets(kSource, request[names::kCondition])) return Fail(errors::kEncryptFailed);
+
+  int changed = 0;
+  const std::string clause = conditionClause(kSource, asked[names::kCondition]);
+  if (!RunChange("DELETE FROM " + tabName_ + clause + ";", changed)) {
+    syslog(LOG_ERR, "%s:%d Delete failed[%s]", kSource, __LINE__, tabName_.c_str());
+    return false;
+  }
+  if (isTraced(kStoreTrace)) {
+    syslog(LOG_ERR, "%s:%d ClientInfo Delete success, changed[%d]", kSource, __LINE__, changed);
+  }
+  return true;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+/// True when the statement ran and changed at least one row.
+bool OAUTHDBBasic::RunChange(const std::string& sql, int& changed) {
+  if (DBCmd(sql, nullptr, nullptr) == 0) return false;
+  changed = sqlite3_changes(db_);
+  return changed > 0;
+}
+
+// Encryption ------------------------------------------------------------------
+
+int OAUTHDBBasic::ParamEncrypt(Json::Value& doc) try {
+  return encryptSecrets(kSource, doc) ? 1 : 0;
+} catch (...) {
+  return failWithoutObject(__LINE__);
+}
+
+int OAUTHDBBasic::ParamDecrypt(Json::Value& doc) try {
+  return decryptSecrets(kSource, doc) ? 1 : 0;
+} catch (...) {
+  return failWithoutObject(__LINE__);
+}
+
+}  // namespace KELDOAUTHSERVER

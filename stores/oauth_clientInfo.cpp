@@ -1,0 +1,215 @@
+#include "stores/oauth_clientInfo.h"
+
+#include <syslog.h>
+
+#include <exception>
+
+#include "stores/oauth_log.h"
+#include "stores/store_support.h"
+#include "utils/diagnostics.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+#include "utils/sql_text.h"
+
+namespace KELDOAUTHSERVER {
+namespace {
+
+constexpr char kSource[] = "oauth_clientInfo";
+
+/// The numbers that this source's lines carry.
+enum Line : int {
+  kAddLine = 49,
+  kAddFullLine = 63,
+  kAddBadLine = 76,
+  kEditLine = 106,
+  kEditBadLine = 115,
+  kEnableLine = 130,
+  kDisableLine = 141,
+  kDelLine = 152,
+  kGetIndexLine = 162,
+  kGetByClientIdLine = 174,
+  kGetByClientIdBadLine = 180,
+  kGetByIdLine = 192,
+  kGetAllLine = 202,
+};
+
+constexpr char kEnabled[] = "1";
+constexpr char kDisabled[] = "0";
+
+void logBadParameters(Line line) {
+  syslog(LOG_ERR, "%s:%d Bad parameters", kSource, line);
+}
+
+std::string withoutScheme(const std::string& address) {
+  for (const std::string scheme : {"https://", "http://"}) {
+    if (address.compare(0, scheme.size(), scheme) == 0) return address.substr(scheme.size());
+  }
+  return address;
+}
+
+/// Whatever stops it, the application stays registered.
+void writeAuditEntry(OAUTHDBLog& log, const std::string& displayName) {
+  try {
+    log.Add("Application registed[" + displayName + "]");
+  } catch (const std::exception& thrown) {
+    syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", kSource, __LINE__, thrown.what());
+  }
+}
+
+Json::Value requestEnable(long long id, const char* enable) {
+  Json::Value request = requestById(id);
+  request[names::kModified][names::kEnable] = enable;
+  return request;
+}
+
+}  // namespace
+
+OAUTHDBClientInfo::OAUTHDBClientInfo(const std::string& tableName) {
+  SetTabName(tableName);
+}
+
+// Registration ----------------------------------------------------------------
+
+int OAUTHDBClientInfo::Add(const std::string& client_id, const std::string& client_secret,
+                           const std::string& redirect_uri, const std::string& scope,
+                           const std::string& display_name, const std::string& enable,
+                           Json::Value& out) try {
+  traceEntry(kStoreTrace, kSource, kAddLine, "Add");
+  OAUTHDBLog log(names::kLogTable);
+  const std::string address = withoutScheme(redirect_uri);
+
+  if (DBCheckRowMax(static_cast<unsigned long>(getTableRowMax(names::kClientInfoMax))) == 0) {
+    Fail(errors::kClientInfoFull);
+    syslog(LOG_ERR, "%s:%d ClientInfo Table is full", kSource, kAddFullLine);
+    return 0;
+  }
+  if (!fits(client_id, bounds::kIdentifier) || !fits(client_secret, bounds::kIdentifier) ||
+      !fits(address, bounds::kRedirectUri) || !fits(scope, bounds::kScope) ||
+      !fits(display_name, bounds::kDisplayName) || (enable != kEnabled && enable != kDisabled)) {
+    Fail(errors::kBadParameters);
+    logBadParameters(kAddBadLine);
+    return 0;
+  }
+
+  Json::Value row;
+  row[names::kEnable] = enable;
+  row[names::kClientId] = quoteSql(client_id);
+  row[names::kClientSecret] = quoteSql(client_secret);
+  row[names::kRedirectUri] = quoteSql(address);
+  row[names::kScope] = quoteSql(scope);
+  row[names::kDisplayName] = quoteSql(display_name);
+  row[names::kId] = Json::Value();
+
+  out[names::kClientId] = client_id;
+  out[names::kClientSecret] = client_secret;
+
+  if (!DBAdd(row)) return 0;
+  writeAuditEntry(log, display_name);
+  return 1;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Add(const std::string& redirect_uri, const std::string& scope,
+                           const std::string& display_name, Json::Value& out) try {
+  const std::string client_id = getRandomStr(kIdentifierLength);
+  const std::string client_secret = getRandomStr(kIdentifierLength);
+  return Add(client_id, client_secret, redirect_uri, scope, display_name, kEnabled, out);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Add(const std::string& client_secret, const std::string& redirect_uri,
+                           const std::string& scope, const std::string& display_name,
+                           Json::Value& out) try {
+  const std::string client_id = getRandomStr(kIdentifierLength);
+  return Add(client_id, client_secret, redirect_uri, scope, display_name, kEnabled, out);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+// Changes ---------------------------------------------------------------------
+
+int OAUTHDBClientInfo::Edit(long long id, const std::string& redirect_uri, const std::string& scope,
+                            const std::string& display_name) try {
+  traceEntry(kStoreTrace, kSource, kEditLine, "Edit");
+  if (!fits(redirect_uri, bounds::kRedirectUri) || !fits(scope, bounds::kScope) ||
+      !fits(display_name, bounds::kDisplayName)) {
+    Fail(errors::kBadParameters);
+    logBadParameters(kEditBadLine);
+    return 0;
+  }
+  Json::Value request = requestById(id);
+  Json::Value& modified = request[names::kModified];
+  modified[names::kRedirectUri] = quoteSql(redirect_uri);
+  modified[names::kScope] = quoteSql(scope);
+  modified[names::kDisplayName] = quoteSql(display_name);
+  return DBEdit(request);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Enable(long long id) try {
+  traceEntry(kStoreTrace, kSource, kEnableLine, "Enable");
+  Json::Value request = requestEnable(id, kEnabled);
+  return DBEdit(request);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Disable(long long id) try {
+  traceEntry(kStoreTrace, kSource, kDisableLine, "Disable");
+  Json::Value request = requestEnable(id, kDisabled);
+  return DBEdit(request);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Del(long long id) try {
+  traceEntry(kStoreTrace, kSource, kDelLine, "Del");
+  Json::Value request = requestById(id);
+  return DBDel(request);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+// Look-ups --------------------------------------------------------------------
+
+int OAUTHDBClientInfo::Get(const std::string& client_id, Json::Value* out) try {
+  traceEntry(kStoreTrace, kSource, kGetByClientIdLine, "Get");
+  if (!fits(client_id, bounds::kIdentifier)) {
+    Fail(errors::kBadParameters);
+    logBadParameters(kGetByClientIdBadLine);
+    return 0;
+  }
+  Json::Value request = requestBy(names::kClientId, quoteSql(client_id));
+  return DBGet(request, out);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::GetIndex(const std::string& client_id) try {
+  traceEntry(kStoreTrace, kSource, kGetIndexLine, "GetIndex");
+  Json::Value rows(Json::arrayValue);
+  return Get(client_id, &rows) != 0 ? firstId(rows) : 0;
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Get(long long id, Json::Value* out) try {
+  traceEntry(kStoreTrace, kSource, kGetByIdLine, "Get");
+  Json::Value request = requestById(id);
+  return DBGet(request, out);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBClientInfo::Get(Json::Value* out) try {
+  traceEntry(kStoreTrace, kSource, kGetAllLine, "Get");
+  Json::Value request;
+  return DBGet(request, out);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+}  // namespace KELDOAUTHSERVER

@@ -1,0 +1,12 @@
+#include "utils/decimal.h"
+
+#include <cstdlib>
+
+namespace KELDOAUTHSERVER {
+
+long long decimalValue(const Json::Value& value) {
+  if (value.isNull() || value.isArray() || value.isObject()) return 0;
+  return std::strtoll(value.asString().c_str(), nullptr, 10);
+}
+
+}  // namespace KELDOAUTHSERVER
