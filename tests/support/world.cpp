@@ -1,0 +1,100 @@
+#include "tests/support/world.h"
+
+#include <sqlite3.h>
+#include <sys/stat.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <thread>
+
+namespace support {
+namespace {
+
+namespace fs = std::filesystem;
+
+/// The library works on absolute paths: without private mounts over them a
+/// test would empty the state folder of the host.
+void requireSandbox(const std::string& stateDir) {
+  std::ifstream mounts("/proc/self/mountinfo");
+  for (std::string line; std::getline(mounts, line);) {
+    if (line.find(" " + stateDir + " ") != std::string::npos) return;
+  }
+  std::fprintf(stderr, "run this program through tests/support/sandbox.sh\n");
+  std::exit(2);
+}
+
+void empty(const char* folder) {
+  for (const auto& entry : fs::directory_iterator(folder)) fs::remove_all(entry.path());
+}
+
+int collectRow(void* rows, int count, char** values, char** columns) {
+  Row row;
+  for (int i = 0; i < count; ++i) row[columns[i]] = values[i] != nullptr ? values[i] : "<NULL>";
+  static_cast<std::vector<Row>*>(rows)->push_back(row);
+  return 0;
+}
+
+}  // namespace
+
+void World::SetUp() {
+  requireSandbox(kStateDir);
+  empty(kStateDir);
+  empty("/tmp");
+  Clock::release();
+  Platform::release();
+  FakeIds::release();
+  SystemLog::clear();
+  ::unsetenv("REMOTE_ADDR");
+}
+
+void World::TearDown() {
+  Clock::release();
+  Platform::release();
+  FakeIds::release();
+}
+
+void World::writeFile(const std::string& path, const std::string& text) {
+  std::ofstream(path, std::ios::binary) << text;
+}
+
+std::string World::readFile(const std::string& path) {
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+void World::writeSettings(const std::string& text) {
+  writeFile(kSettings, text);
+}
+
+void World::inFreshThread(const std::function<void()>& body) {
+  std::thread(body).join();
+}
+
+void World::withDiagnostics(int level, const std::function<void()>& body,
+                            const std::string& otherSettings) {
+  writeFile(kFlagFile, "");
+  writeSettings("{\"log_level\": " + std::to_string(level) +
+                (otherSettings.empty() ? "" : ", " + otherSettings) + "}");
+  inFreshThread(body);
+}
+
+std::vector<Row> World::sql(const std::string& statement) {
+  std::vector<Row> rows;
+  sqlite3* db = nullptr;
+  char* error = nullptr;
+  sqlite3_open(kDatabase, &db);
+  EXPECT_EQ(sqlite3_exec(db, statement.c_str(), collectRow, &rows, &error), SQLITE_OK)
+      << statement << ": " << (error != nullptr ? error : "");
+  sqlite3_free(error);
+  sqlite3_close(db);
+  return rows;
+}
+
+std::string World::sqlText(const std::string& statement) {
+  const std::vector<Row> rows = sql(statement);
+  return rows.empty() ? "" : rows.front().begin()->second;
+}
+
+}  // namespace support
