@@ -5,14 +5,18 @@
 #include <sys/types.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <ctime>
 #include <map>
 #include <optional>
+#include <string_view>
+#include <utility>
 
 #include "platform/keldcgi.h"
 #include "platform/keldcore.h"
+#include "tests/support/allocations.h"
 
 namespace support {
 namespace {
@@ -26,8 +30,9 @@ ClockState clockState;
 struct PlatformState {
   int encryptCallsLeft = -1;  // below 0: never fails
   int decryptCallsLeft = -1;
-  std::optional<std::string> remoteIp;
-  int remoteIpResult = 0;
+  Platform::Cipher encrypt;
+  Platform::Cipher decrypt;
+  Platform::Address address;
   std::vector<std::string> encrypted;
   std::vector<std::string> decrypted;
 };
@@ -39,6 +44,7 @@ struct IdState {
   gid_t egid = 0;
   std::map<uid_t, int> refusedUids;
   std::map<gid_t, int> refusedGids;
+  std::map<std::size_t, int> refusedCalls;  // by position in `calls`
   std::vector<std::string> calls;
 };
 IdState idState;
@@ -57,6 +63,23 @@ bool works(int& callsLeft) {
   return true;
 }
 
+/// What a platform function does when the result does not fit.
+int writeText(std::string_view text, char* out, std::size_t size) {
+  if (text.size() >= size) return 0;
+  *std::copy(text.begin(), text.end(), out) = '\0';
+  return 1;
+}
+
+int wrap(const char* text, char* out, std::size_t size) {
+  return writeText("<" + std::string(text) + ">", out, size);
+}
+
+int unwrap(const char* text, char* out, std::size_t size) {
+  const std::string_view cipher(text);
+  if (cipher.size() < 2 || cipher.front() != '<' || cipher.back() != '>') return 0;
+  return writeText(cipher.substr(1, cipher.size() - 2), out, size);
+}
+
 template <typename Function>
 Function original(const char* name) {
   return reinterpret_cast<Function>(dlsym(RTLD_NEXT, name));
@@ -66,12 +89,16 @@ std::string idCall(const char* name, id_t id) {
   return std::string(name) + "(-1, " + std::to_string(static_cast<int>(id)) + ", -1)";
 }
 
+int refuse(int error) {
+  errno = error;
+  return -1;
+}
+
 int switchFake(const std::map<id_t, int>& refused, id_t& current, id_t id) {
+  const auto call = idState.refusedCalls.find(idState.calls.size() - 1);
+  if (call != idState.refusedCalls.end()) return refuse(call->second);
   const auto refusal = refused.find(id);
-  if (refusal != refused.end()) {
-    errno = refusal->second;
-    return -1;
-  }
+  if (refusal != refused.end()) return refuse(refusal->second);
   current = id;
   return 0;
 }
@@ -91,6 +118,16 @@ int Clock::calls() {
   return clockState.calls;
 }
 
+void Platform::useCipher(Cipher encrypt, Cipher decrypt) {
+  platformState.encrypt = std::move(encrypt);
+  platformState.decrypt = std::move(decrypt);
+}
+void Platform::useAddress(Address address) {
+  platformState.address = std::move(address);
+}
+void Platform::useReadableCipher() {
+  useCipher(wrap, unwrap);
+}
 void Platform::failEncryptFrom(int call) {
   platformState.encryptCallsLeft = call - 1;
 }
@@ -98,8 +135,10 @@ void Platform::failDecryptFrom(int call) {
   platformState.decryptCallsLeft = call - 1;
 }
 void Platform::answerRemoteIp(const std::string& text, int result) {
-  platformState.remoteIp = text;
-  platformState.remoteIpResult = result;
+  useAddress([text, result](char* buffer, std::size_t size) {
+    std::strncpy(buffer, text.c_str(), size - 1);
+    return result;
+  });
 }
 void Platform::release() {
   platformState = {};
@@ -122,6 +161,9 @@ void FakeIds::refuseUid(int id, int error) {
 }
 void FakeIds::refuseGid(int id, int error) {
   idState.refusedGids[static_cast<gid_t>(id)] = error;
+}
+void FakeIds::refuseCall(int nth, int error) {
+  idState.refusedCalls[idState.calls.size() + static_cast<std::size_t>(nth) - 1] = error;
 }
 void FakeIds::release() {
   idState = {};
@@ -168,24 +210,26 @@ int gettimeofdayForSqlite(LongTimeval* result, void* /*zone*/) {
 }
 
 int KCORECryptSzEncrypt(const char* clear, char* out, size_t outSize) {
+  const support::Uncounted uncounted;
   platformState.encrypted.emplace_back(clear);
   if (!support::works(platformState.encryptCallsLeft)) return 0;
+  if (platformState.encrypt) return platformState.encrypt(clear, out, outSize);
   static const auto real = support::original<decltype(&KCORECryptSzEncrypt)>("KCORECryptSzEncrypt");
   return real(clear, out, outSize);
 }
 
 int KCORECryptSzDecrypt(const char* cipher, char* out, size_t outSize) {
+  const support::Uncounted uncounted;
   platformState.decrypted.emplace_back(cipher);
   if (!support::works(platformState.decryptCallsLeft)) return 0;
+  if (platformState.decrypt) return platformState.decrypt(cipher, out, outSize);
   static const auto real = support::original<decltype(&KCORECryptSzDecrypt)>("KCORECryptSzDecrypt");
   return real(cipher, out, outSize);
 }
 
 int KeldCgiGetRemoteIP(char* buffer, size_t size) {
-  if (platformState.remoteIp.has_value()) {
-    std::strncpy(buffer, platformState.remoteIp->c_str(), size - 1);
-    return platformState.remoteIpResult;
-  }
+  const support::Uncounted uncounted;
+  if (platformState.address) return platformState.address(buffer, size);
   static const auto real = support::original<decltype(&KeldCgiGetRemoteIP)>("KeldCgiGetRemoteIP");
   return real(buffer, size);
 }
@@ -199,6 +243,7 @@ gid_t getegid() noexcept {
 }
 
 int setresuid(uid_t real, uid_t effective, uid_t saved) noexcept {
+  const support::Uncounted uncounted;
   idState.calls.push_back(support::idCall("setresuid", effective));
   if (idState.faked) {
     return support::switchFake(idState.refusedUids, idState.euid, effective);
@@ -207,6 +252,7 @@ int setresuid(uid_t real, uid_t effective, uid_t saved) noexcept {
 }
 
 int setresgid(gid_t real, gid_t effective, gid_t saved) noexcept {
+  const support::Uncounted uncounted;
   idState.calls.push_back(support::idCall("setresgid", effective));
   if (idState.faked) {
     return support::switchFake(idState.refusedGids, idState.egid, effective);

@@ -5,6 +5,8 @@
 #ifndef KELDOAUTH_TESTS_SUPPORT_DOUBLES_H
 #define KELDOAUTH_TESTS_SUPPORT_DOUBLES_H
 
+#include <cstddef>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -23,10 +25,20 @@ class Clock {
 /// libkeldcore and libkeldcgi.
 class Platform {
  public:
+  using Cipher = std::function<int(const char* text, char* out, std::size_t outSize)>;
+  using Address = std::function<int(char* buffer, std::size_t size)>;
+
+  /// Replaces the cipher, or the source of the address, until the release.
+  static void useCipher(Cipher encrypt, Cipher decrypt);
+  static void useAddress(Address address);
+  /// A cipher that a test can read: "abc" becomes "<abc>", and nothing else
+  /// decrypts.
+  static void useReadableCipher();
+
   /// The n-th call from now on (1 is the next) and all after it return 0.
   static void failEncryptFrom(int call);
   static void failDecryptFrom(int call);
-  /// KeldCgiGetRemoteIP writes `text` and returns `result`.
+  /// KeldCgiGetRemoteIP writes `text`, cut to the buffer, and returns `result`.
   static void answerRemoteIp(const std::string& text, int result);
   static void release();
   /// Clear texts handed to the cipher since the last release.
@@ -42,6 +54,8 @@ class FakeIds {
   /// Every setresuid (or setresgid) that asks for `id` fails with `error`.
   static void refuseUid(int id, int error);
   static void refuseGid(int id, int error);
+  /// The n-th switch from now on (1 is the next), of user or group, fails.
+  static void refuseCall(int nth, int error);
   static void release();
   static int euid();
   static int egid();

@@ -1,9 +1,13 @@
 #include "tests/support/system_log.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
 #include <mutex>
+
+#include "tests/support/allocations.h"
 
 namespace support {
 namespace {
@@ -15,6 +19,8 @@ std::vector<LogLine>& recorded() {
 }
 
 void record(int priority, const char* format, va_list arguments) {
+  const int error = errno;
+  const Uncounted uncounted;
   va_list again;
   va_copy(again, arguments);
   const int length = std::vsnprintf(nullptr, 0, format, again);
@@ -25,10 +31,19 @@ void record(int priority, const char* format, va_list arguments) {
   text.pop_back();
 
   const std::lock_guard<std::mutex> lock(mutex);
-  recorded().push_back({priority, format, text});
+  recorded().push_back({priority, format, text, error});
+  errno = error;
 }
 
 }  // namespace
+
+std::string LogLine::source() const {
+  return text.substr(0, text.find(':'));
+}
+
+int LogLine::number() const {
+  return std::atoi(text.c_str() + text.find(':') + 1);
+}
 
 std::string LogLine::message() const {
   return text.substr(text.find(' ') + 1);

@@ -13,7 +13,12 @@ struct LogLine {
   int priority;
   std::string format;  // as the caller passed it
   std::string text;    // as a reader of the log sees it
+  int error = 0;       // errno as the caller left it
 
+  /// The text before the first ":".
+  [[nodiscard]] std::string source() const;
+  /// The line number behind it.
+  [[nodiscard]] int number() const;
   /// The text after "source:line ".
   [[nodiscard]] std::string message() const;
 };
