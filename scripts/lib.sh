@@ -1,0 +1,54 @@
+# shellcheck shell=bash
+# What the scripts of this folder share. Sourced, never run.
+
+project=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd -P)
+# shellcheck disable=SC2034  # for the scripts that source this file
+scripts=$project/scripts
+
+if [[ -t 1 && -z ${NO_COLOR:-} ]]; then
+  bold=$'\e[1m' dim=$'\e[2m' red=$'\e[31m' green=$'\e[32m' plain=$'\e[0m'
+else
+  # shellcheck disable=SC2034
+  bold='' dim='' red='' green='' plain=''
+fi
+
+die() {
+  printf '%s: %s\n' "${0##*/}" "$*" >&2
+  exit 1
+}
+
+# progress TEXT: one line that says what is going on.
+progress() { printf '%s==> %s%s\n' "$bold" "$*" "$plain"; }
+
+# quietly COMMAND...: its output is shown only when it fails.
+quietly() {
+  local output status=0
+  output=$("$@" 2>&1 </dev/null) || status=$?
+  [[ $status -eq 0 ]] || printf '%s\n' "$output" >&2
+  return "$status"
+}
+
+# configure FOLDER OPTION...: a build with the stand-in platform libraries.
+# A folder that came along from a checkout elsewhere starts afresh.
+configure() {
+  local folder=$1 fresh=() cache=$1/CMakeCache.txt
+  shift
+  if [[ -e $cache ]] && ! grep -qxF "CMAKE_HOME_DIRECTORY:INTERNAL=$project" "$cache"; then
+    fresh=(--fresh)
+  fi
+  quietly cmake -S "$project" -B "$folder" -G Ninja "${fresh[@]}" \
+    -DKELDOAUTH_PLATFORM=standin "$@"
+}
+
+# build FOLDER [TARGET...]
+build() {
+  local folder=$1
+  shift
+  quietly cmake --build "$folder" --parallel "$(nproc)" ${1:+--target "$@"}
+}
+
+# require_private_mounts: everything that runs the library needs them.
+require_private_mounts() {
+  quietly "$project/tests/support/sandbox.sh" true ||
+    die "no private mounts here: run as root, or as a user who may create user namespaces"
+}
