@@ -76,21 +76,27 @@ bool readWholeFile(const char* path, std::string& text) {
   if (!file.isOpen() || !file.isRegular()) return false;
 
   std::array<char, 4096> buffer;
-  for (;;) {
-    const ssize_t got = file.readSome(buffer.data(), buffer.size());
+  ssize_t got = 0;
+  do {
+    got = file.readSome(buffer.data(), buffer.size());
     if (got < 0) return false;
-    if (got == 0) return true;
     text.append(buffer.data(), static_cast<std::size_t>(got));
-  }
+  } while (static_cast<std::size_t>(got) == buffer.size());
+  return true;
+}
+
+/// Setting up a parser costs more than a small file takes to parse.
+Json::CharReader& settingsParser() {
+  thread_local const std::unique_ptr<Json::CharReader> parser(
+      Json::CharReaderBuilder().newCharReader());
+  return *parser;
 }
 
 /// The parser leaves a half-filled root behind when it fails, hence the bool.
 bool loadSettings(Json::Value& root) {
   std::string text;
   if (!readWholeFile(names::kSettingsFile, text)) return false;
-
-  const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
-  return reader->parse(text.data(), text.data() + text.size(), &root, nullptr);
+  return settingsParser().parse(text.data(), text.data() + text.size(), &root, nullptr);
 }
 
 /// 0 for everything that is not a 32-bit integer under `key` of an object.
@@ -130,13 +136,14 @@ constexpr std::size_t kPieceLength = 2 * kUuidBytes;
   throw std::system_error(error, std::generic_category(), "system random source");
 }
 
-/// The device is read in one call. Where it cannot be opened (a process
-/// without /dev, or out of descriptors) the kernel hands out the same bytes.
+/// One call to the kernel; a kernel that does not know it has the device.
 void fillFromSystem(char* out, std::size_t size) {
-  const File device("/dev/urandom", O_RDONLY);
   for (std::size_t filled = 0; filled < size;) {
-    const ssize_t got = device.isOpen() ? device.readSome(out + filled, size - filled)
-                                        : getrandom(out + filled, size - filled, 0);
+    ssize_t got = getrandom(out + filled, size - filled, 0);
+    if (got < 0 && errno == ENOSYS) {
+      const File device("/dev/urandom", O_RDONLY);
+      got = device.readSome(out + filled, size - filled);
+    }
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) throwNoRandomness(errno);
     if (got == 0) throwNoRandomness(EIO);
