@@ -8,13 +8,24 @@
 namespace KELDOAUTHSERVER {
 namespace {
 
+void appendDoubled(std::string& sql, const char* text, const char* end) {
+  while (text != end) {
+    const char* quote = std::find(text, end, '\'');
+    sql.append(text, quote);
+    if (quote == end) return;
+    sql += "''";
+    text = quote + 1;
+  }
+}
+
 void appendLiteral(std::string& sql, const Json::Value& value) {
   sql += '\'';
-  if (hasText(value)) {
-    for (const char c : value.asString()) {
-      if (c == '\'') sql += '\'';
-      sql += c;
-    }
+  const char* text = nullptr;
+  const char* end = nullptr;
+  if (value.getString(&text, &end)) {
+    appendDoubled(sql, text, end);
+  } else if (hasText(value)) {
+    sql += value.asString();  // a number, a boolean or null: no quotes in it
   }
   sql += '\'';
 }

@@ -159,7 +159,7 @@ int OAUTHDBGrantCode::Purge() try {
   const long long now = currentTime();
   Json::Value rows(Json::arrayValue);
   if (Get(&rows) == 0) return 1;
-  return purgeExpired(*this, rows, now, [this](long long id) { return Del(id) != 0; });
+  return removeAll(*this, expiredIds(rows, now), [this](long long id) { return Del(id) != 0; });
 } catch (...) {
   return FailUnexpectedly(kSource, __LINE__);
 }

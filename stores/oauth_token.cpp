@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "stores/store_support.h"
+#include "utils/decimal.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
@@ -178,7 +179,7 @@ bool OAUTHDBToken::Purge() try {
   const long long now = currentTime();
   Json::Value rows(Json::arrayValue);
   if (!Get(&rows)) return true;
-  return purgeExpired(*this, rows, now, [this](long long id) { return Del(id); });
+  return removeAll(*this, expiredIds(rows, now), [this](long long id) { return Del(id); });
 } catch (...) {
   return FailUnexpectedly(kSource, __LINE__);
 }

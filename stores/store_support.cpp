@@ -7,6 +7,8 @@
 #include <cstring>
 #include <ctime>
 
+#include "utils/decimal.h"
+#include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
 namespace KELDOAUTHSERVER {
@@ -47,6 +49,14 @@ int firstId(const Json::Value& rows) {
 
 long long currentTime() {
   return static_cast<long long>(time(nullptr));
+}
+
+std::vector<long long> expiredIds(const Json::Value& rows, long long now) {
+  std::vector<long long> ids;
+  for (const Json::Value& row : rows) {
+    if (decimalValue(row[names::kExpiredTime]) < now) ids.push_back(decimalValue(row[names::kId]));
+  }
+  return ids;
 }
 
 int addressError(const std::string& ip) {

@@ -6,13 +6,11 @@
 
 #include <json/value.h>
 
-#include <algorithm>
 #include <string>
+#include <vector>
 
 #include "core/oauth_db_basic.h"
 #include "stores/transaction.h"
-#include "utils/decimal.h"
-#include "utils/oauth_names.h"
 
 namespace KELDOAUTHSERVER {
 
@@ -56,20 +54,20 @@ long long currentTime();
 /// taken as a number. Reading stops at the first NUL byte.
 int addressError(const std::string& ip);
 
-/// Calls `remove(id)` for each of `rows`, in order, whose expiry lies before
-/// `now`. Several removals share one transaction of `store`; where it is
-/// refused they run one by one. True unless a removal or the commit failed.
+/// The ids of the rows whose expiry lies before `now`, in the order of `rows`.
+std::vector<long long> expiredIds(const Json::Value& rows, long long now);
+
+/// Calls `remove(id)` for each of `ids` in order. Several removals share one
+/// transaction of `store`; where it is refused they run one by one. True unless
+/// a removal or the commit failed.
 template <typename Remove>
-bool purgeExpired(OAUTHDBBasic& store, const Json::Value& rows, long long now, Remove remove) {
-  const auto isExpired = [now](const Json::Value& row) {
-    return decimalValue(row[names::kExpiredTime]) < now;
-  };
+bool removeAll(OAUTHDBBasic& store, const std::vector<long long>& ids, Remove remove) {
   Transaction transaction(store);
-  if (std::count_if(rows.begin(), rows.end(), isExpired) > 1) transaction.begin();
+  if (ids.size() > 1) transaction.begin();
 
   bool done = true;
-  for (const Json::Value& row : rows) {
-    if (isExpired(row) && !remove(decimalValue(row[names::kId]))) done = false;
+  for (const long long id : ids) {
+    if (!remove(id)) done = false;
   }
   return transaction.commit() && done;
 }
