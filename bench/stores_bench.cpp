@@ -1,0 +1,235 @@
+// The library beside bare SQLite, operation by operation. Every measurement
+// has a twin under the same name with "/bare"; scripts/bench runs both in the
+// same process, interleaved, and gives their ratio.
+
+#include <benchmark/benchmark.h>
+#include <json/value.h>
+#include <sys/random.h>
+
+#include <array>
+#include <cstdint>
+#include <functional>
+#include <random>
+#include <string>
+
+#include "bench/bare_store.h"
+#include "bench/world.h"
+#include "stores/oauth_clientInfo.h"
+#include "stores/oauth_log.h"
+#include "stores/oauth_token.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+
+using namespace KELDOAUTHSERVER;
+
+namespace bench {
+namespace {
+
+/// Serials of rows made while measuring: above all that a database starts with.
+long long nextSerial() {
+  static long long serial = 1000000;
+  return ++serial;
+}
+
+void require(benchmark::State& state, bool done) {
+  if (!done) state.SkipWithError("operation failed");
+}
+
+// B1 ------------------------------------------------------------------------
+
+void registerLibrary(benchmark::State& state) {
+  install({});
+  OAUTHDBClientInfo clients(names::kClientInfoTable);
+  Json::Value out;
+  for (auto _ : state) {
+    require(state, clients.Add("https://photos.example.org/callback", "profile photos.read",
+                               "Photo Frame", out) != 0);
+  }
+}
+
+void registerBare(benchmark::State& state) {
+  install({});
+  BareStore store;
+  for (auto _ : state) store.registerClient(nextSerial());
+}
+
+// B2 ------------------------------------------------------------------------
+
+void issueLibrary(benchmark::State& state) {
+  install({static_cast<int>(state.range(0)), 0, 0});
+  OAUTHDBToken tokens(names::kTokenTable);
+  const std::string client = serialText(1);
+  Json::Value out;
+  for (auto _ : state) {
+    require(state, tokens.Add("alice", client, "photos.read", "authorization_code", "af0ifjsldkj",
+                              "192.0.2.7", out) != 0);
+  }
+}
+
+void issueBare(benchmark::State& state) {
+  install({static_cast<int>(state.range(0)), 0, 0});
+  BareStore store;
+  for (auto _ : state) store.issueToken(nextSerial());
+}
+
+// B3, B4 --------------------------------------------------------------------
+
+void verifyLibrary(benchmark::State& state) {
+  install({static_cast<int>(state.range(0)), 0, 0});
+  OAUTHDBToken tokens(names::kTokenTable);
+  const std::string token = serialText(state.range(0) / 2);
+  for (auto _ : state) {
+    Json::Value holder;
+    require(state, tokens.Verify(token, holder));
+  }
+}
+
+void refreshLibrary(benchmark::State& state) {
+  install({static_cast<int>(state.range(0)), 0, 0});
+  OAUTHDBToken tokens(names::kTokenTable);
+  const std::string token = serialText(state.range(0) / 2);
+  for (auto _ : state) {
+    Json::Value rows;
+    require(state, tokens.GetWithRefreshToken(token, &rows) && rows.size() == 1);
+  }
+}
+
+void lookUpBare(benchmark::State& state, const char* column) {
+  install({static_cast<int>(state.range(0)), 0, 0});
+  BareStore store;
+  const std::string sql = std::string("SELECT * FROM oauth_token WHERE ") + column + "='" +
+                          serialText(state.range(0) / 2) + "' ;";
+  for (auto _ : state) store.select(sql);
+}
+
+void verifyBare(benchmark::State& state) {
+  lookUpBare(state, "access_token");
+}
+void refreshBare(benchmark::State& state) {
+  lookUpBare(state, "refresh_token");
+}
+
+// B5 ------------------------------------------------------------------------
+
+/// One purge per iteration: the rows are put back outside the measurement.
+template <typename Store>
+void purge(benchmark::State& state, const std::function<bool(Store&)>& work) {
+  const int rows = static_cast<int>(state.range(0));
+  for (auto _ : state) {
+    state.PauseTiming();
+    install({rows, rows / 2, 0});
+    Store store = Store();
+    state.ResumeTiming();
+    require(state, work(store));
+  }
+}
+
+struct TokenStore : OAUTHDBToken {
+  TokenStore() : OAUTHDBToken(names::kTokenTable) {}
+};
+
+void purgeLibrary(benchmark::State& state) {
+  purge<TokenStore>(state, [](TokenStore& store) { return store.Purge(); });
+}
+
+void purgeBare(benchmark::State& state) {
+  purge<BareStore>(state, [](BareStore& store) {
+    store.run("DELETE FROM oauth_token WHERE CAST(expired_time AS INTEGER) < 2000;");
+    return true;
+  });
+}
+
+void purgeRowByRow(benchmark::State& state) {
+  const long long expired = state.range(0) / 2;
+  purge<BareStore>(state, [expired](BareStore& store) {
+    for (long long id = 1; id <= expired; ++id) {
+      store.run("DELETE FROM oauth_token WHERE id='" + std::to_string(id) + "';");
+    }
+    return true;
+  });
+}
+
+// B6 ------------------------------------------------------------------------
+
+void auditLibrary(benchmark::State& state) {
+  const int rows = static_cast<int>(state.range(0));
+  install({0, 0, rows}, rows);
+  OAUTHDBLog log(names::kLogTable);
+  for (auto _ : state) require(state, log.Add("Token revoked[alice]") != 0);
+}
+
+void auditBare(benchmark::State& state) {
+  const int rows = static_cast<int>(state.range(0));
+  install({0, 0, rows}, rows);
+  BareStore store;
+  for (auto _ : state) store.writeAuditEntry("Token revoked[alice]", rows);
+}
+
+// B7 ------------------------------------------------------------------------
+
+void randomLibrary(benchmark::State& state) {
+  for (auto _ : state) benchmark::DoNotOptimize(getRandomStr(64));
+}
+
+struct OneRead {
+  using result_type = std::uint32_t;
+  void generate(std::uint32_t* first, std::uint32_t* last) const {
+    const auto size = static_cast<std::size_t>(last - first) * sizeof *first;
+    if (getrandom(first, size, 0) != static_cast<ssize_t>(size)) std::abort();
+  }
+};
+
+/// Per piece one read of 2,496 bytes, seeding, and the four words of a draw.
+void randomBare(benchmark::State& state) {
+  for (auto _ : state) {
+    for (int piece = 0; piece < 2; ++piece) {
+      OneRead read;
+      std::mt19937 generator(read);
+      for (int word = 0; word < 4; ++word) benchmark::DoNotOptimize(generator());
+    }
+  }
+}
+
+// B8 ------------------------------------------------------------------------
+
+void constructLibrary(benchmark::State& state) {
+  install({1000, 0, 0});
+  for (auto _ : state) OAUTHDBToken tokens(names::kTokenTable);
+}
+
+void constructBare(benchmark::State& state) {
+  install({1000, 0, 0});
+  for (auto _ : state) BareStore store;
+}
+
+// ---------------------------------------------------------------------------
+
+using Body = void (*)(benchmark::State&);
+
+void add(const std::string& name, Body library, Body bare, int iterations,
+         std::initializer_list<int> sizes) {
+  for (const auto& [suffix, body] : {std::pair{"/library", library}, std::pair{"/bare", bare}}) {
+    auto* entry = benchmark::RegisterBenchmark((name + suffix).c_str(), body);
+    entry->Unit(benchmark::kMicrosecond)->UseRealTime();
+    if (iterations > 0) entry->Iterations(iterations);
+    for (const int size : sizes) entry->Arg(size);
+  }
+}
+
+/// Writing operations run a fixed number of times, so that the tables stay near
+/// the size that their names say.
+const bool registered = [] {
+  add("B1 register a client", registerLibrary, registerBare, 50, {});
+  add("B2 issue a token pair", issueLibrary, issueBare, 50, {10, 100, 900, 9900});
+  add("B3 verify an access token", verifyLibrary, verifyBare, 0, {10, 100, 1000, 10000});
+  add("B4 look up a refresh token", refreshLibrary, refreshBare, 0, {10, 100, 1000, 10000});
+  add("B5 purge half of the rows", purgeLibrary, purgeBare, 3, {20, 200, 2000, 10000});
+  add("B5 purge, beside row by row", purgeLibrary, purgeRowByRow, 1, {2000});
+  add("B6 audit entry with rotation", auditLibrary, auditBare, 50, {1000, 10000});
+  add("B7 getRandomStr(64)", randomLibrary, randomBare, 0, {});
+  add("B8 construct and destroy", constructLibrary, constructBare, 0, {});
+  return true;
+}();
+
+}  // namespace
+}  // namespace bench
