@@ -39,7 +39,7 @@ class Platform {
   static void failEncryptFrom(int call);
   static void failDecryptFrom(int call);
   /// KeldCgiGetRemoteIP writes `text`, cut to the buffer, and returns `result`.
-  static void answerRemoteIp(const std::string& text, int result);
+  static void answerRemoteIp(const std::string& text, int result = 0);
   static void release();
   /// Clear texts handed to the cipher since the last release.
   static std::vector<std::string> encrypted();
