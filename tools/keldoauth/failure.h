@@ -1,0 +1,55 @@
+// How a command ends when it does not succeed: one exception, one exit status
+// per kind of failure, the library's code and message where it gave one.
+
+#ifndef KELDOAUTH_TOOLS_FAILURE_H
+#define KELDOAUTH_TOOLS_FAILURE_H
+
+#include <optional>
+#include <stdexcept>
+#include <string>
+
+namespace KELDOAUTHSERVER {
+class OAUTHDBBasic;
+}
+
+namespace tool {
+
+/// Scripts branch on these; the manual page lists them.
+enum ExitCode : int {
+  kOk = 0,
+  kUsage = 1,         // the command line or an input file makes no sense
+  kRefused = 2,       // the library does not accept the values, or the table is full
+  kNotFound = 3,      // no such client, code or token
+  kUnavailable = 4,   // the database or the cipher does not work
+  kInvalid = 5,       // a token or code is unknown or expired
+  kUnhealthy = 6,     // `status` found something wrong
+  kNotConfirmed = 7,  // a destructive command was not confirmed
+  kNotWritten = 8,    // the answer could not be written to standard output
+};
+
+class Failure : public std::runtime_error {
+ public:
+  Failure(ExitCode exitCode, const std::string& message, std::string advice = {},
+          std::optional<int> libraryCode = {});
+
+  /// The message with the library's code: "Bad parameters (-2)".
+  [[nodiscard]] std::string text() const;
+
+  ExitCode exit;
+  std::optional<int> code;  // the library's, when it set one
+  std::string hint;         // what to do about it; may be empty
+};
+
+/// What `store` says about the operation that just failed. When it refused the
+/// values, `explanation` (may be empty) says which of them is at fault.
+Failure libraryFailure(KELDOAUTHSERVER::OAUTHDBBasic& store, const std::string& explanation = {});
+
+/// The same for a code and message from a result document.
+Failure libraryFailure(int code, const std::string& message, const std::string& explanation = {});
+
+/// "No such <what>".
+Failure notFound(const std::string& what);
+
+}  // namespace tool
+
+#endif  // KELDOAUTH_TOOLS_FAILURE_H

@@ -1,0 +1,156 @@
+// keldoauth: the administrator's command line. A table of commands and the loop
+// that turns it into sub-commands; parsing and help come from CLI11.
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <clocale>
+#include <cstdlib>
+#include <exception>
+#include <iostream>
+#include <string>
+#include <vector>
+
+#include "tools/keldoauth/command.h"
+#include "tools/keldoauth/output.h"
+#include "tools/keldoauth/text.h"
+
+namespace tool {
+namespace {
+
+struct Group {
+  const char* name;
+  const char* summary;
+  const std::vector<Command>& (*commands)();
+};
+
+constexpr Group kGroups[] = {
+    {"client", "Registered applications", clientCommands},
+    {"code", "Grant codes", codeCommands},
+    {"token", "Access and refresh tokens", tokenCommands},
+    {"log", "Audit log", logCommands},
+};
+
+/// What the command line asked for.
+struct Invocation {
+  const Command* command = nullptr;
+  Arguments arguments;
+};
+
+// Parsing ---------------------------------------------------------------------------
+
+void addCommand(CLI::App& parent, const Command& command, Invocation& invocation) {
+  CLI::App* const sub = parent.add_subcommand(command.name, command.summary);
+  for (const Option& option : command.options) declare(option, *sub, invocation.arguments);
+  sub->callback([&command, &invocation] { invocation.command = &command; });
+}
+
+void addCommands(CLI::App& app, Invocation& invocation) {
+  for (const Group& group : kGroups) {
+    CLI::App* const sub = app.add_subcommand(group.name, group.summary);
+    sub->require_subcommand(1);
+    for (const Command& command : group.commands()) addCommand(*sub, command, invocation);
+  }
+  addCommand(app, statusCommand(), invocation);
+}
+
+/// What the command line got to: the group or the command that it names.
+const CLI::App& reached(const CLI::App& app) {
+  const std::vector<CLI::App*> named = app.get_subcommands();
+  return named.empty() ? app : reached(*named.front());
+}
+
+/// "client add", empty for the program itself.
+std::string commandName(const CLI::App& app) {
+  const CLI::App* const parent = app.get_parent();
+  if (parent == nullptr) return {};
+  const std::string group = commandName(*parent);
+  return group + (group.empty() ? "" : " ") + app.get_name();
+}
+
+/// What is wrong with a command line that reached `app`.
+std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
+  const bool isCommand = app.get_subcommands({}).empty();
+  const std::vector<std::string> rest = app.remaining();
+  if (rest.empty()) return isCommand ? error.what() : "a command is missing";
+  return (isCommand ? "unexpected argument '" : "unknown command '") + printable(rest.front()) +
+         "'";
+}
+
+// Answers ---------------------------------------------------------------------------
+
+Json::Value documentOf(const Failure& failure) {
+  Json::Value document;
+  Json::Value& error = document["error"];
+  error["exit"] = static_cast<int>(failure.exit);
+  error["code"] = failure.code ? Json::Value(*failure.code) : Json::Value();
+  error["message"] = failure.what();
+  error["hint"] = failure.hint;
+  return document;
+}
+
+ExitCode report(const std::string& command, const Failure& failure, bool asJson) {
+  std::cerr << "keldoauth: " << command << (command.empty() ? "" : ": ") << failure.text() << '\n';
+  if (!failure.hint.empty()) std::cerr << "hint: " << failure.hint << '\n';
+  if (asJson) printJson(std::cout, documentOf(failure));
+  return failure.exit;
+}
+
+ExitCode run(const std::string& name, const Invocation& invocation) {
+  const Command& command = *invocation.command;
+  const bool asJson = invocation.arguments.json;
+  try {
+    const Answer answer = command.run(invocation.arguments);
+    if (asJson) {
+      printJson(std::cout, answer.document);
+    } else {
+      command.print(answer.document, std::cout);
+    }
+    return answer.exit;
+  } catch (const Failure& failure) {
+    return report(name, failure, asJson);
+  } catch (const std::exception& error) {
+    return report(name, Failure(kUnavailable, error.what()), asJson);
+  }
+}
+
+/// Asked-for help is an answer; everything else that ends parsing is a mistake.
+ExitCode answerUnparsed(const CLI::App& app, const CLI::ParseError& error, bool asJson) {
+  if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
+    app.exit(error, std::cout, std::cerr);
+    return kOk;
+  }
+  const CLI::App& at = reached(app);
+  const std::string name = commandName(at);
+  const std::string help = "keldoauth " + name + (name.empty() ? "" : " ") + "--help";
+  const Failure failure(kUsage, complaint(at, error), "'" + help + "' says what is possible");
+  return report(name, failure, asJson);
+}
+
+ExitCode answer(int argc, char** argv) {
+  Invocation invocation;
+  CLI::App app("Administers the storage of the authorisation service.", "keldoauth");
+  app.set_version_flag("--version", "keldoauth " KELDOAUTH_VERSION);
+  app.require_subcommand(1);
+  addCommands(app, invocation);
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError& error) {
+    // The parser stops before it fills in flags.
+    const bool asJson = std::find(argv, argv + argc, std::string("--json")) != argv + argc;
+    return answerUnparsed(app, error, asJson);
+  }
+  return run(commandName(reached(app)), invocation);
+}
+
+}  // namespace
+}  // namespace tool
+
+int main(int argc, char** argv) {
+  // Only to tell characters apart; the messages stay English.
+  std::setlocale(LC_CTYPE, "C.UTF-8");
+  const tool::ExitCode exit = tool::answer(argc, argv);
+  std::cout.flush();
+  if (std::cout.good()) return exit;
+  std::cerr << "keldoauth: cannot write to standard output\n";
+  return tool::kNotWritten;
+}

@@ -1,0 +1,146 @@
+// The options of all sub-commands, each described once. A command's table lists
+// those that it takes.
+
+#ifndef KELDOAUTH_TOOLS_OPTIONS_H
+#define KELDOAUTH_TOOLS_OPTIONS_H
+
+#include <optional>
+#include <string>
+#include <variant>
+
+namespace CLI {
+class App;
+}
+
+namespace tool {
+
+/// What the command line said. A value that was not given is absent.
+struct Arguments {
+  using Text = std::optional<std::string>;
+  using Number = std::optional<long long>;
+
+  bool json = false;
+  bool reveal = false;
+  bool yes = false;
+  bool disabled = false;
+  bool dryRun = false;
+  bool expired = false;
+
+  Number id;
+  Number expiresIn;
+  Number grace;
+  Number last;
+
+  Text client;
+  Text clientId;
+  Text codeFile;
+  Text contains;
+  Text displayName;
+  Text flowType;
+  Text ip;
+  Text message;
+  Text redirectUri;
+  Text refreshTokenFile;
+  Text scope;
+  Text secretFile;
+  Text state;
+  Text tokenFile;
+  Text username;
+};
+
+/// One option. A name without dashes is a positional argument.
+struct Option {
+  const char* name;
+  const char* placeholder;
+  const char* help;
+  std::variant<bool Arguments::*, Arguments::Text Arguments::*, Arguments::Number Arguments::*>
+      target;
+  bool isRequired = false;
+  long long highest = 9223372036854775807;  // of a number
+};
+
+constexpr Option required(Option option) {
+  option.isRequired = true;
+  return option;
+}
+
+namespace option {
+
+constexpr long long kCentury = 3155760000;  // seconds
+
+inline constexpr Option kJson{"--json", "", "Write one JSON document to standard output",
+                              &Arguments::json};
+inline constexpr Option kReveal{"--reveal", "", "Show secrets, codes and tokens in full",
+                                &Arguments::reveal};
+inline constexpr Option kYes{"--yes,-y", "", "Do not ask", &Arguments::yes};
+
+inline constexpr Option kId{"ID", "", "Row id, as 'list' shows it", &Arguments::id};
+inline constexpr Option kClientArgument{"CLIENT", "", "Row id or 64-character client identifier",
+                                        &Arguments::client};
+inline constexpr Option kMessage{"MESSAGE", "", "Text of the entry", &Arguments::message};
+
+inline constexpr Option kClient{"--client", "CLIENT", "Row id or 64-character client identifier",
+                                &Arguments::client};
+inline constexpr Option kClientId{"--client-id", "TEXT",
+                                  "Identifier of 64 bytes instead of a generated one",
+                                  &Arguments::clientId};
+inline constexpr Option kSecretFile{"--secret-file", "FILE",
+                                    "Read a secret of 64 bytes from FILE ('-': standard input) "
+                                    "instead of generating one",
+                                    &Arguments::secretFile};
+inline constexpr Option kRedirectUri{"--redirect-uri", "URI", "Redirect address, 3 to 2048 bytes",
+                                     &Arguments::redirectUri};
+inline constexpr Option kScope{"--scope", "TEXT", "Scope, 1 to 2048 bytes", &Arguments::scope};
+inline constexpr Option kDisplayName{"--name", "TEXT", "Display name, 1 to 64 bytes",
+                                     &Arguments::displayName};
+inline constexpr Option kDisabled{"--disabled", "", "Register it switched off",
+                                  &Arguments::disabled};
+
+inline constexpr Option kUsername{"--username", "NAME", "User who granted it, 1 to 256 bytes",
+                                  &Arguments::username};
+inline constexpr Option kState{"--state", "TEXT", "State of the request, 1 to 2048 bytes",
+                               &Arguments::state};
+inline constexpr Option kFlowType{"--flow-type", "TEXT",
+                                  "Grant flow, such as authorization_code, 1 to 32 bytes",
+                                  &Arguments::flowType};
+inline constexpr Option kIp{"--ip", "ADDRESS", "IPv4 or IPv6 address of the requester",
+                            &Arguments::ip};
+inline constexpr Option kExpiresIn{
+    "--expires-in",        "SECONDS", "Lifetime from now on instead of the one in the settings",
+    &Arguments::expiresIn, false,     kCentury};
+inline constexpr Option kNewExpiry{
+    "--expires-in",        "SECONDS", "Let it expire so long from now",
+    &Arguments::expiresIn, false,     kCentury};
+
+inline constexpr Option kCodeFile{
+    "--code-file", "FILE", "Read the code from FILE ('-': standard input)", &Arguments::codeFile};
+inline constexpr Option kTokenFile{"--token-file", "FILE",
+                                   "Read the access token from FILE ('-': standard input)",
+                                   &Arguments::tokenFile};
+inline constexpr Option kRefreshTokenFile{"--refresh-token-file", "FILE",
+                                          "Read the refresh token from FILE ('-': standard input)",
+                                          &Arguments::refreshTokenFile};
+
+inline constexpr Option kOfUser{"--username", "NAME", "Only those of this user",
+                                &Arguments::username};
+inline constexpr Option kOfClient{
+    "--client", "CLIENT", "Only those of this client (row id or identifier)", &Arguments::client};
+inline constexpr Option kExpired{"--expired", "", "Only expired ones", &Arguments::expired};
+inline constexpr Option kDryRun{"--dry-run", "", "List what would go and keep it",
+                                &Arguments::dryRun};
+inline constexpr Option kGrace{"--grace",         "SECONDS", "Keep what expired less than this ago",
+                               &Arguments::grace, false,     kCentury};
+
+inline constexpr Option kContains{"--contains", "TEXT",
+                                  "Only messages with TEXT in them ('%' and '_' are wildcards)",
+                                  &Arguments::contains};
+inline constexpr Option kLast{"--last", "COUNT", "Only the newest COUNT entries", &Arguments::last};
+
+}  // namespace option
+
+/// Adds `option` to `app`; what is parsed goes into `arguments`.
+void declare(const Option& option, CLI::App& app, Arguments& arguments);
+
+}  // namespace tool
+
+#endif  // KELDOAUTH_TOOLS_OPTIONS_H
