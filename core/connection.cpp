@@ -50,8 +50,8 @@ class PrivateUmask {
 int openConnection(const char* source, sqlite3*& db) {
   int result = SQLITE_OK;
   {
-    const RaisedPrivilege privilege(source);
     const PrivateUmask creationMask;
+    const RaisedPrivilege privilege(source);
     result = sqlite3_open(names::kDatabaseFile, &db);
     if (result != SQLITE_OK) {
       sqlite3_close(db);  // a failed open may hand out a handle all the same

@@ -10,6 +10,7 @@
 
 #include "core/clauses.h"
 #include "core/connection.h"
+#include "core/oauth_errors.h"
 #include "core/schema.h"
 #include "core/secrets.h"
 #include "utils/decimal.h"
@@ -73,7 +74,7 @@ int failWithoutObject(int line) noexcept {
 
 // Opening and closing ---------------------------------------------------------
 
-OAUTHDBBasic::OAUTHDBBasic() {
+OAUTHDBBasic::OAUTHDBBasic() : errCode_(errors::kNone.code) {
   Open();
   DBInit();
 }
@@ -165,8 +166,14 @@ int OAUTHDBBasic::DBCmd(const std::string& sql, RowCallback callback, Json::Valu
 }
 
 int OAUTHDBBasic::DBCmdRun(const std::string& sql, RowCallback callback, Json::Value* arg) try {
+  return Run(sql, callback, arg);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::Run(const std::string& sql, RowCallback callback, Json::Value* arg) {
   if (isTraced(kCoreTrace)) {
-    syslog(LOG_ERR, "%s:%d ==> %s[%s]", kSource, __LINE__, __func__, sql.c_str());
+    syslog(LOG_ERR, "%s:%d ==> %s[%s]", kSource, __LINE__, "DBCmdRun", sql.c_str());
   }
   RowCall call{callback, arg, nullptr};
   char* text = nullptr;
@@ -181,8 +188,6 @@ int OAUTHDBBasic::DBCmdRun(const std::string& sql, RowCallback callback, Json::V
   errMsg_ = reason != nullptr ? reason.get() : sqlite3_errstr(result);
   syslog(LOG_ERR, "%s:%d Run Command failed!![%s][%d]", kSource, __LINE__, errMsg_.c_str(), result);
   return 0;
-} catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
 }
 
 int OAUTHDBBasic::TabCountCallback(void* arg, int /*count*/, char** values, char** /*columns*/) {
@@ -220,12 +225,12 @@ int OAUTHDBBasic::DBInit() try {
   if (isTraced(kCoreTrace)) {
     syslog(LOG_ERR, "%s:%d ==> %s[init meta table]", kSource, __LINE__, __func__);
   }
-  if (IsDBTabExist(names::kMetaTable) == 0) {
+  if (FindTable(names::kMetaTable) == 0) {
     if (CreateDBTab(schema::kCreateMeta) == 0) {
       syslog(LOG_ERR, "%s:%d Create Table failed!![meta]", kSource, __LINE__);
       return ready_;
     }
-    AddMetaData();
+    InsertMetaRows();
   }
   for (const schema::Step& step : schema::kSteps) {
     if (isTraced(step.mask)) {
@@ -243,18 +248,20 @@ int OAUTHDBBasic::DBInit() try {
   return ready_;
 }
 
-void OAUTHDBBasic::AddMetaData() try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+void OAUTHDBBasic::AddMetaData() try { InsertMetaRows(); } catch (...) {
+  FailUnexpectedly(kSource, __LINE__);
+}
+
+void OAUTHDBBasic::InsertMetaRows() {
+  traceEntry(kCoreTrace, kSource, __LINE__, "AddMetaData");
   for (const char* table : schema::kVersionedTables) {
     const std::string sql = std::string("INSERT INTO ") + names::kMetaTable +
                             "(tab_name, version) VALUES('" + table + "', " + schema::kVersion +
                             ");";
-    if (DBCmdRun(sql, nullptr, nullptr) == 0) {
+    if (Run(sql, nullptr, nullptr) == 0) {
       syslog(LOG_ERR, "%s:%d Add Meta failed", kSource, __LINE__);
     }
   }
-} catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
 }
 
 int OAUTHDBBasic::CreateDBTab(const std::string& statement) try {
@@ -268,17 +275,21 @@ int OAUTHDBBasic::CreateDBTab(const std::string& statement) try {
 }
 
 int OAUTHDBBasic::IsDBTabExist(const std::string& name) try {
+  return FindTable(name);
+} catch (...) {
+  return FailUnexpectedly(kSource, __LINE__);
+}
+
+int OAUTHDBBasic::FindTable(const std::string& name) {
   Json::Value found;
   found[names::kExist] = false;
   const std::string sql = "SELECT * FROM sqlite_master WHERE name='" + name + "' and type='table';";
-  if (DBCmdRun(sql, IsTabExistCallback, &found) == 0 || !found[names::kExist].asBool()) return 0;
+  if (Run(sql, IsTabExistCallback, &found) == 0 || !found[names::kExist].asBool()) return 0;
 
   if (isTraced(kCoreTrace)) {
     syslog(LOG_ERR, "%s:%d Tab[%s] is exist", kSource, __LINE__, name.c_str());
   }
   return 1;
-} catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
 }
 
 int OAUTHDBBasic::DBGetRowCount(Json::Value& result) try {

@@ -18,11 +18,11 @@
 
 #include <string>
 
-#include "core/oauth_errors.h"
-
 struct sqlite3;
 
 namespace KELDOAUTHSERVER {
+
+struct OAUTHError;  // core/oauth_errors.h
 
 class OAUTHDBBasic {
  public:
@@ -47,16 +47,16 @@ class OAUTHDBBasic {
   // The last error ----------------------------------------------------------
 
   /// 255 until something has failed; see core/oauth_errors.h.
-  [[nodiscard]] int GetErrCode() const;
+  int GetErrCode() const;
   void SetErrCode(int code);
 
   /// Empty until something has failed.
-  [[nodiscard]] std::string GetErrMsg() const;
+  std::string GetErrMsg() const;
   void SetErrMsg(const std::string& msg);
 
   // The table that this object works on -------------------------------------
 
-  [[nodiscard]] std::string GetTabName() const;
+  std::string GetTabName() const;
   /// When memory runs out the object is no longer ready.
   void SetTabName(const std::string& name);
 
@@ -176,10 +176,16 @@ class OAUTHDBBasic {
   bool FailUnexpectedly(const char* source, int line) noexcept;
 
  private:
+  // The bodies of the public operations that start-up must see fail: they
+  // throw.
+  int Run(const std::string& sql, RowCallback callback, Json::Value* arg);
+  int FindTable(const std::string& name);
+  void InsertMetaRows();
+
   void Open();
   bool RunChange(const std::string& sql, int& changed);
 
-  int errCode_ = errors::kNone.code;
+  int errCode_;
   int ready_ = 0;
   std::string errMsg_;
   std::string tabName_;

@@ -4,6 +4,7 @@
 
 #include <exception>
 
+#include "core/oauth_errors.h"
 #include "stores/oauth_log.h"
 #include "stores/store_support.h"
 #include "utils/diagnostics.h"

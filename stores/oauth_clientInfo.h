@@ -4,8 +4,8 @@
 //
 // Rows come back as DBGet delivers them: an array of objects with "id",
 // "enable", "client_id", "client_secret", "redirect_uri", "scope" and
-// "display_name", every value a text. Single quotes in the last three were
-// stored doubled.
+// "display_name", every value a text. Single quotes were stored doubled in all
+// but "enable".
 
 #ifndef KELDOAUTH_STORES_OAUTH_CLIENTINFO_H
 #define KELDOAUTH_STORES_OAUTH_CLIENTINFO_H

@@ -4,6 +4,7 @@
 
 #include <system_error>
 
+#include "core/oauth_errors.h"
 #include "stores/store_support.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"

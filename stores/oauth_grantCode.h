@@ -74,7 +74,10 @@ class OAUTHDBGrantCode : public OAUTHDBBasic {
 
   /// Removes every row whose expiry lies before the current second. 1 when all
   /// removals succeeded, also when there was nothing to remove or the rows
-  /// could not be read; else 0.
+  /// could not be read; else 0, without an error code when another process had
+  /// removed a row first. Several removals are one transaction: when it cannot
+  /// be committed, 0 with SQLite's code, and every row is back. When it cannot
+  /// be begun, they run one by one.
   int Purge();
 
   // Look-ups ----------------------------------------------------------------

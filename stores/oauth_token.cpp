@@ -5,6 +5,7 @@
 #include <system_error>
 #include <utility>
 
+#include "core/oauth_errors.h"
 #include "stores/store_support.h"
 #include "utils/decimal.h"
 #include "utils/diagnostics.h"

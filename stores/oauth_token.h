@@ -71,7 +71,10 @@ class OAUTHDBToken : public OAUTHDBBasic {
 
   /// Removes every row whose expiry lies before the current second, refresh
   /// tokens included. True when all removals succeeded, also when there was
-  /// nothing to remove or the rows could not be read.
+  /// nothing to remove or the rows could not be read; else false, without an
+  /// error code when another process had removed a row first. Several removals
+  /// are one transaction: when it cannot be committed, false with SQLite's code,
+  /// and every row is back. When it cannot be begun, they run one by one.
   bool Purge();
 
   // Look-ups ----------------------------------------------------------------

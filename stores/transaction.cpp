@@ -1,36 +1,47 @@
 #include "stores/transaction.h"
 
 #include <string>
-#include <utility>
 
 namespace KELDOAUTHSERVER {
+namespace {
+
+/// SQLite's code for a COMMIT that finds no transaction.
+constexpr int kNothingToCommit = 1;
+
+}  // namespace
 
 Transaction::~Transaction() {
-  if (open_) rollBack();
+  if (open_) runAside("ROLLBACK");
 }
 
 void Transaction::begin() {
-  open_ = store_.DBCmd("BEGIN IMMEDIATE;", nullptr, nullptr) != 0;
+  open_ = runAside("BEGIN IMMEDIATE");
 }
 
 bool Transaction::commit() {
-  if (!open_ || store_.DBCmd("COMMIT;", nullptr, nullptr) != 0) {
-    open_ = false;
-    return true;
+  if (!open_) return true;
+  open_ = false;
+
+  const int code = store_.GetErrCode();
+  const std::string message = store_.GetErrMsg();
+  if (store_.DBCmd("COMMIT", nullptr, nullptr) != 0) return true;
+
+  if (store_.GetErrCode() == kNothingToCommit) {
+    store_.SetErrCode(code);
+    store_.SetErrMsg(message);
+  } else {
+    runAside("ROLLBACK");
   }
-  rollBack();
   return false;
 }
 
-/// SQLite may have rolled back already; that this one then finds nothing to do
-/// must not hide the reason.
-void Transaction::rollBack() {
-  open_ = false;
+bool Transaction::runAside(const char* sql) {
   const int code = store_.GetErrCode();
   const std::string message = store_.GetErrMsg();
-  store_.DBCmd("ROLLBACK;", nullptr, nullptr);
+  const bool done = store_.DBCmd(sql, nullptr, nullptr) != 0;
   store_.SetErrCode(code);
   store_.SetErrMsg(message);
+  return done;
 }
 
 }  // namespace KELDOAUTHSERVER

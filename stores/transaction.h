@@ -15,18 +15,19 @@ class Transaction {
   Transaction(const Transaction&) = delete;
   Transaction& operator=(const Transaction&) = delete;
 
-  /// Takes the write lock at once. When that is refused the object carries the
-  /// reason and the statements that follow stand each for itself.
+  /// Takes the write lock at once. When that is refused, the statements that
+  /// follow stand each for itself, and the object's error stays as it was.
   void begin();
 
   /// True when there is nothing to commit or the commit succeeded. After a
-  /// failure everything is taken back, and the object carries the first reason:
-  /// that of a statement which made SQLite end the transaction by itself rather
-  /// than that of the COMMIT which found none.
+  /// failure everything is taken back and the object carries the reason: that of
+  /// the commit, or, where SQLite had ended the transaction by itself, that of
+  /// the statement which made it.
   bool commit();
 
  private:
-  void rollBack();
+  /// Runs `sql` without a trace on the object's error.
+  bool runAside(const char* sql);
 
   OAUTHDBBasic& store_;
   bool open_ = false;

@@ -4,7 +4,6 @@
 #include <json/reader.h>
 #include <json/value.h>
 #include <sys/random.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
@@ -50,11 +49,6 @@ class File {
 
   [[nodiscard]] bool isOpen() const { return descriptor_ >= 0; }
 
-  [[nodiscard]] bool isRegular() const {
-    struct stat status {};
-    return fstat(descriptor_, &status) == 0 && S_ISREG(status.st_mode);
-  }
-
   /// One read, taken up again when a signal interrupts it.
   ssize_t readSome(char* buffer, std::size_t size) const {
     ssize_t got = 0;
@@ -70,33 +64,28 @@ class File {
 
 // Settings ------------------------------------------------------------------
 
-/// Only a regular file is read: anything else could keep a request waiting.
+/// O_NONBLOCK: whatever stands in the file's place must not keep a request
+/// waiting.
 bool readWholeFile(const char* path, std::string& text) {
   const File file(path, O_RDONLY | O_NONBLOCK);
-  if (!file.isOpen() || !file.isRegular()) return false;
+  if (!file.isOpen()) return false;
 
   std::array<char, 4096> buffer;
-  ssize_t got = 0;
-  do {
-    got = file.readSome(buffer.data(), buffer.size());
+  for (;;) {
+    const ssize_t got = file.readSome(buffer.data(), buffer.size());
     if (got < 0) return false;
+    if (got == 0) return true;
     text.append(buffer.data(), static_cast<std::size_t>(got));
-  } while (static_cast<std::size_t>(got) == buffer.size());
-  return true;
-}
-
-/// Setting up a parser costs more than a small file takes to parse.
-Json::CharReader& settingsParser() {
-  thread_local const std::unique_ptr<Json::CharReader> parser(
-      Json::CharReaderBuilder().newCharReader());
-  return *parser;
+  }
 }
 
 /// The parser leaves a half-filled root behind when it fails, hence the bool.
 bool loadSettings(Json::Value& root) {
   std::string text;
   if (!readWholeFile(names::kSettingsFile, text)) return false;
-  return settingsParser().parse(text.data(), text.data() + text.size(), &root, nullptr);
+
+  const std::unique_ptr<Json::CharReader> parser(Json::CharReaderBuilder().newCharReader());
+  return parser->parse(text.data(), text.data() + text.size(), &root, nullptr);
 }
 
 /// 0 for everything that is not a 32-bit integer under `key` of an object.
@@ -130,18 +119,18 @@ std::string copyFormatted(const SqliteText& text) {
 // Random text ---------------------------------------------------------------
 
 constexpr std::size_t kUuidBytes = 16;
-constexpr std::size_t kPieceLength = 2 * kUuidBytes;
 
 [[noreturn]] void throwNoRandomness(int error) {
   throw std::system_error(error, std::generic_category(), "system random source");
 }
 
-/// One call to the kernel; a kernel that does not know it has the device.
+/// One call to the kernel; where it is not to be had, there is the device.
 void fillFromSystem(char* out, std::size_t size) {
   for (std::size_t filled = 0; filled < size;) {
     ssize_t got = getrandom(out + filled, size - filled, 0);
-    if (got < 0 && errno == ENOSYS) {
+    if (got < 0 && (errno == ENOSYS || errno == EPERM)) {
       const File device("/dev/urandom", O_RDONLY);
+      if (!device.isOpen()) throwNoRandomness(errno);
       got = device.readSome(out + filled, size - filled);
     }
     if (got < 0 && errno == EINTR) continue;
@@ -261,7 +250,6 @@ std::string getRemoteIP() try {
 std::string getRandomStr(unsigned int length) {
   std::string text;
   while (text.size() < length) {
-    text.reserve(text.size() + kPieceLength);
     for (const std::uint8_t byte : drawUuid()) appendHex(text, byte);
   }
   return text;

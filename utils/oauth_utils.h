@@ -15,7 +15,8 @@ namespace KELDOAUTHSERVER {
 //
 // Read afresh from names::kSettingsFile on every call, so that an edit takes
 // effect at once. A file that cannot be read or parsed, a missing key and a
-// value that is no 32-bit integer all give the default. Nothing is logged.
+// value that is no 32-bit integer (600.0 is one, 600.5 and "600" are not) all
+// give the default. Nothing is logged.
 
 /// Lifetime in seconds under `key` (names::kGrantCodeExpired or
 /// names::kTokenExpired). 600 when absent or below 1; no upper bound.

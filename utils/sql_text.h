@@ -1,6 +1,7 @@
-// SQLite's own text: its memory, and the quoting behind getSQLFormatStr for callers that have an
-// exception boundary of their own: a store must refuse an operation when memory runs out while it
-// copies a value, not store an empty text instead.
+// SQLite's own text: its memory, and the quoting behind getSQLFormatStr for
+// callers that have an exception boundary of their own: a store must refuse an
+// operation when memory runs out while it copies a value, not store an empty
+// text instead.
 
 #ifndef KELDOAUTH_UTILS_SQL_TEXT_H
 #define KELDOAUTH_UTILS_SQL_TEXT_H
