@@ -4,11 +4,11 @@
 
 #include "platform/keldcore.h"
 
-#include <linux/limits.h>
 #include <nettle/base64.h>
 #include <nettle/siv-cmac.h>
 
 #include <array>
+#include <climits>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -29,22 +29,26 @@ constexpr std::size_t kMaxEncoded = BASE64_ENCODE_RAW_LENGTH(kMaxSealed) + 1;
 using Sealed = std::array<std::uint8_t, kMaxSealed>;
 using Encoded = std::array<char, kMaxEncoded>;
 
-/// The key schedule of the key file last used in this thread: one process
-/// handles one request, but a listing decrypts thousands of values.
+/// The key last used in this thread, ready for use: one process handles one
+/// request, but a listing decrypts thousands of values. It is good for as long
+/// as the same file stands behind the same path.
 struct Schedule {
   std::array<char, PATH_MAX> path{};
+  keldcore::FileStamp stamp;
   siv_cmac_aes256_ctx context{};
 };
 
 const siv_cmac_aes256_ctx* scheduledKey() {
   thread_local Schedule schedule;
   const char* path = keldcore::keyFilePath();
-  if (std::strcmp(path, schedule.path.data()) == 0) return &schedule.context;
+  if (std::strcmp(path, schedule.path.data()) == 0 && keldcore::isUnchanged(path, schedule.stamp)) {
+    return &schedule.context;
+  }
 
-  keldcore::Key key{};
-  if (!keldcore::loadKey(path, key)) return nullptr;
-  siv_cmac_aes256_set_key(&schedule.context, key.data());
-  explicit_bzero(key.data(), key.size());
+  keldcore::Key key;
+  schedule = {};
+  if (!keldcore::loadKey(path, key, schedule.stamp)) return nullptr;
+  siv_cmac_aes256_set_key(&schedule.context, key.bytes.data());
   // The file was opened, so the path fits.
   std::snprintf(schedule.path.data(), schedule.path.size(), "%s", path);
   return &schedule.context;

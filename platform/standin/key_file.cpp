@@ -1,21 +1,20 @@
 #include "platform/standin/key_file.h"
 
 #include <fcntl.h>
-#include <linux/limits.h>
-#include <sys/random.h>
-#include <sys/stat.h>
+#include <libgen.h>
 #include <syslog.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <climits>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 
 namespace keldcore {
 namespace {
 
-/// A descriptor that closes itself.
+using PathBuffer = std::array<char, PATH_MAX>;
+
 class Descriptor {
  public:
   explicit Descriptor(int value) : value_(value) {}
@@ -32,24 +31,30 @@ class Descriptor {
   int value_;
 };
 
+/// The one line of a failed call.
 bool refuse(const char* path, const char* reason) {
   syslog(LOG_ERR, "keldcore: key file %s: %s", path, reason);
   return false;
 }
 
+bool refuse(const char* path, int error) {
+  // What O_NOFOLLOW says of a link would puzzle whoever reads the log.
+  return refuse(path, error == ELOOP ? "is a symbolic link" : std::strerror(error));
+}
+
 /// What is wrong with the file behind `status`, null for nothing.
 const char* fault(const struct stat& status) {
-  if (!S_ISREG(status.st_mode)) return "not a regular file";
+  if (!S_ISREG(status.st_mode)) return "is not a regular file";
   if (status.st_uid != geteuid()) return "belongs to another user";
-  if ((status.st_mode & (S_IRWXG | S_IRWXO)) != 0) return "open to group or others";
-  if (status.st_size != static_cast<off_t>(Key().size())) return "not 64 bytes long";
+  if ((status.st_mode & (S_IRWXG | S_IRWXO)) != 0) return "is open to group or others";
+  if (status.st_size != static_cast<off_t>(sizeof(Key::bytes))) return "is not 64 bytes long";
   return nullptr;
 }
 
 bool readAll(int descriptor, Key& key) {
   std::size_t filled = 0;
-  while (filled < key.size()) {
-    const ssize_t got = read(descriptor, key.data() + filled, key.size() - filled);
+  while (filled < key.bytes.size()) {
+    const ssize_t got = read(descriptor, key.bytes.data() + filled, key.bytes.size() - filled);
     if (got < 0 && errno == EINTR) continue;
     if (got <= 0) return false;
     filled += static_cast<std::size_t>(got);
@@ -59,62 +64,84 @@ bool readAll(int descriptor, Key& key) {
 
 bool writeAll(int descriptor, const Key& key) {
   std::size_t written = 0;
-  while (written < key.size()) {
-    const ssize_t put = write(descriptor, key.data() + written, key.size() - written);
+  while (written < key.bytes.size()) {
+    const ssize_t put = write(descriptor, key.bytes.data() + written, key.bytes.size() - written);
     if (put < 0 && errno == EINTR) continue;
-    if (put <= 0) return false;
+    if (put < 0) return false;
     written += static_cast<std::size_t>(put);
   }
-  return fsync(descriptor) == 0;
-}
-
-bool fillRandom(Key& key) {
-  // Up to 256 bytes come whole or not at all.
-  return getrandom(key.data(), key.size(), 0) == static_cast<ssize_t>(key.size());
-}
-
-/// A new name in a folder is safe only when the folder is synced, too.
-void syncFolderOf(const char* path) {
-  std::array<char, PATH_MAX> folder{};
-  std::snprintf(folder.data(), folder.size(), "%s", path);
-  char* slash = std::strrchr(folder.data(), '/');
-  if (slash == nullptr) return;
-  slash[slash == folder.data() ? 1 : 0] = '\0';
-  const Descriptor directory(open(folder.data(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (directory.isOpen()) fsync(directory.get());
-}
-
-/// Fills a private file beside `path` and gives it that name unless another
-/// process was faster: link never replaces.
-bool makeKey(const char* path) {
-  std::array<char, PATH_MAX> draft{};
-  const int length = std::snprintf(draft.data(), draft.size(), "%s.XXXXXX", path);
-  if (length < 0 || static_cast<std::size_t>(length) >= draft.size()) {
-    return refuse(path, std::strerror(ENAMETOOLONG));
-  }
-  const Descriptor file(mkostemp(draft.data(), O_CLOEXEC));
-  if (!file.isOpen()) return refuse(path, std::strerror(errno));
-
-  Key key{};
-  const bool linked = fillRandom(key) && writeAll(file.get(), key) &&
-                      (link(draft.data(), path) == 0 || errno == EEXIST);
-  const int error = errno;
-  explicit_bzero(key.data(), key.size());
-  unlink(draft.data());
-  if (!linked) return refuse(path, std::strerror(error));
-  syncFolderOf(path);
   return true;
 }
 
-Descriptor openKey(const char* path) {
-  return Descriptor(open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+/// A private file beside the key's place, under a name that is gone at the end
+/// of the scope.
+class Draft {
+ public:
+  explicit Draft(const char* path) : file_(create(path)) {}
+  ~Draft() {
+    if (file_.isOpen()) unlink(name_.data());
+  }
+  Draft(const Draft&) = delete;
+  Draft& operator=(const Draft&) = delete;
+
+  [[nodiscard]] bool isOpen() const { return file_.isOpen(); }
+
+  /// On the disk, not only in the cache: a name must never appear before the
+  /// bytes that it stands for. The mode owes nothing to the umask.
+  [[nodiscard]] bool write(const Key& key) const {
+    return fchmod(file_.get(), S_IRUSR | S_IWUSR) == 0 && writeAll(file_.get(), key) &&
+           fsync(file_.get()) == 0;
+  }
+
+  /// Never replaces: of several processes the first one wins, and the others
+  /// use its key.
+  [[nodiscard]] bool publish(const char* path) const {
+    return link(name_.data(), path) == 0 || errno == EEXIST;
+  }
+
+ private:
+  int create(const char* path) {
+    const int length = std::snprintf(name_.data(), name_.size(), "%s.XXXXXX", path);
+    if (length < 0 || static_cast<std::size_t>(length) >= name_.size()) {
+      errno = ENAMETOOLONG;
+      return -1;
+    }
+    return mkostemp(name_.data(), O_CLOEXEC);
+  }
+
+  PathBuffer name_{};
+  Descriptor file_;
+};
+
+/// A new name survives a power cut only when its folder is synced, too.
+bool syncFolderOf(const char* path) {
+  PathBuffer copy{};
+  std::snprintf(copy.data(), copy.size(), "%s", path);
+  const Descriptor folder(open(dirname(copy.data()), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  return folder.isOpen() && fsync(folder.get()) == 0;
 }
 
-bool readKey(const char* path, const Descriptor& file, Key& key) {
+bool makeKey(const char* path) {
+  Key key;
+  const Draft draft(path);
+  const bool made = draft.isOpen() && getentropy(key.bytes.data(), key.bytes.size()) == 0 &&
+                    draft.write(key) && draft.publish(path) && syncFolderOf(path);
+  return made || refuse(path, errno);
+}
+
+/// The key is no link: its place is where its folder's owner put it. And a pipe
+/// in its place must not stop us.
+int openKey(const char* path) {
+  return open(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+}
+
+bool readKey(const char* path, int descriptor, Key& key, FileStamp& stamp) {
   struct stat status {};
-  if (fstat(file.get(), &status) != 0) return refuse(path, std::strerror(errno));
+  if (fstat(descriptor, &status) != 0) return refuse(path, errno);
   if (const char* reason = fault(status)) return refuse(path, reason);
-  return readAll(file.get(), key) || refuse(path, "cannot be read");
+  if (!readAll(descriptor, key)) return refuse(path, "cannot be read");
+  stamp = FileStamp(status);
+  return true;
 }
 
 }  // namespace
@@ -124,15 +151,19 @@ const char* keyFilePath() {
   return chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE;
 }
 
-bool loadKey(const char* path, Key& key) {
-  const Descriptor present = openKey(path);
-  if (present.isOpen()) return readKey(path, present, key);
-  if (errno != ENOENT) return refuse(path, std::strerror(errno));
+bool loadKey(const char* path, Key& key, FileStamp& stamp) {
+  const Descriptor present(openKey(path));
+  if (present.isOpen()) return readKey(path, present.get(), key, stamp);
+  if (errno != ENOENT) return refuse(path, errno);
 
   if (!makeKey(path)) return false;
-  const Descriptor made = openKey(path);
-  if (!made.isOpen()) return refuse(path, std::strerror(errno));
-  return readKey(path, made, key);
+  const Descriptor made(openKey(path));
+  return made.isOpen() ? readKey(path, made.get(), key, stamp) : refuse(path, errno);
+}
+
+bool isUnchanged(const char* path, const FileStamp& stamp) {
+  struct stat status {};
+  return lstat(path, &status) == 0 && FileStamp(status) == stamp;
 }
 
 }  // namespace keldcore
