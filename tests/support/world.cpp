@@ -7,6 +7,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <system_error>
 #include <thread>
 
 namespace support {
@@ -25,8 +26,16 @@ void requireSandbox(const std::string& stateDir) {
   std::exit(2);
 }
 
-void empty(const char* folder) {
-  for (const auto& entry : fs::directory_iterator(folder)) fs::remove_all(entry.path());
+/// A checkout below /tmp is mounted there again: what is mounted is busy, and
+/// nothing behind it is touched.
+void empty(const fs::path& folder) {
+  for (const auto& entry : fs::directory_iterator(folder)) {
+    std::error_code error;
+    fs::remove(entry.path(), error);
+    if (error != std::errc::directory_not_empty) continue;
+    empty(entry.path());
+    fs::remove(entry.path(), error);
+  }
 }
 
 int collectRow(void* rows, int count, char** values, char** columns) {
