@@ -84,8 +84,8 @@ void stripLineEnd(std::string& text) {
 bool readFrom(const Input& input, const std::string& what, std::string& text) {
   if (!input.isTerminal()) return input.readInto(text);
 
+  const EchoOff silence(input.descriptor());  // before the prompt: it drops what was typed so far
   std::cerr << what << ": " << std::flush;
-  const EchoOff silence(input.descriptor());
   const bool isRead = input.readInto(text);
   std::cerr << '\n';
   return isRead;
