@@ -10,21 +10,12 @@
 #include <system_error>
 #include <thread>
 
+#include "tests/support/private_mounts.h"
+
 namespace support {
 namespace {
 
 namespace fs = std::filesystem;
-
-/// The library works on absolute paths: without private mounts over them a
-/// test would empty the state folder of the host.
-void requireSandbox(const std::string& stateDir) {
-  std::ifstream mounts("/proc/self/mountinfo");
-  for (std::string line; std::getline(mounts, line);) {
-    if (line.find(" " + stateDir + " ") != std::string::npos) return;
-  }
-  std::fprintf(stderr, "run this program through tests/support/sandbox.sh\n");
-  std::exit(2);
-}
 
 /// A checkout below /tmp is mounted there again: what is mounted is busy, and
 /// nothing behind it is touched.
@@ -48,7 +39,7 @@ int collectRow(void* rows, int count, char** values, char** columns) {
 }  // namespace
 
 void World::SetUp() {
-  requireSandbox(kStateDir);
+  requirePrivateMounts();
   empty(kStateDir);
   empty("/tmp");
   Clock::release();
