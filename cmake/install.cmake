@@ -4,10 +4,15 @@ include(CMakePackageConfigHelpers)
 
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/KeldOAuth)
 
+# The platform libraries are not the package's to name: a consumer's linker finds
+# them beside the library, or where the system has them.
+target_link_options(keldoauth INTERFACE
+  $<INSTALL_INTERFACE:-Wl,-rpath-link,$<INSTALL_PREFIX>/${CMAKE_INSTALL_LIBDIR}>)
+
 install(TARGETS keldoauth EXPORT KeldOAuthTargets
   LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT runtime NAMELINK_COMPONENT dev)
 if(TARGET keldcore)
-  install(TARGETS keldcore keldcgi EXPORT KeldOAuthTargets
+  install(TARGETS keldcore keldcgi
     LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT standin)
 endif()
 
@@ -37,6 +42,6 @@ install(FILES ${CMAKE_CURRENT_BINARY_DIR}/keldoauth.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)
 
 file(GLOB documents docs/*.md)
-install(FILES README.md CHANGELOG.md ${documents} DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT dev)
+install(FILES README.md ${documents} DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT dev)
 install(FILES examples/first_token.cpp
   DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT dev)
