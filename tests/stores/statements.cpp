@@ -1,0 +1,65 @@
+#include "tests/stores/statements.h"
+
+#include <sqlite3.h>
+
+#include <utility>
+
+#include "tests/support/allocations.h"
+
+namespace {
+
+struct State {
+  std::vector<std::string> texts;
+  std::function<void(const std::string&)> hook;
+  bool refusesCommits = false;
+  sqlite3* newest = nullptr;
+};
+State state;
+
+int onStatement(unsigned /*event*/, void* /*unused*/, void* /*statement*/, void* text) {
+  const support::Uncounted uncounted;
+  const std::string sql = static_cast<const char*>(text);
+  if (sql.rfind("--", 0) == 0) return 0;  // a step of a trigger
+  state.texts.push_back(sql);
+  if (state.hook) state.hook(sql);
+  return 0;
+}
+
+int onCommit(void* /*unused*/) {
+  return state.refusesCommits ? 1 : 0;
+}
+
+int onOpen(sqlite3* db, char** /*error*/, const struct sqlite3_api_routines* /*unused*/) {
+  state.newest = db;
+  sqlite3_trace_v2(db, SQLITE_TRACE_STMT, onStatement, nullptr);
+  sqlite3_commit_hook(db, onCommit, nullptr);
+  return SQLITE_OK;
+}
+
+}  // namespace
+
+void Statements::watch() {
+  state = {};
+  sqlite3_auto_extension(reinterpret_cast<void (*)()>(onOpen));
+}
+void Statements::clear() {
+  state.texts.clear();
+}
+std::vector<std::string> Statements::texts() {
+  return state.texts;
+}
+void Statements::before(std::function<void(const std::string&)> hook) {
+  state.hook = std::move(hook);
+}
+void Statements::refuseCommits() {
+  state.refusesCommits = true;
+}
+void Statements::dontWaitForLocks() {
+  sqlite3_busy_handler(state.newest, nullptr, nullptr);
+}
+void Statements::limitStatementsTo(int bytes) {
+  sqlite3_limit(state.newest, SQLITE_LIMIT_SQL_LENGTH, bytes);
+}
+void Statements::limitTextsTo(int bytes) {
+  sqlite3_limit(state.newest, SQLITE_LIMIT_LENGTH, bytes);
+}
