@@ -38,6 +38,9 @@ const std::vector<Command>& codeCommands();
 const std::vector<Command>& tokenCommands();
 const std::vector<Command>& logCommands();
 const Command& statusCommand();
+const Command& backupCommand();
+const Command& restoreCommand();
+const Command& rekeyCommand();
 
 }  // namespace tool
 

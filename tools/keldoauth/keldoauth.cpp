@@ -50,7 +50,9 @@ void addCommands(CLI::App& app, Invocation& invocation) {
     sub->require_subcommand(1);
     for (const Command& command : group.commands()) addCommand(*sub, command, invocation);
   }
-  addCommand(app, statusCommand(), invocation);
+  for (const auto command : {statusCommand, backupCommand, restoreCommand, rekeyCommand}) {
+    addCommand(app, command(), invocation);
+  }
 }
 
 /// What the command line got to: the group or the command that it names.

@@ -36,6 +36,7 @@ struct Arguments {
   Text codeFile;
   Text contains;
   Text displayName;
+  Text file;
   Text flowType;
   Text ip;
   Text message;
@@ -77,6 +78,7 @@ inline constexpr Option kYes{"--yes,-y", "", "Do not ask", &Arguments::yes};
 inline constexpr Option kId{"ID", "", "Row id, as 'list' shows it", &Arguments::id};
 inline constexpr Option kClientArgument{"CLIENT", "", "Row id or 64-character client identifier",
                                         &Arguments::client};
+inline constexpr Option kBackupFile{"FILE", "", "A copy of the database", &Arguments::file};
 inline constexpr Option kMessage{"MESSAGE", "", "Text of the entry", &Arguments::message};
 
 inline constexpr Option kClient{"--client", "CLIENT", "Row id or 64-character client identifier",
