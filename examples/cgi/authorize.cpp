@@ -1,0 +1,158 @@
+// /oauth/authorize: asks the user whether an application may act for them, and
+// sends the answer to the application (RFC 6749, 4.1; 7636; 9207). The web
+// server has authenticated the user.
+
+#include "core/oauth_errors.h"
+#include "examples/cgi/answer.h"
+#include "examples/cgi/clients.h"
+#include "examples/cgi/code_state.h"
+#include "examples/cgi/consent_page.h"
+#include "examples/cgi/csrf.h"
+#include "examples/cgi/encoding.h"
+#include "examples/cgi/html.h"
+#include "examples/cgi/redirect.h"
+#include "examples/cgi/scopes.h"
+#include "examples/cgi/settings.h"
+#include "stores/oauth_grantCode.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+
+namespace {
+
+using namespace service;
+using namespace KELDOAUTHSERVER;
+
+constexpr std::size_t kMaxUser = 256;
+constexpr std::size_t kChallengeBytes = 43;
+
+[[noreturn]] void refuseWithPage(int status, const std::string& why) {
+  throw Refusal{messagePage(status, "This request cannot be answered", why)};
+}
+
+/// The application's address with parameters of ours, state and issuer added.
+std::string addressWith(const AuthorizationRequest& asked, const std::string& parameters) {
+  std::string address = asked.redirect;
+  address += address.find('?') == std::string::npos ? '?' : '&';
+  address += parameters;
+  if (!asked.state.empty()) address += "&state=" + percentEncode(asked.state);
+  return address + "&iss=" + percentEncode(settings().issuer);
+}
+
+[[noreturn]] void refuse(const Request& request, const AuthorizationRequest& asked,
+                         const std::string& error, const std::string& why) {
+  throw Refusal{redirectAnswer(
+      request, addressWith(asked, "error=" + error + "&error_description=" + percentEncode(why)))};
+}
+
+/// Until client and address are known to belong together, nobody is redirected
+/// anywhere.
+void readClient(const Parameters& given, AuthorizationRequest& asked) {
+  if (given.isAnyDoubled({"client_id", "redirect_uri"})) {
+    refuseWithPage(400, "The application or its address is named twice.");
+  }
+  std::optional<Client> client = findClient(given.value("client_id"));
+  if (!client) refuseWithPage(400, "The application that sent you here is not known to this box.");
+  if (!client->enabled) {
+    refuseWithPage(403, "The administrator of this box has disabled this application.");
+  }
+  asked.client = *client;
+  asked.redirect = given.value("redirect_uri");
+  asked.redirectWasGiven = !asked.redirect.empty();
+  if (!asked.redirectWasGiven) asked.redirect = onlyAddress(client->redirects);
+  if (asked.redirect.empty() || !isRegistered(asked.redirect, client->redirects)) {
+    refuseWithPage(400, "The address to return to is not one that the application registered.");
+  }
+}
+
+bool isChallenge(const std::string& text) {
+  return text.size() == kChallengeBytes && base64UrlDecode(text).has_value();
+}
+
+std::string packedState(const AuthorizationRequest& asked) {
+  return pack(CodeState{asked.redirect, asked.redirectWasGiven, asked.challenge, asked.state});
+}
+
+/// Faults that the application hears of.
+void readRest(const Request& request, const Parameters& given, AuthorizationRequest& asked) {
+  if (!given.isDoubled("state")) asked.state = given.value("state");
+  if (given.isAnyDoubled({"state", "response_type", "response_mode", "scope", "code_challenge",
+                          "code_challenge_method"})) {
+    refuse(request, asked, "invalid_request", "A parameter occurs more than once");
+  }
+  const std::string type = given.value("response_type");
+  if (type.empty()) refuse(request, asked, "invalid_request", "response_type is missing");
+  if (type != "code") refuse(request, asked, "unsupported_response_type", "Only code is supported");
+  const std::string mode = given.value("response_mode");
+  if (!mode.empty() && mode != "query") {
+    refuse(request, asked, "invalid_request", "Only the response mode query is supported");
+  }
+  asked.challenge = given.value("code_challenge");
+  if (given.value("code_challenge_method") != "S256" || !isChallenge(asked.challenge)) {
+    refuse(request, asked, "invalid_request", "PKCE with the method S256 is required");
+  }
+  asked.scope = given.has("scope") ? given.value("scope") : asked.client.scope;
+  if (scopeNames(asked.scope).empty() || !isWithin(asked.scope, asked.client.scope)) {
+    refuse(request, asked, "invalid_scope", "The application is not registered for this scope");
+  }
+  if (packedState(asked).size() > kMaxPackedState) {
+    refuse(request, asked, "invalid_request", "state is too long");
+  }
+}
+
+AuthorizationRequest readAsked(const Request& request, const Parameters& given) {
+  AuthorizationRequest asked;
+  readClient(given, asked);
+  readRest(request, given, asked);
+  return asked;
+}
+
+/// A full table gets one chance: codes that nobody redeemed in time may go.
+std::string issueCode(const Request& request, const AuthorizationRequest& asked) {
+  for (const bool mayPurge : {true, false}) {
+    OAUTHDBGrantCode codes(names::kGrantCodeTable);
+    Json::Value issued;
+    if (codes.Add(request.user, asked.client.identifier, asked.scope, packedState(asked),
+                  getRemoteIP(), issued) != 0) {
+      return issued[names::kCode].asString();
+    }
+    if (!mayPurge || codes.GetErrCode() != errors::kGrantCodeFull.code) break;
+    codes.Purge();
+  }
+  throw Unavailable{};
+}
+
+Answer decide(const Request& request, const Parameters& given, const AuthorizationRequest& asked) {
+  if (given.isAnyDoubled({"form_token", "decision"}) ||
+      !isFormToken(given.value("form_token"), request.user, formSubject(asked))) {
+    refuseWithPage(403,
+                   "The form is too old, or it does not come from this box. "
+                   "Go back to the application and start again.");
+  }
+  const std::string decision = given.value("decision");
+  if (decision == "refuse") {
+    refuse(request, asked, "access_denied", "The user refused");
+  }
+  if (decision != "allow") refuseWithPage(400, "The form does not say what you decided.");
+  return redirectAnswer(request, addressWith(asked, "code=" + issueCode(request, asked)));
+}
+
+Answer handle(const Request& request) {
+  const bool isDecision = request.method == "POST";
+  if (!isDecision && !request.isRead()) return methodNotAllowed("GET, HEAD, POST");
+  if (isDecision && !request.isForm()) refuseWithPage(400, "This is not a form.");
+  if (request.user.empty() || request.user.size() > kMaxUser) {
+    refuseWithPage(403, "The web server does not say who you are.");
+  }
+  const std::optional<Parameters> given =
+      Parameters::parse(isDecision ? request.body : request.query);
+  if (!given) refuseWithPage(400, "The request cannot be read.");
+
+  const AuthorizationRequest asked = readAsked(request, *given);
+  return isDecision ? decide(request, *given, asked) : consentPage(request.user, asked);
+}
+
+}  // namespace
+
+int main() {
+  return serve(handle, unavailablePage);
+}

@@ -1,0 +1,80 @@
+#include "examples/cgi/consent_page.h"
+
+#include "examples/cgi/csrf.h"
+#include "examples/cgi/encoding.h"
+#include "examples/cgi/html.h"
+#include "examples/cgi/redirect.h"
+#include "examples/cgi/scopes.h"
+
+namespace service {
+namespace {
+
+std::string hidden(const char* name, const std::string& value) {
+  if (value.empty()) return {};
+  return fill("<input type=\"hidden\" name=\"{}\" value=\"{}\">\n", {name, value});
+}
+
+/// The request once more, to come back with the decision.
+std::string hiddenRequest(const std::string& user, const AuthorizationRequest& asked) {
+  return hidden("client_id", asked.client.identifier) +
+         hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
+         hidden("response_type", "code") + hidden("scope", asked.scope) +
+         hidden("state", asked.state) + hidden("code_challenge", asked.challenge) +
+         hidden("code_challenge_method", "S256") +
+         hidden("form_token", formToken(user, formSubject(asked)));
+}
+
+std::string scopeItems(const std::string& scope) {
+  std::string items;
+  for (const std::string& name : scopeNames(scope)) {
+    items += fill("<li>{}</li>\n", {inWords(name)});
+  }
+  return items;
+}
+
+/// After the form the browser is redirected to the application, and that, too,
+/// the page's policy must allow. It has no syntax for an IPv6 address.
+std::string policyTarget(const std::string& redirect) {
+  const std::string origin = originOf(redirect);
+  return origin.find('[') == std::string::npos ? origin : origin.substr(0, origin.find('/'));
+}
+
+constexpr char kQuestion[] = R"(<main class="card consent">
+<p class="eyebrow">Signed in as <strong>{}</strong></p>
+<h1><span class="app">{}</span> asks for access to your box</h1>
+<p>You will return to <strong class="address">{}</strong></p>
+<h2>It would be able to</h2>
+<ul class="scopes">
+)";
+
+constexpr char kDecision[] = R"(<div class="actions">
+<button class="primary" name="decision" value="allow">Allow</button>
+<button name="decision" value="refuse">Refuse</button>
+</div>
+</form>
+<p class="hint">Allow this only if you started it yourself and trust the application. The
+administrator of the box can take the access back at any time.</p>
+</main>
+)";
+
+}  // namespace
+
+std::string formSubject(const AuthorizationRequest& asked) {
+  std::string subject = "consent";
+  for (const std::string& part :
+       {asked.client.identifier, asked.redirect, asked.scope, asked.state, asked.challenge}) {
+    subject += "." + base64Url(part);
+  }
+  return subject;
+}
+
+Answer consentPage(const std::string& user, const AuthorizationRequest& asked) {
+  const std::string origin = originOf(asked.redirect);
+  return page(200, asked.client.name + " asks for access",
+              fill(kQuestion, {user, asked.client.name, origin}) + scopeItems(asked.scope) +
+                  "</ul>\n<form method=\"post\" action=\"/oauth/authorize\">\n" +
+                  hiddenRequest(user, asked) + kDecision,
+              policyTarget(asked.redirect));
+}
+
+}  // namespace service

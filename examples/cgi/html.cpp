@@ -1,0 +1,118 @@
+#include "examples/cgi/html.h"
+
+#include <cstddef>
+
+namespace service {
+namespace {
+
+constexpr char kReplacement[] = "\xEF\xBF\xBD";
+
+bool isContinuation(char c) {
+  return (static_cast<unsigned char>(c) & 0xC0U) == 0x80U;
+}
+
+/// How many bytes the character at the start of `text` takes; 0 when they are
+/// not UTF-8 (RFC 3629).
+std::size_t characterLength(std::string_view text) {
+  const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
+  const unsigned char first = byte(0);
+  if (first < 0x80) return 1;
+  const std::size_t length = first < 0xC2 ? 0 : first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
+  if (first > 0xF4 || length == 0 || text.size() < length) return 0;
+  for (std::size_t i = 1; i < length; ++i) {
+    if (!isContinuation(text[i])) return 0;
+  }
+  const bool overlong = (first == 0xE0 && byte(1) < 0xA0) || (first == 0xF0 && byte(1) < 0x90);
+  const bool outside = (first == 0xED && byte(1) > 0x9F) || (first == 0xF4 && byte(1) > 0x8F);
+  return overlong || outside ? 0 : length;
+}
+
+std::string_view escapeOf(char c) {
+  switch (c) {
+    case '&':
+      return "&amp;";
+    case '<':
+      return "&lt;";
+    case '>':
+      return "&gt;";
+    case '"':
+      return "&quot;";
+    case '\'':
+      return "&#39;";
+    case '\t':
+    case '\n':
+    case '\r':
+      return {};
+    default:
+      return (c >= 0 && c < ' ') || c == '\x7f' ? kReplacement : std::string_view();
+  }
+}
+
+constexpr char kHead[] = R"(<!DOCTYPE html>
+<html lang="en">
+<head>
+<meta charset="utf-8">
+<meta name="viewport" content="width=device-width, initial-scale=1">
+<meta name="color-scheme" content="light dark">
+<title>{}</title>
+<link rel="icon" href="/style/icon.svg" type="image/svg+xml">
+<link rel="stylesheet" href="/style/service.css">
+</head>
+<body>
+)";
+
+}  // namespace
+
+std::string escape(std::string_view text) {
+  std::string escaped;
+  while (!text.empty()) {
+    const std::size_t length = characterLength(text);
+    const std::string_view special = length == 0   ? kReplacement
+                                     : length == 1 ? escapeOf(text[0])
+                                                   : std::string_view();
+    escaped += special.empty() ? text.substr(0, length) : special;
+    text.remove_prefix(length == 0 ? 1 : length);
+  }
+  return escaped;
+}
+
+std::string fill(std::string_view pattern, std::initializer_list<std::string_view> texts) {
+  std::string filled;
+  for (const std::string_view text : texts) {
+    const std::size_t gap = pattern.find("{}");
+    if (gap == std::string_view::npos) break;
+    filled.append(pattern.substr(0, gap)).append(escape(text));
+    pattern.remove_prefix(gap + 2);
+  }
+  return filled.append(pattern);
+}
+
+Answer page(int status, const std::string& title, const std::string& main,
+            const std::string& formTarget) {
+  const std::string policy =
+      "default-src 'none'; style-src 'self'; img-src 'self'; base-uri 'none'; "
+      "frame-ancestors 'none'; form-action 'self'" +
+      (formTarget.empty() ? "" : " " + formTarget);
+  return Answer{status,
+                {{"Content-Type", "text/html; charset=utf-8"},
+                 {"Content-Security-Policy", policy},
+                 {"X-Frame-Options", "DENY"}},
+                fill(kHead, {title}) + main + "</body>\n</html>\n"};
+}
+
+Answer messagePage(int status, const std::string& title, const std::string& text) {
+  return page(status, title,
+              fill(R"(<main class="card message">
+<h1>{}</h1>
+<p>{}</p>
+</main>
+)",
+                   {title, text}));
+}
+
+Answer unavailablePage() {
+  return messagePage(503, "One moment, please",
+                     "The box is busy. Nothing was lost; please try again in a few seconds.");
+}
+
+}  // namespace service

@@ -1,0 +1,36 @@
+// Pages for people. Outside text gets into a page through `fill` alone, which
+// escapes it.
+
+#ifndef KELDOAUTH_EXAMPLES_CGI_HTML_H
+#define KELDOAUTH_EXAMPLES_CGI_HTML_H
+
+#include <initializer_list>
+#include <string>
+#include <string_view>
+
+#include "examples/cgi/answer.h"
+
+namespace service {
+
+/// For element content and for attributes in double quotes. Bytes that are no
+/// UTF-8, and control characters, become U+FFFD.
+std::string escape(std::string_view text);
+
+/// `pattern` with each "{}" replaced by the next of `texts`, escaped.
+std::string fill(std::string_view pattern, std::initializer_list<std::string_view> texts);
+
+/// A page with this title and the markup `main`. Its policy allows our style
+/// sheet and nothing else: no script, no frame, and forms to this server and
+/// to `formTarget` only.
+Answer page(int status, const std::string& title, const std::string& main,
+            const std::string& formTarget = "");
+
+/// A page that says one thing.
+Answer messagePage(int status, const std::string& title, const std::string& text);
+
+/// For `serve`.
+Answer unavailablePage();
+
+}  // namespace service
+
+#endif  // KELDOAUTH_EXAMPLES_CGI_HTML_H

@@ -1,0 +1,124 @@
+#include "examples/cgi/http.h"
+
+#include <algorithm>
+#include <charconv>
+#include <system_error>
+
+#include "examples/cgi/answer.h"
+
+namespace service {
+namespace {
+
+char lower(char c) {
+  return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+}
+
+/// -1 for no hexadecimal digit.
+int hexValue(char c) {
+  if (c >= '0' && c <= '9') return c - '0';
+  const char letter = lower(c);
+  return letter >= 'a' && letter <= 'f' ? letter - 'a' + 10 : -1;
+}
+
+std::string variable(const Environment& environment, const char* name) {
+  const char* value = environment(name);
+  return value == nullptr ? std::string() : std::string(value);
+}
+
+std::string mediaType(const std::string& header) {
+  std::string type = header.substr(0, header.find(';'));
+  while (!type.empty() && (type.back() == ' ' || type.back() == '\t')) type.pop_back();
+  std::transform(type.begin(), type.end(), type.begin(), lower);
+  return type;
+}
+
+std::size_t contentLength(const std::string& text) {
+  if (text.empty()) return 0;
+  std::size_t length = 0;
+  const char* end = text.data() + text.size();
+  const auto [stop, error] = std::from_chars(text.data(), end, length);
+  if (error == std::errc::result_out_of_range) throw Refusal{plainAnswer(413)};
+  if (error != std::errc() || stop != end) throw Refusal{plainAnswer(400)};
+  return length;
+}
+
+std::string readBody(std::size_t length, std::istream& input) {
+  if (length > kMaxBody) throw Refusal{plainAnswer(413)};
+  std::string body(length, '\0');
+  input.read(body.data(), static_cast<std::streamsize>(length));
+  if (static_cast<std::size_t>(input.gcount()) != length) throw Refusal{plainAnswer(400)};
+  return body;
+}
+
+}  // namespace
+
+std::optional<std::string> formDecode(std::string_view text) {
+  std::string decoded;
+  decoded.reserve(text.size());
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    char c = text[i] == '+' ? ' ' : text[i];
+    if (c == '%') {
+      if (text.size() - i < 3) return std::nullopt;
+      const int high = hexValue(text[i + 1]);
+      const int low = hexValue(text[i + 2]);
+      if (high < 0 || low < 0) return std::nullopt;
+      c = static_cast<char>(high * 16 + low);
+      i += 2;
+    }
+    if (c == '\0') return std::nullopt;
+    decoded += c;
+  }
+  return decoded;
+}
+
+bool equalWords(std::string_view a, std::string_view b) {
+  return std::equal(a.begin(), a.end(), b.begin(), b.end(),
+                    [](char x, char y) { return lower(x) == lower(y); });
+}
+
+std::optional<Parameters> Parameters::parse(std::string_view text) {
+  Parameters parameters;
+  while (!text.empty()) {
+    const std::string_view pair = text.substr(0, text.find('&'));
+    text.remove_prefix(std::min(text.size(), pair.size() + 1));
+    if (pair.empty()) continue;
+
+    const std::size_t equals = std::min(pair.find('='), pair.size());
+    std::optional<std::string> name = formDecode(pair.substr(0, equals));
+    std::optional<std::string> value = formDecode(pair.substr(std::min(equals + 1, pair.size())));
+    if (!name || !value || parameters.pairs_.size() == kMaxParameters) return std::nullopt;
+    parameters.pairs_.emplace_back(std::move(*name), std::move(*value));
+  }
+  return parameters;
+}
+
+std::string Parameters::value(std::string_view name) const {
+  for (const auto& [key, value] : pairs_) {
+    if (key == name) return value;
+  }
+  return {};
+}
+
+bool Parameters::isDoubled(std::string_view name) const {
+  return std::count_if(pairs_.begin(), pairs_.end(),
+                       [&](const auto& pair) { return pair.first == name; }) > 1;
+}
+
+bool Parameters::isAnyDoubled(std::initializer_list<std::string_view> names) const {
+  return std::any_of(names.begin(), names.end(),
+                     [this](std::string_view name) { return isDoubled(name); });
+}
+
+Request readRequest(const Environment& environment, std::istream& body) {
+  Request request;
+  request.method = variable(environment, "REQUEST_METHOD");
+  request.query = variable(environment, "QUERY_STRING");
+  request.contentType = mediaType(variable(environment, "CONTENT_TYPE"));
+  request.authorization = variable(environment, "HTTP_AUTHORIZATION");
+  request.user = variable(environment, "REMOTE_USER");
+  if (request.query.size() > kMaxQuery) throw Refusal{plainAnswer(414)};
+  request.body = readBody(contentLength(variable(environment, "CONTENT_LENGTH")), body);
+  return request;
+}
+
+}  // namespace service

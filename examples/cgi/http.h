@@ -1,0 +1,67 @@
+// A request as the web server hands it to a CGI program (RFC 3875), read with
+// hard limits: nothing outside may make a program read without end.
+
+#ifndef KELDOAUTH_EXAMPLES_CGI_HTTP_H
+#define KELDOAUTH_EXAMPLES_CGI_HTTP_H
+
+#include <cstddef>
+#include <functional>
+#include <initializer_list>
+#include <istream>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace service {
+
+inline constexpr std::size_t kMaxQuery = 8 * 1024;
+inline constexpr std::size_t kMaxBody = 16 * 1024;
+inline constexpr std::size_t kMaxParameters = 64;
+
+/// The pairs of a query or a form. A parameter without a value counts as
+/// absent (RFC 6749, 3.1).
+class Parameters {
+ public:
+  /// Nothing for bad percent-encoding, a NUL byte, or too many pairs.
+  static std::optional<Parameters> parse(std::string_view text);
+
+  /// The first value; empty when absent.
+  [[nodiscard]] std::string value(std::string_view name) const;
+  [[nodiscard]] bool has(std::string_view name) const { return !value(name).empty(); }
+
+  [[nodiscard]] bool isDoubled(std::string_view name) const;
+  [[nodiscard]] bool isAnyDoubled(std::initializer_list<std::string_view> names) const;
+
+ private:
+  std::vector<std::pair<std::string, std::string>> pairs_;
+};
+
+struct Request {
+  std::string method;
+  std::string query;
+  std::string body;
+  std::string contentType;    // lower case, without parameters
+  std::string authorization;  // the header as it came
+  std::string user;           // whom the web server has authenticated
+
+  [[nodiscard]] bool isRead() const { return method == "GET" || method == "HEAD"; }
+  [[nodiscard]] bool isForm() const { return contentType == "application/x-www-form-urlencoded"; }
+};
+
+/// As std::getenv: null for what is not set.
+using Environment = std::function<const char*(const char*)>;
+
+/// Throws Refusal (answer.h) with 400, 413 or 414 for what breaks the limits.
+Request readRequest(const Environment& environment, std::istream& body);
+
+/// `%41` and `+` as a form means them. Nothing for bad encoding or a NUL byte.
+std::optional<std::string> formDecode(std::string_view text);
+
+/// Whether two words of a header are equal but for their case.
+bool equalWords(std::string_view a, std::string_view b);
+
+}  // namespace service
+
+#endif  // KELDOAUTH_EXAMPLES_CGI_HTTP_H

@@ -1,0 +1,180 @@
+// /oauth/register: dynamic client registration (RFC 7591) for whoever has the
+// initial access token.
+
+#include <json/reader.h>
+
+#include <ctime>
+#include <memory>
+#include <sstream>
+
+#include "core/oauth_errors.h"
+#include "examples/cgi/answer.h"
+#include "examples/cgi/encoding.h"
+#include "examples/cgi/redirect.h"
+#include "examples/cgi/scopes.h"
+#include "examples/cgi/settings.h"
+#include "stores/oauth_clientInfo.h"
+#include "utils/oauth_names.h"
+
+namespace {
+
+using namespace service;
+using namespace KELDOAUTHSERVER;
+
+constexpr std::size_t kMaxName = 64;
+constexpr std::size_t kMaxRedirects = 2048;
+constexpr char kDefaultScope[] = "profile";
+constexpr char kDefaultMethod[] = "client_secret_basic";
+
+[[noreturn]] void refuse(const std::string& why) {
+  throw Refusal{oauthError(400, "invalid_client_metadata", why)};
+}
+
+[[noreturn]] void refuseRedirect(const std::string& why) {
+  throw Refusal{oauthError(400, "invalid_redirect_uri", why)};
+}
+
+void requireInitialToken(const Request& request) {
+  const std::string& expected = settings().initialAccessToken;
+  const std::string& header = request.authorization;
+  const bool bearer = equalWords(header.substr(0, header.find(' ')), "Bearer");
+  if (!bearer) {
+    throw Refusal{plainAnswer(401).with("WWW-Authenticate", "Bearer realm=\"registration\"")};
+  }
+  const std::size_t start = header.find_first_not_of(' ', header.find(' '));
+  const std::string token = start == std::string::npos ? "" : header.substr(start);
+  if (!expected.empty() && equalSecrets(token, expected)) return;
+  throw Refusal{
+      oauthError(401, "invalid_token", "Not the initial access token")
+          .with("WWW-Authenticate", "Bearer realm=\"registration\", error=\"invalid_token\"")};
+}
+
+Json::Value readMetadata(const Request& request) {
+  if (request.contentType != "application/json")
+    refuse("The content type must be application/json");
+  Json::CharReaderBuilder builder;
+  Json::CharReaderBuilder::strictMode(&builder.settings_);
+  builder["stackLimit"] = 20;
+  Json::Value metadata;
+  std::istringstream body(request.body);
+  try {
+    if (Json::parseFromStream(builder, body, &metadata, nullptr) && metadata.isObject()) {
+      return metadata;
+    }
+  } catch (const Json::Exception&) {
+    // Nested too deeply: as unreadable as the rest.
+  }
+  refuse("The body is not a JSON object");
+}
+
+/// The text under `name`; `otherwise` when absent.
+std::string text(const Json::Value& metadata, const char* name, const std::string& otherwise) {
+  const Json::Value& value = metadata[name];
+  if (value.isNull()) return otherwise;
+  if (!value.isString()) refuse(std::string(name) + " must be a string");
+  const std::string found = value.asString();
+  if (found.find('\0') != std::string::npos) refuse(std::string(name) + " has a NUL character");
+  return found;
+}
+
+/// Every text of the array under `name` must be one that we know.
+void requireKnown(const Json::Value& metadata, const char* name,
+                  std::initializer_list<const char*> known) {
+  const Json::Value& values = metadata[name];
+  if (values.isNull()) return;
+  if (!values.isArray()) refuse(std::string(name) + " must be an array");
+  for (const Json::Value& value : values) {
+    bool found = false;
+    for (const char* word : known) found = found || value == word;
+    if (!found) refuse(std::string(name) + " has a value that is not supported");
+  }
+}
+
+bool usesRedirects(const Json::Value& metadata) {
+  const Json::Value& grants = metadata["grant_types"];
+  if (grants.isNull()) return true;
+  for (const Json::Value& grant : grants) {
+    if (grant == "authorization_code") return true;
+  }
+  return false;
+}
+
+/// As the registry keeps them: without schemes, in one text.
+std::string readRedirects(const Json::Value& metadata) {
+  const Json::Value& addresses = metadata["redirect_uris"];
+  if (!addresses.isNull() && !addresses.isArray()) refuseRedirect("redirect_uris must be an array");
+  std::string stored;
+  for (const Json::Value& address : addresses) {
+    if (!address.isString() || !isRedirectAddress(address.asString())) {
+      refuseRedirect("Only https, or http on the loopback interface, without a fragment");
+    }
+    stored += (stored.empty() ? "" : " ") + withoutScheme(address.asString());
+  }
+  if (stored.empty() && usesRedirects(metadata)) refuseRedirect("redirect_uris is missing");
+  if (stored.size() > kMaxRedirects) refuseRedirect("redirect_uris is too long");
+  return stored.empty() ? kNoRedirect : stored;
+}
+
+std::string readScope(const Json::Value& metadata) {
+  const std::string scope = knownScopes(text(metadata, "scope", kDefaultScope));
+  if (scope.empty()) refuse("scope names nothing that this server knows");
+  return scope;
+}
+
+std::string readName(const Json::Value& metadata) {
+  const std::string name = text(metadata, "client_name", "Unnamed application");
+  if (name.empty() || name.size() > kMaxName) refuse("client_name must be 1 to 64 bytes long");
+  return name;
+}
+
+std::string readMethod(const Json::Value& metadata) {
+  std::string method = text(metadata, "token_endpoint_auth_method", kDefaultMethod);
+  if (method != kDefaultMethod && method != "client_secret_post") {
+    refuse("token_endpoint_auth_method is not supported: every client has a secret here");
+  }
+  return method;
+}
+
+Json::Value store(const std::string& redirects, const std::string& scope, const std::string& name) {
+  OAUTHDBClientInfo clients(names::kClientInfoTable);
+  Json::Value issued;
+  if (clients.Add(redirects, scope, name, issued) == 0) throw Unavailable{};
+  return issued;
+}
+
+Answer handle(const Request& request) {
+  if (request.method != "POST") return methodNotAllowed("POST");
+  requireInitialToken(request);
+  const Json::Value metadata = readMetadata(request);
+  requireKnown(metadata, "grant_types",
+               {"authorization_code", "refresh_token", "client_credentials"});
+  requireKnown(metadata, "response_types", {"code"});
+
+  Json::Value answer;
+  answer["token_endpoint_auth_method"] = readMethod(metadata);
+  answer["client_name"] = readName(metadata);
+  answer["scope"] = readScope(metadata);
+  const std::string redirects = readRedirects(metadata);
+  const Json::Value issued =
+      store(redirects, answer["scope"].asString(), answer["client_name"].asString());
+
+  answer["client_id"] = issued[names::kClientId];
+  answer["client_secret"] = issued[names::kClientSecret];
+  answer["client_secret_expires_at"] = 0;
+  answer["client_id_issued_at"] = static_cast<Json::Int64>(std::time(nullptr));
+  if (redirects != kNoRedirect) {
+    answer["redirect_uris"] = metadata["redirect_uris"];
+    answer["response_types"].append("code");
+    answer["grant_types"].append("authorization_code");
+    answer["grant_types"].append("refresh_token");
+  }
+  // The registry has no column for it, so what is open to one is open to all.
+  answer["grant_types"].append("client_credentials");
+  return jsonAnswer(201, answer);
+}
+
+}  // namespace
+
+int main() {
+  return serve(handle);
+}

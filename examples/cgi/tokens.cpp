@@ -1,0 +1,107 @@
+#include "examples/cgi/tokens.h"
+
+#include <ctime>
+
+#include "core/oauth_errors.h"
+#include "examples/cgi/answer.h"
+#include "examples/cgi/clients.h"
+#include "examples/cgi/encoding.h"
+#include "stores/oauth_token.h"
+#include "utils/oauth_names.h"
+
+namespace service {
+namespace {
+
+using namespace KELDOAUTHSERVER;
+
+constexpr std::size_t kTokenBytes = 64;
+
+using LookUp = bool (OAUTHDBToken::*)(const std::string&, Json::Value*);
+
+std::optional<Token> find(LookUp lookUp, const std::string& text) {
+  // The store would call another length a failure; here it is an unknown token.
+  if (text.size() != kTokenBytes) return std::nullopt;
+  OAUTHDBToken tokens(names::kTokenTable);
+  Json::Value rows;
+  if (!(tokens.*lookUp)(text, &rows)) throw Unavailable{};
+  if (rows.empty()) return std::nullopt;
+  return tokenOf(rows[0]);
+}
+
+/// A token that this service did not issue has a state of its own kind.
+TokenState stateOf(const Json::Value& row) {
+  std::optional<TokenState> state = unpackTokenState(undoubled(row[names::kState]));
+  if (state) return *state;
+  return {undoubled(row[names::kScope]), "", 0};
+}
+
+}  // namespace
+
+bool Token::isLive() const {
+  return expires >= std::time(nullptr);
+}
+
+bool Token::isRefreshable() const {
+  return flow == kFlowCode && expires + kRefreshSeconds >= std::time(nullptr);
+}
+
+Token tokenOf(const Json::Value& row) {
+  return {number(row[names::kId].asString()),
+          undoubled(row[names::kUsername]),
+          undoubled(row[names::kClientId]),
+          undoubled(row[names::kScope]),
+          undoubled(row[names::kFlowType]),
+          undoubled(row[names::kIp]),
+          number(row[names::kExpiredTime].asString()),
+          stateOf(row),
+          row[names::kAccessToken].asString(),
+          row[names::kRefreshToken].asString()};
+}
+
+std::optional<Token> findAccessToken(const std::string& text) {
+  return find(&OAUTHDBToken::GetWithAccessToken, text);
+}
+
+std::optional<Token> findRefreshToken(const std::string& text) {
+  return find(&OAUTHDBToken::GetWithRefreshToken, text);
+}
+
+std::optional<Token> verifiedToken(const std::string& text) {
+  if (text.size() != kTokenBytes) return std::nullopt;
+  OAUTHDBToken tokens(names::kTokenTable);
+  Json::Value holder;
+  if (!tokens.Verify(text, holder)) {
+    // Anything but "expired" means that the store could not look.
+    if (holder[names::kErrCode].asInt() != errors::kAccessTokenExpired.code) throw Unavailable{};
+    return std::nullopt;
+  }
+  // Verify does not name the application, and one that the administrator has
+  // disabled or removed must not get in any more.
+  Json::Value rows;
+  if (!tokens.GetWithAccessToken(text, &rows)) throw Unavailable{};
+  if (rows.empty()) return std::nullopt;
+  Token token = tokenOf(rows[0]);
+  const std::optional<Client> client = findClient(token.clientId);
+  if (!client || !client->enabled) return std::nullopt;
+  return token;
+}
+
+bool removeToken(long long id) {
+  OAUTHDBToken tokens(names::kTokenTable);
+  return tokens.Del(id) || !hadNoRow(tokens);
+}
+
+void removeTokensOfCode(const std::string& clientId, const std::string& codeDigest,
+                        long long before) {
+  OAUTHDBToken tokens(names::kTokenTable);
+  Json::Value rows;
+  if (!tokens.Get(&rows)) throw Unavailable{};
+  for (const Json::Value& row : rows) {
+    const Token token = tokenOf(row);
+    if (token.clientId == clientId && token.state.codeDigest == codeDigest &&
+        token.state.issued < before)
+      removeToken(token.id);
+  }
+}
+
+}  // namespace service

@@ -1,0 +1,59 @@
+// Token rows as the endpoints see them.
+
+#ifndef KELDOAUTH_EXAMPLES_CGI_TOKENS_H
+#define KELDOAUTH_EXAMPLES_CGI_TOKENS_H
+
+#include <json/value.h>
+
+#include <optional>
+#include <string>
+
+#include "examples/cgi/code_state.h"
+
+namespace service {
+
+/// A refresh token that nobody used for so long is worth nothing, even while
+/// its row stands.
+inline constexpr long long kRefreshSeconds = 30LL * 24 * 60 * 60;
+
+inline constexpr char kFlowCode[] = "authorization_code";
+inline constexpr char kFlowClient[] = "client_credentials";
+
+struct Token {
+  long long id;
+  std::string user;  // the client's identifier in the client's own flow
+  std::string clientId;
+  std::string scope;
+  std::string flow;
+  std::string address;
+  long long expires;
+  TokenState state;
+  std::string access;
+  std::string refresh;
+
+  [[nodiscard]] bool isLive() const;         // the access token
+  [[nodiscard]] bool isRefreshable() const;  // the refresh token
+};
+
+Token tokenOf(const Json::Value& row);
+
+/// The row of an access or of a refresh token, live or not. Throws Unavailable
+/// when the store cannot say.
+std::optional<Token> findAccessToken(const std::string& text);
+std::optional<Token> findRefreshToken(const std::string& text);
+
+/// The live token of an enabled application behind a bearer's text.
+std::optional<Token> verifiedToken(const std::string& text);
+
+/// Removes the row. False when somebody else has removed it before. Throws
+/// Unavailable.
+bool removeToken(long long id);
+
+/// Removes the tokens of a client that came from the code with this digest and were issued
+/// before `before`. For a code that comes a second time (RFC 6749, 4.1.2).
+void removeTokensOfCode(const std::string& clientId, const std::string& codeDigest,
+                        long long before);
+
+}  // namespace service
+
+#endif  // KELDOAUTH_EXAMPLES_CGI_TOKENS_H

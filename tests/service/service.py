@@ -1,0 +1,179 @@
+"""The service under test, as plain HTTP: no client library in between.
+
+Started by examples/cgi/serve, which says in the environment where the service
+is and who may log in.
+"""
+
+import base64
+import hashlib
+import html.parser
+import http.client
+import json
+import os
+import secrets
+import urllib.parse
+
+ISSUER = os.environ["SERVICE_ISSUER"]
+INITIAL_TOKEN = os.environ["SERVICE_INITIAL_TOKEN"]
+USERS = dict(pair.split(":", 1) for pair in os.environ["SERVICE_USERS"].split())
+RUN = os.environ["SERVICE_RUN"]
+CALLBACK = "http://127.0.0.1:9/callback"
+DATABASE = "/var/packages/Corvane/target/etc/oauth.db"
+SETTINGS = "/var/packages/Corvane/target/etc/oauth.cfg"
+
+FORM = {"Content-Type": "application/x-www-form-urlencoded"}
+
+
+class Answer:
+    def __init__(self, response):
+        self.status = response.status
+        self.headers = response.headers
+        self.body = response.read()
+
+    @property
+    def text(self):
+        return self.body.decode()
+
+    @property
+    def json(self):
+        return json.loads(self.body)
+
+    @property
+    def location(self):
+        return self.headers["Location"]
+
+    @property
+    def returned(self):
+        """The parameters that the application receives."""
+        pairs = urllib.parse.parse_qsl(urllib.parse.urlsplit(self.location).query)
+        assert len(dict(pairs)) == len(pairs), f"doubled parameters in {self.location}"
+        return dict(pairs)
+
+
+def send(method, path, body=None, headers=None):
+    """One request on a connection of its own; redirects are not followed."""
+    where = urllib.parse.urlsplit(ISSUER)
+    connection = http.client.HTTPConnection(where.hostname, where.port, timeout=60)
+    try:
+        connection.request(method, path, body=body, headers=headers or {})
+        return Answer(connection.getresponse())
+    finally:
+        connection.close()
+
+
+def basic(name, password):
+    return {"Authorization": "Basic " + base64.b64encode(f"{name}:{password}".encode()).decode()}
+
+
+def as_user(name):
+    return basic(name, USERS[name])
+
+
+def bearer(token):
+    return {"Authorization": f"Bearer {token}"}
+
+
+def encode(parameters):
+    """A dictionary, or pairs where one is to occur twice; None leaves it out."""
+    pairs = parameters.items() if isinstance(parameters, dict) else parameters
+    return urllib.parse.urlencode([(k, v) for k, v in pairs if v is not None])
+
+
+class Form(html.parser.HTMLParser):
+    """The hidden fields of the first form of a page."""
+
+    def __init__(self, page):
+        super().__init__()
+        self.fields = {}
+        self.done = False
+        self.feed(page)
+
+    def handle_starttag(self, tag, attributes):
+        values = dict(attributes)
+        if tag == "input" and values.get("type") == "hidden" and not self.done:
+            self.fields[values["name"]] = values["value"]
+
+    def handle_endtag(self, tag):
+        self.done = self.done or tag == "form"
+
+
+class Client:
+    """A registered application that speaks the protocol by hand."""
+
+    def __init__(self, identifier, secret, redirect=CALLBACK, **metadata):
+        self.id, self.secret, self.redirect = identifier, secret, redirect
+        self.metadata = metadata
+
+    def question(self, challenge, **changes):
+        return {"response_type": "code", "client_id": self.id, "redirect_uri": self.redirect,
+                "scope": "profile", "state": "a state", "code_challenge": challenge,
+                "code_challenge_method": "S256", **changes}
+
+    def ask(self, challenge, user="alice", **changes):
+        """The answer to the authorization request: the consent page, at best."""
+        query = encode(self.question(challenge, **changes))
+        return send("GET", "/oauth/authorize?" + query, headers=as_user(user))
+
+    def decide(self, page, decision="allow", user="alice", **changes):
+        fields = {**Form(page.text).fields, "decision": decision, **changes}
+        return send("POST", "/oauth/authorize", encode(fields), {**FORM, **as_user(user)})
+
+    def log_in(self, user="alice", **changes):
+        """A fresh code and the verifier that goes with it."""
+        verifier = secrets.token_urlsafe(48)
+        page = self.ask(challenge_of(verifier), user, **changes)
+        assert page.status == 200, (page.status, page.text)
+        answer = self.decide(page, user=user)
+        assert answer.status == 303, (answer.status, answer.text)
+        return answer.returned["code"], verifier
+
+    def post(self, endpoint, **parameters):
+        headers = {**FORM, **basic(*map(urllib.parse.quote_plus, (self.id, self.secret)))}
+        return send("POST", "/oauth/" + endpoint, encode(parameters), headers)
+
+    def redeem(self, code, verifier, **changes):
+        return self.post("token", **{"grant_type": "authorization_code", "code": code,
+                                     "redirect_uri": self.redirect, "code_verifier": verifier,
+                                     **changes})
+
+    def tokens(self, user="alice", **changes):
+        answer = self.redeem(*self.log_in(user, **changes))
+        assert answer.status == 200, (answer.status, answer.text)
+        return answer.json
+
+    def refresh(self, token, **changes):
+        return self.post("token", grant_type="refresh_token", refresh_token=token, **changes)
+
+
+def challenge_of(verifier):
+    digest = hashlib.sha256(verifier.encode()).digest()
+    return base64.urlsafe_b64encode(digest).rstrip(b"=").decode()
+
+
+def register_raw(metadata, token=INITIAL_TOKEN):
+    body = metadata if isinstance(metadata, (bytes, str)) else json.dumps(metadata)
+    return send("POST", "/oauth/register", body,
+                {"Content-Type": "application/json", **bearer(token)})
+
+
+def register(**metadata):
+    metadata = {"redirect_uris": [CALLBACK], "client_name": "Test client",
+                "scope": "profile files.read", **metadata}
+    answer = register_raw(metadata)
+    assert answer.status == 201, (answer.status, answer.text)
+    made = answer.json
+    redirects = metadata["redirect_uris"]
+    return Client(made["client_id"], made["client_secret"], redirects[0] if redirects else None)
+
+
+def whoami(token):
+    return send("GET", "/api/whoami", headers=bearer(token))
+
+
+def introspect(client, token, **more):
+    return client.post("introspect", token=token, **more)
+
+
+def error_log():
+    with open(RUN + "/error.log", encoding="utf-8", errors="replace") as log:
+        return log.read()
