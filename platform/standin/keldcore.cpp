@@ -8,9 +8,7 @@
 #include <nettle/siv-cmac.h>
 
 #include <array>
-#include <climits>
 #include <cstdint>
-#include <cstdio>
 #include <cstring>
 
 #include "platform/standin/key_file.h"
@@ -31,10 +29,8 @@ using Sealed = std::array<std::uint8_t, kMaxSealed>;
 using Encoded = std::array<char, kMaxEncoded>;
 
 /// The key last used in this thread, ready for use: one process handles one
-/// request, but a listing decrypts thousands of values. It is good for as long
-/// as the same file stands behind the same path.
+/// request, but a listing decrypts thousands of values.
 struct Schedule {
-  std::array<char, PATH_MAX> path{};
   keldcore::FileStamp stamp;
   siv_cmac_aes256_ctx context{};
 };
@@ -42,16 +38,12 @@ struct Schedule {
 const siv_cmac_aes256_ctx* scheduledKey() {
   thread_local Schedule schedule;
   const char* path = keldcore::keyFilePath();
-  if (std::strcmp(path, schedule.path.data()) == 0 && keldcore::isUnchanged(path, schedule.stamp)) {
-    return &schedule.context;
-  }
+  if (keldcore::isUnchanged(path, schedule.stamp)) return &schedule.context;
 
-  keldcore::Key key;
   schedule = {};
+  keldcore::Key key;
   if (!keldcore::loadKey(path, key, schedule.stamp)) return nullptr;
   siv_cmac_aes256_set_key(&schedule.context, key.bytes.data());
-  // The file was opened, so the path fits.
-  std::snprintf(schedule.path.data(), schedule.path.size(), "%s", path);
   return &schedule.context;
 }
 

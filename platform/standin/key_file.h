@@ -22,8 +22,8 @@ struct Key {
   Key& operator=(const Key&) = delete;
 };
 
-/// Tells one state of a file from the next: a key that was renamed into place,
-/// written over, or opened to others has another stamp.
+/// Tells one state of one file from all others: a key that was renamed into
+/// place, written over, or opened to others has another stamp.
 struct FileStamp {
   dev_t device = 0;
   ino_t inode = 0;
@@ -49,7 +49,7 @@ const char* keyFilePath();
 /// effective user, or open to anybody else, and when it cannot be made.
 bool loadKey(const char* path, Key& key, FileStamp& stamp);
 
-/// Whether the file is as it was when `stamp` was taken.
+/// Whether the file of that stamp stands there, as it was.
 bool isUnchanged(const char* path, const FileStamp& stamp);
 
 }  // namespace keldcore

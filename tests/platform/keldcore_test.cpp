@@ -146,6 +146,11 @@ TEST_F(KeldcoreTest, LargerBuffersTakeLongerTexts) {
   }
 }
 
+TEST_F(KeldcoreTest, EvenThenTextsBeyond4079BytesAreRefused) {
+  EXPECT_EQ(encrypt(std::string(4080, 'x'), 8192), std::nullopt);
+  EXPECT_EQ(decrypt(seal(countingKey(), "keldcore-1", std::string(4080, 'x')), 8192), std::nullopt);
+}
+
 TEST_F(KeldcoreTest, MegabyteIsRefused) {
   const std::string megabyte(1 << 20, 'A');
   EXPECT_EQ(encrypt(megabyte, 2 << 20), std::nullopt);

@@ -4,7 +4,6 @@
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
-#include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -151,9 +150,7 @@ TEST_P(FailedStepTest, IsOneLineAndLeavesNothingBehind) {
   SystemCalls::fail(GetParam().call, GetParam().error);
   EXPECT_EQ(encrypt("text"), std::nullopt);
   SystemCalls::release();
-  EXPECT_THAT(SystemLog::texts(), ElementsAre(std::string("keldcore: key file ") + kKeyFile + ": " +
-                                              GetParam().reason));
-  EXPECT_EQ(SystemLog::lines().front().priority, LOG_ERR);
+  expectOneLine(kKeyFile, GetParam().reason);
   EXPECT_THAT(filesIn(kStateDir), IsEmpty());
 }
 
@@ -172,8 +169,7 @@ TEST_F(KeyCreationTest, FolderThatCannotBeSyncedFailsTheCallAndKeepsTheKey) {
   SystemCalls::fail("fsync folder", EIO);
   EXPECT_EQ(encrypt("text"), std::nullopt);
   SystemCalls::release();
-  EXPECT_THAT(SystemLog::texts(),
-              ElementsAre(std::string("keldcore: key file ") + kKeyFile + ": Input/output error"));
+  expectOneLine(kKeyFile, "Input/output error");
   EXPECT_THAT(filesIn(kStateDir), ElementsAre("keldcore.key"));
   EXPECT_EQ(readFile(kKeyFile).size(), 64U);
 }
@@ -194,11 +190,10 @@ class BadPlaceTest : public KeyCreationTest, public ::testing::WithParamInterfac
 TEST_P(BadPlaceTest, IsOneLinePerCallAndNoKey) {
   writeFile("/tmp/file", "");
   useKeyFile(GetParam().path);
-  const std::string line = "keldcore: key file " + GetParam().path + ": " + GetParam().reason;
   EXPECT_EQ(encrypt("text"), std::nullopt);
-  EXPECT_THAT(SystemLog::texts(), ElementsAre(line));
+  expectOneLine(GetParam().path, GetParam().reason);
   EXPECT_EQ(decrypt("BuUUoEG87WCe74gPRP1q0g"), std::nullopt);
-  EXPECT_THAT(SystemLog::texts(), ElementsAre(line, line));
+  expectOneLine(GetParam().path, GetParam().reason);
   EXPECT_THAT(filesIn("/tmp"), ElementsAre("file"));
   EXPECT_THAT(filesIn(kStateDir), IsEmpty());
 }

@@ -3,7 +3,6 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
-#include <syslog.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -17,8 +16,10 @@ namespace {
 
 using support::FakeIds;
 using support::SystemLog;
+using ::testing::Contains;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
+using ::testing::Not;
 
 /// What the key of the bytes 0 to 63 makes of "".
 const char kCipher[] = "BuUUoEG87WCe74gPRP1q0g";
@@ -27,15 +28,6 @@ const char kOtherFile[] = "/tmp/other.key";
 class KeyFileTest : public CipherTest {
  protected:
   static std::size_t openFiles() { return filesIn("/proc/self/fd").size(); }
-
-  /// One error line with this text, and forgets it.
-  static void expectOneLine(const std::string& text) {
-    const std::vector<support::LogLine> lines = SystemLog::lines();
-    SystemLog::clear();
-    ASSERT_EQ(lines.size(), 1U);
-    EXPECT_EQ(lines.front().text, text);
-    EXPECT_EQ(lines.front().priority, LOG_ERR);
-  }
 };
 
 TEST_F(KeyFileTest, StandsInTheStateFolder) {
@@ -146,14 +138,24 @@ TEST_F(KeyFileTest, UnreadableKeyIsRefused) {
   SystemCalls::fail("read", EIO);
   EXPECT_EQ(encrypt(""), std::nullopt);
   SystemCalls::release();
-  expectOneLine(std::string("keldcore: key file ") + kKeyFile + ": cannot be read");
+  expectOneLine(kKeyFile, "cannot be read");
 }
 
 TEST_F(KeyFileTest, KeyIsNeverLogged) {
-  putKey(std::string(64, 'K') + 'K');
+  putKey(std::string(64, 'K'), kKeyFile, 0644);
   encrypt("text");
-  ASSERT_EQ(SystemLog::texts().size(), 1U);
-  EXPECT_EQ(SystemLog::texts().front().find("KK"), std::string::npos);
+  putKey(std::string(65, 'K'));
+  encrypt("text");
+  const std::vector<std::string> texts = SystemLog::texts();
+  ASSERT_EQ(texts.size(), 2U);
+  for (const std::string& text : texts) EXPECT_EQ(text.find("KK"), std::string::npos) << text;
+}
+
+TEST_F(KeyFileTest, UnchangedKeyIsReadOnce) {
+  putKey(countingKey());
+  SystemCalls::follow([](const std::string&) { return 0; });
+  for (int i = 0; i < 3; ++i) encrypt("text");
+  EXPECT_THAT(SystemCalls::names(), ElementsAre("read"));
 }
 
 TEST_F(KeyFileTest, NoDescriptorStaysOpen) {
@@ -234,11 +236,17 @@ std::vector<BadKey> BadKeyTest::all() {
 
 TEST_P(BadKeyTest, IsRefusedWithOneLinePerCall) {
   GetParam().put(kKeyFile);
-  const std::string line = std::string("keldcore: key file ") + kKeyFile + ": " + GetParam().reason;
   EXPECT_EQ(encrypt("text"), std::nullopt);
-  expectOneLine(line);
+  expectOneLine(kKeyFile, GetParam().reason);
   EXPECT_EQ(decrypt(kCipher), std::nullopt);
-  expectOneLine(line);
+  expectOneLine(kKeyFile, GetParam().reason);
+}
+
+TEST_P(BadKeyTest, NoOtherKeyIsMade) {
+  GetParam().put(kKeyFile);
+  SystemCalls::follow([](const std::string&) { return 0; });
+  encrypt("text");
+  EXPECT_THAT(SystemCalls::names(), Not(Contains("getentropy")));
 }
 
 TEST_P(BadKeyTest, StaysAsItIs) {

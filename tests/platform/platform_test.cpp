@@ -1,6 +1,7 @@
 #include "tests/platform/platform_test.h"
 
 #include <sys/stat.h>
+#include <syslog.h>
 
 #include <algorithm>
 #include <cstdio>
@@ -83,6 +84,14 @@ std::vector<std::string> CipherTest::filesIn(const std::string& folder) {
   return names;
 }
 
+void CipherTest::expectOneLine(const std::string& path, const std::string& reason) {
+  const std::vector<support::LogLine> lines = support::SystemLog::lines();
+  support::SystemLog::clear();
+  ASSERT_EQ(lines.size(), 1U);
+  EXPECT_EQ(lines.front().text, "keldcore: key file " + path + ": " + reason);
+  EXPECT_EQ(lines.front().priority, LOG_ERR);
+}
+
 Text CipherTest::encrypt(const std::string& text, std::size_t size) {
   return call("KCORECryptSzEncrypt", text, size);
 }
@@ -93,5 +102,9 @@ Text CipherTest::decrypt(const std::string& cipher, std::size_t size) {
 
 std::string CipherTest::seal(const std::string& key, const std::string& label,
                              const std::string& text) {
+  if (key.size() != 64) {
+    ADD_FAILURE() << "a key of " << key.size() << " bytes";
+    return "";
+  }
   return base64Url(siv::seal(key, {"", label}, text));
 }

@@ -45,6 +45,9 @@ class CipherTest : public support::World {
   /// The names in the folder, sorted.
   static std::vector<std::string> filesIn(const std::string& folder);
 
+  /// The log has this line alone, as an error; forgets it.
+  static void expectOneLine(const std::string& path, const std::string& reason);
+
   /// A byte behind the buffer is watched.
   static Text encrypt(const std::string& text, std::size_t size = kBuffer);
   static Text decrypt(const std::string& cipher, std::size_t size = kBuffer);
