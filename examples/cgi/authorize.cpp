@@ -14,6 +14,7 @@
 #include "examples/cgi/scopes.h"
 #include "examples/cgi/settings.h"
 #include "stores/oauth_grantCode.h"
+#include "stores/oauth_log.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -65,7 +66,8 @@ void readClient(const Parameters& given, AuthorizationRequest& asked) {
 }
 
 bool isChallenge(const std::string& text) {
-  return text.size() == kChallengeBytes && base64UrlDecode(text).has_value();
+  return text.size() == kChallengeBytes && percentEncode(text) == text &&
+         text.find_first_of(".~") == std::string::npos;
 }
 
 std::string packedState(const AuthorizationRequest& asked) {
@@ -133,7 +135,10 @@ Answer decide(const Request& request, const Parameters& given, const Authorizati
     refuse(request, asked, "access_denied", "The user refused");
   }
   if (decision != "allow") refuseWithPage(400, "The form does not say what you decided.");
-  return redirectAnswer(request, addressWith(asked, "code=" + issueCode(request, asked)));
+  const std::string code = issueCode(request, asked);
+  OAUTHDBLog log(names::kLogTable);
+  log.Add("Access allowed[" + asked.client.name + "] by " + request.user);
+  return redirectAnswer(request, addressWith(asked, "code=" + code));
 }
 
 Answer handle(const Request& request) {

@@ -177,3 +177,20 @@ def introspect(client, token, **more):
 def error_log():
     with open(RUN + "/error.log", encoding="utf-8", errors="replace") as log:
         return log.read()
+
+
+def consent(address, user="alice", decision="allow"):
+    """What a person does whom a client sent to `address`: where they end up."""
+    assert address.startswith(ISSUER), address
+    page = send("GET", address[len(ISSUER):], headers=as_user(user))
+    assert page.status == 200, (page.status, page.text)
+    fields = {**Form(page.text).fields, "decision": decision}
+    return send("POST", "/oauth/authorize", encode(fields), {**FORM, **as_user(user)}).location
+
+
+def record(client, feature, how="yes"):
+    """One cell of the table of clients and features."""
+    path = os.environ.get("SERVICE_REPORT")
+    if path:
+        with open(path, "a", encoding="utf-8") as report:
+            report.write(f"{client}\t{feature}\t{how}\n")

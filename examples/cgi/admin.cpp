@@ -1,0 +1,50 @@
+// /admin: applications, access, audit log and storage, for the administrators
+// of the box. The web server has authenticated the user.
+
+#include "examples/cgi/admin_actions.h"
+#include "examples/cgi/admin_pages.h"
+#include "examples/cgi/answer.h"
+#include "examples/cgi/csrf.h"
+#include "examples/cgi/html.h"
+#include "examples/cgi/settings.h"
+
+namespace {
+
+using namespace service;
+
+Answer show(const Request& request, const Parameters& query) {
+  const std::string view = query.value("view");
+  const std::string done = query.value("done");
+  if (view == "access") return accessPage(request.user, done, query.value("user"));
+  if (view == "log") return logPage(request.user, query.value("filter"));
+  if (view == "storage") return storagePage(request.user);
+  return applicationsPage(request.user, done, {});
+}
+
+Answer handle(const Request& request) {
+  // The web server should have kept others out; the settings have the last word.
+  if (settings().administrators.count(request.user) == 0) {
+    return messagePage(403, "Not for you", "This page is for the administrators of the box.");
+  }
+  const bool isForm = request.method == "POST";
+  if (!isForm && !request.isRead()) return methodNotAllowed("GET, HEAD, POST");
+  if (isForm && !request.isForm()) {
+    return messagePage(400, "This is not a form", "Nothing was changed.");
+  }
+  const std::optional<Parameters> given = Parameters::parse(isForm ? request.body : request.query);
+  if (!given) return messagePage(400, "The request cannot be read", "Nothing was changed.");
+  if (!isForm) return show(request, *given);
+  if (given->isDoubled("form_token") ||
+      !isFormToken(given->value("form_token"), request.user, kAdminSubject)) {
+    return messagePage(403, "This form is too old",
+                       "Or it does not come from this box. Nothing was changed; open the page "
+                       "again and repeat what you did.");
+  }
+  return act(request, *given);
+}
+
+}  // namespace
+
+int main() {
+  return serve(handle, unavailablePage);
+}

@@ -1,0 +1,114 @@
+#include "examples/cgi/admin_rows.h"
+
+#include "examples/cgi/answer.h"
+#include "examples/cgi/encoding.h"
+#include "examples/cgi/tokens.h"
+#include "stores/oauth_clientInfo.h"
+#include "stores/oauth_grantCode.h"
+#include "stores/oauth_log.h"
+#include "stores/oauth_token.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+
+namespace service {
+namespace {
+
+using namespace KELDOAUTHSERVER;
+
+Access accessOf(Access::Kind kind, const Json::Value& row) {
+  return {kind,
+          number(row[names::kId].asString()),
+          undoubled(row[names::kUsername]),
+          undoubled(row[names::kClientId]),
+          undoubled(row[names::kScope]),
+          number(row[names::kExpiredTime].asString())};
+}
+
+long long rowCount(const char* table) {
+  OAUTHDBBasic rows;
+  rows.SetTabName(table);
+  Json::Value count;
+  if (rows.DBGetRowCount(count) == 0 || count.empty()) throw Unavailable{};
+  return number(count[0].asString());
+}
+
+}  // namespace
+
+std::vector<Client> allClients() {
+  OAUTHDBClientInfo store(names::kClientInfoTable);
+  Json::Value rows;
+  if (store.Get(&rows) == 0) throw Unavailable{};
+  std::vector<Client> clients;
+  for (const Json::Value& row : rows) clients.push_back(clientOf(row));
+  return clients;
+}
+
+std::optional<Client> clientWithId(long long id) {
+  OAUTHDBClientInfo store(names::kClientInfoTable);
+  Json::Value rows;
+  if (store.Get(id, &rows) == 0) throw Unavailable{};
+  if (rows.empty()) return std::nullopt;
+  return clientOf(rows[0]);
+}
+
+std::vector<Access> allAccess() {
+  std::vector<Access> all;
+  Json::Value rows;
+  OAUTHDBToken tokens(names::kTokenTable);
+  if (!tokens.Get(&rows)) throw Unavailable{};
+  for (const Json::Value& row : rows) all.push_back(accessOf(Access::Kind::kToken, row));
+
+  OAUTHDBGrantCode codes(names::kGrantCodeTable);
+  if (codes.Get(&rows) == 0) throw Unavailable{};
+  for (const Json::Value& row : rows) all.push_back(accessOf(Access::Kind::kCode, row));
+  return all;
+}
+
+std::vector<LogEntry> logEntries(const std::string& filter) {
+  OAUTHDBLog log(names::kLogTable);
+  Json::Value rows;
+  const std::string newest = "ORDER BY id DESC LIMIT " + std::to_string(kLogRows);
+  // Messages are kept with their quotes doubled.
+  if (log.Get(getSQLFormatStr(filter), newest, &rows) == 0) throw Unavailable{};
+  std::vector<LogEntry> entries;
+  for (const Json::Value& row : rows) {
+    entries.push_back({number(row[names::kTimestamp].asString()), undoubled(row[names::kMsg])});
+  }
+  return entries;
+}
+
+std::vector<Fill> tableFill() {
+  return {
+      {"Applications", rowCount(names::kClientInfoTable), getTableRowMax(names::kClientInfoMax)},
+      {"Codes", rowCount(names::kGrantCodeTable), getTableRowMax(names::kGrantCodeMax)},
+      {"Tokens", rowCount(names::kTokenTable), getTableRowMax(names::kTokenMax)},
+      {"Audit log", rowCount(names::kLogTable), getTableRowMax(names::kLogMax)}};
+}
+
+bool setEnabled(long long id, bool enabled) {
+  OAUTHDBClientInfo store(names::kClientInfoTable);
+  return (enabled ? store.Enable(id) : store.Disable(id)) != 0 || !hadNoRow(store);
+}
+
+bool removeAccess(Access::Kind kind, long long id) {
+  if (kind == Access::Kind::kToken) return removeToken(id);
+  OAUTHDBGrantCode codes(names::kGrantCodeTable);
+  return codes.Del(id) != 0 || !hadNoRow(codes);
+}
+
+bool removeClient(const Client& client) {
+  OAUTHDBClientInfo store(names::kClientInfoTable);
+  // First of all it must not get in again.
+  if (store.Del(client.id) == 0 && hadNoRow(store)) return false;
+  for (const Access& access : allAccess()) {
+    if (access.clientId == client.identifier) removeAccess(access.kind, access.id);
+  }
+  return true;
+}
+
+void note(const std::string& text) {
+  OAUTHDBLog log(names::kLogTable);
+  log.Add(text);
+}
+
+}  // namespace service

@@ -1,0 +1,64 @@
+// What the administrator's page reads from the stores and changes in them. All
+// of it throws Unavailable when a store cannot say.
+
+#ifndef KELDOAUTH_EXAMPLES_CGI_ADMIN_ROWS_H
+#define KELDOAUTH_EXAMPLES_CGI_ADMIN_ROWS_H
+
+#include <map>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "examples/cgi/clients.h"
+
+namespace service {
+
+std::vector<Client> allClients();
+std::optional<Client> clientWithId(long long id);
+
+/// What lets an application act for a user: a pair of tokens, or a code that
+/// has not been redeemed yet.
+struct Access {
+  enum class Kind { kToken, kCode };
+  Kind kind;
+  long long id;
+  std::string user;
+  std::string clientId;
+  std::string scope;
+  long long expires;
+};
+
+std::vector<Access> allAccess();
+
+struct LogEntry {
+  long long time;
+  std::string text;
+};
+
+inline constexpr int kLogRows = 200;
+
+/// The newest kLogRows entries that contain `filter`, the newest first.
+std::vector<LogEntry> logEntries(const std::string& filter);
+
+struct Fill {
+  const char* what;
+  long long rows;
+  int limit;
+};
+
+/// How full each table is.
+std::vector<Fill> tableFill();
+
+/// False when there is no such row any more.
+bool setEnabled(long long id, bool enabled);
+bool removeAccess(Access::Kind kind, long long id);
+
+/// The application with everything that lets it in.
+bool removeClient(const Client& client);
+
+/// One line for the audit log. Whether it could be stored changes nothing.
+void note(const std::string& text);
+
+}  // namespace service
+
+#endif  // KELDOAUTH_EXAMPLES_CGI_ADMIN_ROWS_H

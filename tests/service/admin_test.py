@@ -1,0 +1,160 @@
+"""The administrator's page, without a browser: what its forms do and refuse."""
+
+import html
+import re
+import sqlite3
+import unittest
+
+import service
+from service import FORM, Form, as_user, encode, register, send, whoami
+
+
+def show(query="", user="admin"):
+    return send("GET", "/admin" + query, headers=as_user(user))
+
+
+def submit(action, token=None, **fields):
+    token = Form(show().text).fields["form_token"] if token is None else token
+    return send("POST", "/admin", encode({"action": action, "form_token": token, **fields}),
+                {**FORM, **as_user("admin")})
+
+
+def row_of(client):
+    """The row of an application, by the identifier that the page shows."""
+    item = next(part for part in show().text.split('<li class="card">') if client.id in part)
+    return re.search(r'name="id" value="(\d+)"', item).group(1)
+
+
+class Page(unittest.TestCase):
+    def test_is_for_administrators_alone(self):
+        self.assertEqual(send("GET", "/admin").status, 401)
+        self.assertIn(show(user="alice").status, (401, 403))
+
+    def test_policy_allows_no_script(self):
+        for query in ("", "?view=access", "?view=log", "?view=storage"):
+            answer = show(query)
+            self.assertEqual(answer.status, 200, query)
+            policy = answer.headers["Content-Security-Policy"]
+            self.assertIn("default-src 'none'", policy)
+            self.assertNotIn("unsafe", policy)
+            self.assertNotIn("<script", answer.text)
+            self.assertEqual(answer.headers["Cache-Control"], "no-store")
+
+    def test_style_is_served(self):
+        self.assertEqual(send("GET", "/style/service.css").headers.get_content_type(), "text/css")
+        self.assertEqual(send("GET", "/style/../http.cpp").status, 404)
+
+
+class Applications(unittest.TestCase):
+    def test_registered_one_works_and_its_secret_is_shown_once(self):
+        answer = submit("register", name="O'Brien's <Viewer>", redirect=service.CALLBACK,
+                        **{"scope.profile": "1"})
+        self.assertEqual(answer.status, 200)
+        identifier, secret = re.findall(r"<code[^>]*>([0-9a-f]{64})</code>", answer.text)
+        client = service.Client(identifier, secret)
+        self.assertEqual(whoami(client.tokens()["access_token"]).status, 200)
+        page = show().text
+        self.assertNotIn(secret, page)
+        self.assertIn(html.escape("O'Brien's <Viewer>").replace("&#x27;", "&#39;"), page)
+
+    def test_faulty_draft_comes_back_with_what_was_typed(self):
+        for redirect in ("http://evil.example/", "javascript:alert(1)", "https://a.example/#x"):
+            answer = submit("register", name="My <app>", redirect=redirect,
+                            **{"scope.profile": "1"})
+            self.assertEqual(answer.status, 400)
+            self.assertIn('role="alert"', answer.text)
+            self.assertIn('value="My &lt;app&gt;"', answer.text)
+
+    def test_disabled_one_gets_nothing_until_enabled(self):
+        client = register()
+        pair = client.tokens()
+        row = row_of(client)
+        self.assertEqual(submit("disable", id=row).location, "/admin?done=disabled")
+        self.assertEqual(client.ask("x" * 43).status, 403)
+        self.assertEqual(client.refresh(pair["refresh_token"]).json["error"], "invalid_client")
+        self.assertEqual(whoami(pair["access_token"]).status, 401)
+        self.assertEqual(submit("enable", id=row).location, "/admin?done=enabled")
+        self.assertEqual(whoami(pair["access_token"]).status, 200)
+
+    def test_removed_one_leaves_no_token_behind(self):
+        client = register()
+        access = client.tokens()["access_token"]
+        client.log_in()
+        self.assertEqual(submit("remove", id=row_of(client)).location, "/admin?done=removed")
+        self.assertEqual(whoami(access).status, 401)
+        self.assertNotIn(client.id, show().text)
+        with sqlite3.connect(service.DATABASE) as file:
+            tokens = file.execute("SELECT count(*) FROM oauth_token WHERE access_token=?",
+                                  (access,)).fetchone()
+        self.assertEqual(tokens, (0,))
+
+
+class Access(unittest.TestCase):
+    def test_revoked_access_is_gone(self):
+        access = register(client_name="Revoked").tokens("bob")["access_token"]
+        page = show("?view=access&user=bob")
+        self.assertIn("Revoked", page.text)
+        fields = Form(page.text[page.text.index('method="post"') - 6:]).fields
+        answer = submit("revoke", **{k: fields[k] for k in ("id", "kind", "user")})
+        self.assertEqual(answer.location, "/admin?done=revoked&view=access&user=bob")
+        self.assertEqual(whoami(access).status, 401)
+
+    def test_row_of_somebody_else_is_not_touched(self):
+        access = register().tokens("alice")["access_token"]
+        with sqlite3.connect(service.DATABASE) as file:
+            row = file.execute("SELECT id FROM oauth_token WHERE access_token=?",
+                               (access,)).fetchone()[0]
+        answer = submit("revoke", id=row, kind="token", user="bob")
+        self.assertIn("done=gone", answer.location)
+        self.assertEqual(whoami(access).status, 200)
+
+    def test_user_with_a_quote_is_found(self):
+        register(client_name="Quoted").tokens("o'neil")
+        self.assertIn("Quoted", show("?view=access&user=o%27neil").text)
+        self.assertIn("o&#39;neil", show("?view=access").text)
+
+
+class AuditLog(unittest.TestCase):
+    def test_filter_finds_quotes_and_shows_them_undoubled(self):
+        register(client_name="Joe's app")
+        register(client_name="Another")
+        page = show("?view=log&filter=Joe%27s").text
+        self.assertIn("Application registed[Joe&#39;s app]", page)
+        self.assertNotIn("[Another]", page)
+
+    def test_login_and_changes_leave_an_entry(self):
+        client = register(client_name="Traced")
+        client.log_in()
+        submit("disable", id=row_of(client))
+        page = show("?view=log&filter=Traced").text
+        self.assertIn("Access allowed[Traced] by alice", page)
+        self.assertIn("Application disabled[Traced] by admin", page)
+
+
+class Storage(unittest.TestCase):
+    def test_rows_stand_beside_their_limits(self):
+        with sqlite3.connect(service.DATABASE) as file:
+            count = file.execute("SELECT count(*) FROM oauth_clientInfo").fetchone()[0]
+        self.assertIn(f"<strong>{count}</strong> of 1000 rows", show("?view=storage").text)
+
+
+class Forgery(unittest.TestCase):
+    def test_form_without_a_token_of_ours_changes_nothing(self):
+        client = register()
+        row = row_of(client)
+        genuine = Form(show().text).fields["form_token"]
+        consent = Form(client.ask("x" * 43, "admin").text).fields["form_token"]
+        late = "1" + genuine[10:] if genuine[10] == "." else "1." + genuine.split(".")[1]
+        for token in ("", "x", genuine[:-1], "9" + genuine, consent, late):
+            self.assertEqual(submit("disable", token, id=row).status, 403, token)
+        self.assertEqual(client.ask("x" * 43).status, 200)
+
+    def test_query_does_not_change_anything(self):
+        client = register()
+        genuine = Form(show().text).fields["form_token"]
+        show(f"?action=disable&id={row_of(client)}&form_token={genuine}")
+        self.assertEqual(client.ask("x" * 43).status, 200)
+
+
+if __name__ == "__main__":
+    unittest.main()
