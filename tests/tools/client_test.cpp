@@ -1,0 +1,306 @@
+// keldoauth client.
+
+#include "tests/tools/cli.h"
+
+namespace cli {
+namespace {
+
+using testing::EndsWith;
+using testing::HasSubstr;
+using testing::MatchesRegex;
+using testing::Not;
+using testing::StartsWith;
+
+class ClientCommand : public CliTest {
+ protected:
+  static Arguments addArguments(const std::string& redirect, const std::string& scope,
+                                const std::string& name) {
+    return {"client", "add", "--redirect-uri", redirect, "--scope", scope, "--name", name};
+  }
+
+  static Json::Value shown(const Json::Value& client) {
+    return json({"client", "show", client["id"].asString()})["client"];
+  }
+};
+
+// add ---------------------------------------------------------------------------
+
+TEST_F(ClientCommand, AddShowsGeneratedIdentifierAndSecretInFull) {
+  const Json::Value client = addClient();
+  EXPECT_THAT(client["client_id"].asString(), MatchesRegex("[0-9a-f]{64}"));
+  EXPECT_THAT(client["client_secret"].asString(), MatchesRegex("[0-9a-f]{64}"));
+  EXPECT_NE(client["client_id"], client["client_secret"]);
+}
+
+TEST_F(ClientCommand, AddAnswersWithTheStoredRow) {
+  const Json::Value client = addClient();
+  EXPECT_EQ(client["id"], Json::Value(1));
+  EXPECT_EQ(client["enabled"], Json::Value(true));
+  EXPECT_EQ(client["redirect_uri"], "frame.example.org/back");
+  EXPECT_EQ(client["scope"], "profile photos");
+  EXPECT_EQ(client["display_name"], "Photo Frame");
+}
+
+TEST_F(ClientCommand, AddTellsPeopleIdentifierAndSecret) {
+  const Outcome added = run(addArguments("app:/back", "x", "Player"));
+  EXPECT_THAT(added, ExitsWith(kOk));
+  const std::vector<std::string> said = lines(added.out);
+  ASSERT_EQ(said.size(), 3U);
+  EXPECT_EQ(said[0], "Registered client 1 (Player).");
+  EXPECT_THAT(said[1], MatchesRegex("client id      [0-9a-f]{64}"));
+  EXPECT_THAT(said[2], MatchesRegex("client secret  [0-9a-f]{64}"));
+}
+
+TEST_F(ClientCommand, AddWritesTheAuditLog) {
+  addClient();
+  EXPECT_EQ(sqlText("SELECT msg FROM oauth_log"), "Application registed[Photo Frame]");
+}
+
+TEST_F(ClientCommand, AddTakesAnIdentifier) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--client-id", support::id64('c')});
+  EXPECT_EQ(json(arguments)["client"]["client_id"], support::id64('c'));
+}
+
+TEST_F(ClientCommand, AddRefusesAnIdentifierThatExists) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--client-id", support::id64('c')});
+  ASSERT_THAT(run(arguments), ExitsWith(kOk));
+  const Outcome again = run(arguments);
+  EXPECT_THAT(again, ExitsWith(kRefused));
+  EXPECT_THAT(again.err, HasSubstr("UNIQUE constraint failed: oauth_clientInfo.client_id (19)"));
+  EXPECT_THAT(again.err, HasSubstr("hint: another row has this identifier already"));
+}
+
+TEST_F(ClientCommand, AddDisabled) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.emplace_back("--disabled");
+  EXPECT_EQ(json(arguments)["client"]["enabled"], Json::Value(false));
+}
+
+TEST_F(ClientCommand, AddTakesTheSecretFromStandardInput) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--secret-file", "-"});
+  ASSERT_THAT(run(arguments, support::id64('s') + "\n"), ExitsWith(kOk));
+  EXPECT_EQ(json({"client", "show", "1", "--reveal"})["client"]["client_secret"],
+            support::id64('s'));
+}
+
+TEST_F(ClientCommand, AddTakesTheSecretFromAFile) {
+  writeFile("/tmp/secret", support::id64('s') + "\r\n");
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--secret-file", "/tmp/secret"});
+  ASSERT_THAT(run(arguments), ExitsWith(kOk));
+  EXPECT_EQ(json({"client", "show", "1", "--reveal"})["client"]["client_secret"],
+            support::id64('s'));
+}
+
+TEST_F(ClientCommand, AddMasksASecretThatWasHandedIn) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--secret-file", "-"});
+  const Outcome added = run(arguments, support::id64('s'));
+  EXPECT_THAT(added.out, HasSubstr("client secret  ssssss…\n"));
+  EXPECT_THAT(added.out, Not(HasSubstr(support::id64('s'))));
+}
+
+TEST_F(ClientCommand, AddRevealsASecretThatWasHandedIn) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--secret-file", "-", "--reveal"});
+  EXPECT_EQ(json(arguments, support::id64('s'))["client"]["client_secret"], support::id64('s'));
+}
+
+TEST_F(ClientCommand, AddNamesTheValueThatIsRefused) {
+  struct Case {
+    Arguments arguments;
+    std::string hint;
+  };
+  const std::vector<Case> cases{
+      {addArguments("https://ab", "x", "n"),
+       "--redirect-uri without its scheme: 3 to 2048 bytes, not 2"},
+      {addArguments("app:/back", "", "n"), "--scope: 1 to 2048 bytes, not 0"},
+      {addArguments("app:/back", std::string(2049, 'x'), "n"),
+       "--scope: 1 to 2048 bytes, not 2049"},
+      {addArguments("app:/back", "x", std::string(65, 'n')), "--name: 1 to 64 bytes, not 65"},
+  };
+  for (const Case& refused : cases) {
+    const Outcome outcome = run(refused.arguments);
+    EXPECT_THAT(outcome, ExitsWith(kRefused));
+    EXPECT_EQ(outcome.err,
+              "keldoauth: client add: Bad parameters (-2)\nhint: " + refused.hint + "\n");
+  }
+  EXPECT_EQ(rowCount("oauth_clientInfo"), "0");
+}
+
+TEST_F(ClientCommand, AddNamesASecretOfAnotherLength) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--secret-file", "-"});
+  const Outcome refused = run(arguments, "short\n");
+  EXPECT_THAT(refused, ExitsWith(kRefused));
+  EXPECT_THAT(refused.err, HasSubstr("--secret-file: 64 bytes, not 5"));
+}
+
+TEST_F(ClientCommand, AddToAFullTable) {
+  writeSettings(R"({"client_info_max": 1})");
+  addClient();
+  const Outcome full = run(addArguments("app:/back", "x", "Player"));
+  EXPECT_THAT(full, ExitsWith(kRefused));
+  EXPECT_THAT(full.err, StartsWith("keldoauth: client add: ClientInfo Table is full (-5)\nhint: "));
+  EXPECT_THAT(full.err, HasSubstr("client_info_max"));
+}
+
+// list and show -----------------------------------------------------------------
+
+TEST_F(ClientCommand, ListOfNone) {
+  EXPECT_EQ(run({"client", "list"}).out, "No clients.\n");
+  EXPECT_EQ(json({"client", "list"})["clients"], Json::Value(Json::arrayValue));
+}
+
+TEST_F(ClientCommand, ListIsATable) {
+  const std::string identifier = addClient()["client_id"].asString();
+  addClient("Player");
+  const std::vector<std::string> shown = lines(run({"client", "list"}).out);
+  ASSERT_EQ(shown.size(), 3U);
+  EXPECT_THAT(shown[0], MatchesRegex("ID +ENABLED +NAME +CLIENT ID +REDIRECT URI +SCOPE"));
+  EXPECT_THAT(shown[1], StartsWith("1   yes      Photo Frame  " + identifier));
+  EXPECT_THAT(shown[2], StartsWith("2   yes      Player "));
+}
+
+TEST_F(ClientCommand, ListMasksSecrets) {
+  const std::string secret = addClient()["client_secret"].asString();
+  const Json::Value listed = json({"client", "list"})["clients"][0];
+  EXPECT_EQ(listed["client_secret"], secret.substr(0, 6) + kMask);
+  EXPECT_EQ(json({"client", "list", "--reveal"})["clients"][0]["client_secret"], secret);
+}
+
+TEST_F(ClientCommand, ShowByRowIdAndByIdentifier) {
+  const Json::Value client = addClient();
+  EXPECT_EQ(shown(client)["display_name"], "Photo Frame");
+  EXPECT_EQ(json({"client", "show", client["client_id"].asString()})["client"], shown(client));
+}
+
+TEST_F(ClientCommand, ShowMasksTheSecret) {
+  const std::string secret = addClient()["client_secret"].asString();
+  const Outcome masked = run({"client", "show", "1"});
+  EXPECT_THAT(masked.out, HasSubstr("client secret  " + secret.substr(0, 6) + "…\n"));
+  EXPECT_THAT(run({"client", "show", "1", "--reveal"}).out, HasSubstr(secret));
+}
+
+TEST_F(ClientCommand, UnknownClientsAreNotFound) {
+  for (const std::string client : {"7", "9223372036854775807"}) {
+    const Outcome outcome = run({"client", "show", client});
+    EXPECT_THAT(outcome, ExitsWith(kNotFound));
+    EXPECT_EQ(outcome.err, "keldoauth: client show: no such client " + client + "\n");
+  }
+  const Outcome outcome = run({"client", "show", support::id64('a')});
+  EXPECT_THAT(outcome, ExitsWith(kNotFound));
+  EXPECT_EQ(outcome.err, "keldoauth: client show: no such client\n");
+}
+
+TEST_F(ClientCommand, ADigitsOnlyIdentifierIsNoRowId) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--client-id", support::id64('1')});
+  ASSERT_THAT(run(arguments), ExitsWith(kOk));
+  EXPECT_EQ(json({"client", "show", support::id64('1')})["client"]["id"], Json::Value(1));
+}
+
+TEST_F(ClientCommand, OtherNamesOfClientsAreUsageErrors) {
+  for (const std::string client :
+       {"abc", "-1", "1x", "0x1", " 1", "9223372036854775808", "", "+1"}) {
+    EXPECT_THAT(run({"client", "show", "--", client}), ExitsWith(kUsage)) << client;
+  }
+}
+
+// edit --------------------------------------------------------------------------
+
+TEST_F(ClientCommand, EditChangesWhatIsGiven) {
+  const Json::Value before = shown(addClient());
+  const Json::Value after = json({"client", "edit", "1", "--scope", "all"})["client"];
+  Json::Value expected = before;
+  expected["scope"] = "all";
+  EXPECT_EQ(after, expected);
+  EXPECT_EQ(shown(before), expected);
+}
+
+TEST_F(ClientCommand, EditStoresTheAddressWithItsScheme) {
+  addClient();
+  const Json::Value after =
+      json({"client", "edit", "1", "--redirect-uri", "https://other.example.org"})["client"];
+  EXPECT_EQ(after["redirect_uri"], "https://other.example.org");
+}
+
+TEST_F(ClientCommand, EditKeepsQuotesInWhatItDoesNotChange) {
+  addClient("O'Neil's ''frame''");
+  const std::string name = sqlText("SELECT display_name FROM oauth_clientInfo");
+  run({"client", "edit", "1", "--scope", "one"});
+  run({"client", "edit", "1", "--scope", "two"});
+  EXPECT_EQ(sqlText("SELECT display_name FROM oauth_clientInfo"), name);
+  EXPECT_EQ(sqlText("SELECT scope FROM oauth_clientInfo"), "two");
+}
+
+TEST_F(ClientCommand, EditByIdentifier) {
+  const std::string identifier = addClient()["client_id"].asString();
+  EXPECT_EQ(json({"client", "edit", identifier, "--name", "New"})["client"]["display_name"], "New");
+}
+
+TEST_F(ClientCommand, EditWithoutAChange) {
+  addClient();
+  EXPECT_THAT(run({"client", "edit", "1"}), ExitsWith(kUsage));
+}
+
+TEST_F(ClientCommand, EditOfAnUnknownClient) {
+  EXPECT_THAT(run({"client", "edit", "1", "--name", "New"}), ExitsWith(kNotFound));
+}
+
+TEST_F(ClientCommand, EditNamesTheValueThatIsRefused) {
+  addClient();
+  const Outcome refused = run({"client", "edit", "1", "--name", ""});
+  EXPECT_THAT(refused, ExitsWith(kRefused));
+  EXPECT_EQ(refused.err,
+            "keldoauth: client edit: Bad parameters (-2)\nhint: --name: 1 to 64 bytes, not 0\n");
+}
+
+// enable, disable, remove ---------------------------------------------------------
+
+TEST_F(ClientCommand, DisableAndEnable) {
+  const Json::Value client = addClient();
+  EXPECT_EQ(run({"client", "disable", "1"}).out, "Disabled client 1 (Photo Frame).\n");
+  EXPECT_EQ(shown(client)["enabled"], Json::Value(false));
+  EXPECT_EQ(run({"client", "enable", "1"}).out, "Enabled client 1 (Photo Frame).\n");
+  EXPECT_EQ(shown(client)["enabled"], Json::Value(true));
+}
+
+TEST_F(ClientCommand, EnableTwiceIsFine) {
+  addClient();
+  EXPECT_EQ(json({"client", "enable", "1"})["client"]["enabled"], Json::Value(true));
+}
+
+TEST_F(ClientCommand, SwitchingAnUnknownClient) {
+  EXPECT_THAT(run({"client", "enable", "1"}), ExitsWith(kNotFound));
+  EXPECT_THAT(run({"client", "disable", "1"}), ExitsWith(kNotFound));
+}
+
+TEST_F(ClientCommand, RemoveTakesTheRowAway) {
+  addClient();
+  addClient("Player");
+  const Json::Value removed = json({"client", "remove", "1", "--yes"})["client"];
+  EXPECT_EQ(removed["display_name"], "Photo Frame");
+  EXPECT_EQ(sqlText("SELECT display_name FROM oauth_clientInfo"), "Player");
+}
+
+TEST_F(ClientCommand, RemoveLeavesCodesAndTokens) {
+  addClient();
+  issueCode();
+  issueToken();
+  EXPECT_EQ(run({"client", "remove", "1", "-y"}).out, "Removed client 1 (Photo Frame).\n");
+  EXPECT_EQ(rowCount("oauth_grantCode"), "1");
+  EXPECT_EQ(rowCount("oauth_token"), "1");
+}
+
+TEST_F(ClientCommand, RemoveOfAnUnknownClientDoesNotAsk) {
+  const Outcome outcome = run({"client", "remove", "1"});
+  EXPECT_THAT(outcome, ExitsWith(kNotFound));
+  EXPECT_THAT(outcome.err, EndsWith("no such client 1\n"));
+}
+
+}  // namespace
+}  // namespace cli

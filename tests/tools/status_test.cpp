@@ -1,0 +1,299 @@
+// keldoauth status.
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "tests/tools/cli.h"
+
+namespace cli {
+namespace {
+
+using testing::Contains;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::MatchesRegex;
+using testing::Not;
+
+class Status : public CliTest {
+ protected:
+  void SetUp() override {
+    CliTest::SetUp();
+    ::chmod(kStateDir, 0700);
+  }
+
+  /// "subject: message" of every problem.
+  static std::vector<std::string> problems(int exit = kUnhealthy) {
+    std::vector<std::string> found;
+    const Json::Value status = json({"status"}, "", exit);
+    for (const Json::Value& problem : status["problems"]) {
+      found.push_back(problem["subject"].asString() + ": " + problem["message"].asString());
+    }
+    return found;
+  }
+};
+
+// When all is well ------------------------------------------------------------------
+
+TEST_F(Status, OfAFreshInstallation) {
+  const Json::Value status = json({"status"});
+  EXPECT_THAT(problems(kOk), IsEmpty());
+  EXPECT_EQ(status["database"]["ready"], Json::Value(false));
+  EXPECT_EQ(status["database"]["message"], "does not exist yet; the first use creates it");
+  EXPECT_FALSE(std::filesystem::exists(kDatabase)) << "status must not create it";
+}
+
+TEST_F(Status, FilesWithOwnerAndMode) {
+  addClient();
+  const Json::Value files = json({"status"})["files"];
+  EXPECT_EQ(files["folder"]["path"], kStateDir);
+  EXPECT_EQ(files["folder"]["mode"], "0700");
+  EXPECT_EQ(files["database"]["path"], kDatabase);
+  EXPECT_EQ(files["database"]["owner"], "root");
+  EXPECT_EQ(files["database"]["group"], "root");
+  EXPECT_EQ(files["database"]["mode"], "0600");
+  EXPECT_EQ(files["database"]["size"].asUInt64(), std::filesystem::file_size(kDatabase));
+  EXPECT_EQ(files["settings"]["exists"], Json::Value(false));
+  EXPECT_EQ(files["settings"]["mode"], Json::Value());
+  EXPECT_EQ(files["debug_flag"]["path"], kFlagFile);
+}
+
+TEST_F(Status, OwnersWithoutANameAreNumbers) {
+  if (!canBecomeNobody()) GTEST_SKIP() << "no other user in this namespace";
+  addClient();
+  ASSERT_EQ(::chown(kDatabase, 54321, 54322), 0);
+  const Json::Value file = json({"status"})["files"]["database"];
+  EXPECT_EQ(file["owner"], "54321");
+  EXPECT_EQ(file["group"], "54322");
+}
+
+TEST_F(Status, RowsAgainstLimits) {
+  writeSettings(R"({"client_info_max": 50, "log_max": 70})");
+  addClient();
+  issueCode();
+  issueCode();
+  issueToken();
+  expireIn("oauth_grantCode", 1, -5);
+  const Json::Value tables = json({"status"})["database"]["tables"];
+  ASSERT_EQ(tables.size(), 4U);
+  EXPECT_EQ(tables[0]["name"], "oauth_clientInfo");
+  EXPECT_EQ(tables[0]["rows"], Json::Value(1));
+  EXPECT_EQ(tables[0]["limit"], Json::Value(50));
+  EXPECT_EQ(tables[0]["limit_key"], "client_info_max");
+  EXPECT_EQ(tables[0]["expired"], Json::Value());
+  EXPECT_EQ(tables[1]["rows"], Json::Value(2));
+  EXPECT_EQ(tables[1]["expired"], Json::Value(1));
+  EXPECT_EQ(tables[2]["rows"], Json::Value(1));
+  EXPECT_EQ(tables[2]["expired"], Json::Value(0));
+  EXPECT_EQ(tables[3]["limit"], Json::Value(70));
+}
+
+TEST_F(Status, Lifetimes) {
+  writeSettings(R"({"grantcode_expired": 90, "token_expired": 7200})");
+  const Json::Value lifetimes = json({"status"})["lifetimes"];
+  EXPECT_EQ(lifetimes["grantcode_expired"], Json::Value(90));
+  EXPECT_EQ(lifetimes["token_expired"], Json::Value(7200));
+  EXPECT_THAT(run({"status"}).out, HasSubstr("Lifetimes    codes 1m 30s, access tokens 2h\n"));
+}
+
+TEST_F(Status, DiagnosticsInWords) {
+  writeSettings(R"({"log_level": 9})");
+  const Json::Value diagnostics = json({"status"})["diagnostics"];
+  EXPECT_EQ(diagnostics["debug_flag"], Json::Value(false));
+  EXPECT_EQ(diagnostics["log_level"], Json::Value(9));
+  EXPECT_EQ(diagnostics["log_classes"][0], "store operations");
+  EXPECT_EQ(diagnostics["log_classes"][1], "SQL statements");
+  EXPECT_EQ(diagnostics["log_classes"].size(), 2U);
+  EXPECT_THAT(run({"status"}).out,
+              HasSubstr("Diagnostics  off, log level 9: store operations, SQL statements\n"));
+}
+
+TEST_F(Status, ForPeople) {
+  addClient();
+  const Outcome status = run({"status"});
+  EXPECT_THAT(status, ExitsWith(kOk));
+  EXPECT_THAT(status.out, HasSubstr("/oauth.db   root:root  0600  "));
+  EXPECT_THAT(status.out, HasSubstr("/oauth.cfg  absent     -     -\n"));
+  EXPECT_THAT(status.out, HasSubstr("oauth_clientInfo  1     -        1000 (client_info_max)\n"));
+  EXPECT_THAT(status.out, HasSubstr("\nNothing is wrong.\n"));
+}
+
+TEST_F(Status, GoodSettingsAreNoProblem) {
+  writeSettings(R"({"grantcode_expired": 1, "token_expired": 2147483647, "client_info_max": 10000,
+                    "grantcode_max": 1, "token_max": 9999, "log_max": 5, "log_level": 15})");
+  EXPECT_THAT(problems(kOk), IsEmpty());
+}
+
+TEST_F(Status, AFullLogIsNoProblem) {
+  writeSettings(R"({"log_max": 1})");
+  addClient();
+  EXPECT_EQ(rowCount("oauth_log"), "1");
+  EXPECT_THAT(problems(kOk), IsEmpty());
+}
+
+// Settings --------------------------------------------------------------------------
+
+struct BadSettings {
+  const char* what;
+  const char* text;
+  const char* problem;
+};
+
+class StatusOfSettings : public Status, public testing::WithParamInterface<BadSettings> {};
+
+TEST_P(StatusOfSettings, NamesWhatIsWrong) {
+  writeSettings(GetParam().text);
+  EXPECT_THAT(problems(), ElementsAre(std::string("settings: ") + GetParam().problem));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Files, StatusOfSettings,
+    testing::Values(
+        BadSettings{"Empty", "",
+                    "is not JSON: Line 1, Column 1 Syntax error: value, object or "
+                    "array expected."},
+        BadSettings{"Truncated", "{\"token_max\": 5,",
+                    "is not JSON: Line 1, Column 17 Missing '}' or object member name"},
+        BadSettings{"AnArray", "[1]", "is not a JSON object"},
+        BadSettings{"UnknownKey", "{\"token_maximum\": 5}", "unknown key token_maximum"},
+        BadSettings{"HostileKey", "{\"a\\u001b[2J\": 5}", "unknown key a\\x1b[2J"},
+        BadSettings{"Text", "{\"token_max\": \"500\"}",
+                    "token_max: \"500\" is not a 32-bit integer"},
+        BadSettings{"Real", "{\"token_expired\": 600.5}",
+                    "token_expired: 600.5 is not a 32-bit integer"},
+        BadSettings{"Boolean", "{\"log_max\": true}", "log_max: true is not a 32-bit integer"},
+        BadSettings{"Null", "{\"log_max\": null}", "log_max: null is not a 32-bit integer"},
+        BadSettings{"Object", "{\"log_max\": {}}", "log_max: an object is not a 32-bit integer"},
+        BadSettings{"Huge", "{\"token_max\": 3000000000}",
+                    "token_max: 3000000000 is not a 32-bit integer"},
+        BadSettings{"AboveTheCap", "{\"token_max\": 10001}", "token_max: 10001 is out of range"},
+        BadSettings{"Zero", "{\"grantcode_expired\": 0}", "grantcode_expired: 0 is out of range"},
+        BadSettings{"Negative", "{\"client_info_max\": -5}", "client_info_max: -5 is out of range"},
+        BadSettings{"UnknownLogClass", "{\"log_level\": 16}",
+                    "log_level: 16 has bits without a meaning"}),
+    [](const auto& test) { return test.param.what; });
+
+TEST_F(Status, SaysWhatAppliesInstead) {
+  writeSettings(R"({"token_max": 20000})");
+  const Json::Value problem = json({"status"}, "", kUnhealthy)["problems"][0];
+  EXPECT_EQ(problem["hint"], "10000 applies");
+  EXPECT_THAT(run({"status"}).out, HasSubstr("\nWrong:\n  settings: token_max: 20000 is out of "
+                                             "range\n      10000 applies\n"));
+}
+
+TEST_F(Status, DeeplyNestedSettings) {
+  writeSettings(std::string(5000, '['));
+  EXPECT_THAT(problems(), ElementsAre(HasSubstr("settings: is not JSON: ")));
+}
+
+TEST_F(Status, SettingsThatAreAFolder) {
+  std::filesystem::create_directory(kSettings);
+  EXPECT_THAT(problems(), ElementsAre("settings: is not a regular file"));
+  std::filesystem::remove(kSettings);
+}
+
+TEST_F(Status, SettingsThatAreAPipeDoNotKeepItWaiting) {
+  ASSERT_EQ(::mkfifo(kSettings, 0600), 0);
+  EXPECT_THAT(problems(), ElementsAre("settings: is not a regular file"));
+}
+
+// Files -----------------------------------------------------------------------------
+
+TEST_F(Status, FilesThatAreOpenToOthers) {
+  addClient();
+  writeSettings("{}");
+  ::chmod(kStateDir, 0770);
+  ::chmod(kDatabase, 0640);
+  ::chmod(kSettings, 0666);
+  EXPECT_THAT(problems(),
+              ElementsAre("folder: can be written by more than its owner (mode 0770)",
+                          "database: is open to more than its owner (mode 0640)",
+                          "settings: can be written by more than its owner (mode 0666)"));
+}
+
+TEST_F(Status, DiagnosticsThatWriteSecrets) {
+  writeFile(kFlagFile, "");
+  for (const int level : {2, 4, 8}) {
+    writeSettings("{\"log_level\": " + std::to_string(level) + "}");
+    EXPECT_THAT(problems(),
+                ElementsAre("diagnostics: secrets and tokens are written to the system log"));
+  }
+  writeSettings(R"({"log_level": 1})");
+  EXPECT_THAT(problems(kOk), IsEmpty());
+}
+
+// Database --------------------------------------------------------------------------
+
+TEST_F(Status, TablesNearTheirLimit) {
+  addClient();
+  for (int row = 0; row < 9; ++row) issueCode();
+  writeSettings(R"({"grantcode_max": 10, "client_info_max": 1})");
+  EXPECT_THAT(problems(), ElementsAre("oauth_clientInfo: full (1 of 1 rows)",
+                                      "oauth_grantCode: nearly full (9 of 10 rows)"));
+  sql("DELETE FROM oauth_grantCode WHERE id>8");
+  EXPECT_THAT(problems(), ElementsAre("oauth_clientInfo: full (1 of 1 rows)"));
+}
+
+TEST_F(Status, ADamagedDatabase) {
+  writeFile(kDatabase, std::string(4096, 'x'));
+  ::chmod(kDatabase, 0600);
+  const Json::Value database = json({"status"}, "", kUnhealthy)["database"];
+  EXPECT_EQ(database["ready"], Json::Value(false));
+  EXPECT_EQ(database["code"], Json::Value(-1));
+  EXPECT_EQ(database["message"], "Create table failed");
+  EXPECT_THAT(problems(), ElementsAre("database: not ready: Create table failed (-1)"));
+  EXPECT_THAT(run({"status"}).out, HasSubstr("\nDatabase     Create table failed\n"));
+}
+
+TEST_F(Status, ATableThatCannotBeRead) {
+  addClient();
+  sql("DROP TABLE oauth_token; CREATE VIEW oauth_token AS SELECT * FROM missing");
+  EXPECT_THAT(
+      problems(),
+      Contains(MatchesRegex("oauth_token: cannot be read: no such table.*missing \\(1\\)")));
+  EXPECT_EQ(json({"status"}, "", kUnhealthy)["database"]["tables"][2]["rows"], Json::Value());
+}
+
+TEST_F(Status, ClientsOfAnotherKey) {
+  addClient();
+  sql("UPDATE oauth_clientInfo SET client_id='x' || client_id");
+  EXPECT_THAT(problems(), ElementsAre("oauth_clientInfo: 1 identifier cannot be decrypted"));
+}
+
+TEST_F(Status, ACipherThatFails) {
+  addClient();
+  ::chmod("/var/packages/Corvane/target/etc/keldcore.key", 0644);
+  EXPECT_THAT(problems(), Contains("cipher: cannot encrypt (-4)"));
+}
+
+TEST_F(Status, AMissingFolder) {
+  const HiddenFolder hidden;
+  EXPECT_THAT(problems(), ElementsAre("folder: cannot be reached: No such file or directory"));
+  const Json::Value status = json({"status"}, "", kUnhealthy);
+  EXPECT_EQ(status["files"]["folder"]["exists"], Json::Value(false));
+  EXPECT_EQ(status["database"]["message"], "does not exist");
+}
+
+TEST_F(Status, AFolderThatCannotBeWritten) {
+  addClient();
+  const ReadOnlyFolder readOnly;
+  EXPECT_THAT(problems(),
+              Contains("folder: cannot be written by user root: Read-only file system"));
+}
+
+TEST_F(Status, AnotherUser) {
+  if (!canBecomeNobody()) GTEST_SKIP() << "no other user in this namespace";
+  addClient();
+  const Outcome status = runAsNobody({"status"});
+  EXPECT_THAT(status, ExitsWith(kUnhealthy));
+  EXPECT_THAT(status.out, HasSubstr("/oauth.db   Permission denied  -     -\n"));
+  EXPECT_THAT(status.out, HasSubstr("folder: cannot be written by user nobody: Permission denied"));
+  EXPECT_THAT(status.out, HasSubstr("settings: cannot be read: Permission denied"));
+  EXPECT_THAT(status.out, HasSubstr("database: not ready: Open DB failed!! (14)"));
+  EXPECT_THAT(status.out, Not(HasSubstr("does not exist")));
+}
+
+}  // namespace
+}  // namespace cli
