@@ -61,7 +61,7 @@ Answer registerClient(const Request& request, const Parameters& form) {
 }
 
 Answer changeClient(const Request& request, const Parameters& form, const std::string& action) {
-  const std::optional<Client> client = clientWithId(number(form.value("id")));
+  const std::optional<Client> client = findClient(form.value("client"));
   if (!client) return done(request, "gone");
   if (action == "remove") {
     if (!removeClient(*client)) return done(request, "gone");
@@ -75,16 +75,14 @@ Answer changeClient(const Request& request, const Parameters& form, const std::s
   return done(request, word);
 }
 
-/// The row must still be that user's: identifiers of rows are used again.
 Answer revoke(const Request& request, const Parameters& form) {
-  const long long id = number(form.value("id"));
+  const std::string handle = form.value("access");
   const std::string user = form.value("user");
-  const auto kind = form.value("kind") == "code" ? Access::Kind::kCode : Access::Kind::kToken;
   const std::vector<Access> all = allAccess();
   const auto found = std::find_if(all.begin(), all.end(), [&](const Access& access) {
-    return access.kind == kind && access.id == id && access.user == user;
+    return access.user == user && access.handle() == handle;
   });
-  const bool removed = found != all.end() && removeAccess(kind, id);
+  const bool removed = found != all.end() && removeAccess(*found);
   if (removed) note("Access revoked for " + user + " by " + request.user);
   return done(request, std::string(removed ? "revoked" : "gone") +
                            "&view=access&user=" + percentEncode(user));

@@ -131,21 +131,20 @@ std::string shownAddresses(const Client& client) {
 }
 
 std::string applicationActions(const std::string& user, const Client& client) {
-  const std::string id = std::to_string(client.id);
   const char* change = client.enabled ? "disable" : "enable";
   const char* word = client.enabled ? "Disable" : "Enable";
   return "<div class=\"actions\">\n" + formStart(user, change) +
          fill(
-             "<input type=\"hidden\" name=\"id\" value=\"{}\">\n"
+             "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
              "<button aria-label=\"{} {}\">{}</button>\n</form>\n",
-             {id, word, client.name, word}) +
+             {client.identifier, word, client.name, word}) +
          fill("<details><summary aria-label=\"Remove {}…\">Remove…</summary>\n", {client.name}) +
          formStart(user, "remove") +
          fill(
-             "<input type=\"hidden\" name=\"id\" value=\"{}\">\n"
+             "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
              "<p>{} and all access that it has will be gone for good.</p>\n"
              "<button class=\"danger\">Remove for good</button>\n</form>\n</details>\n</div>\n",
-             {id, client.name});
+             {client.identifier, client.name});
 }
 
 std::string applicationItem(const std::string& user, const Client& client) {
@@ -197,12 +196,11 @@ std::string accessItem(const std::string& user, const Access& access, const std:
          "</dd></dl>\n" + scopeTags(access.scope) + "<div class=\"actions\">\n" +
          formStart(user, "revoke") +
          fill(
-             "<input type=\"hidden\" name=\"id\" value=\"{}\">\n"
-             "<input type=\"hidden\" name=\"kind\" value=\"{}\">\n"
+             "<input type=\"hidden\" name=\"access\" value=\"{}\">\n"
              "<input type=\"hidden\" name=\"user\" value=\"{}\">\n"
              "<button class=\"danger\" aria-label=\"Revoke the access of {}\">Revoke</button>\n"
              "</form></div>\n</li>\n",
-             {std::to_string(access.id), isToken ? "token" : "code", access.user, name});
+             {access.handle(), access.user, name});
 }
 
 std::string accessOfUser(const std::string& user, const std::string& shown,

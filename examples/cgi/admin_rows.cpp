@@ -2,7 +2,6 @@
 
 #include "examples/cgi/answer.h"
 #include "examples/cgi/encoding.h"
-#include "examples/cgi/tokens.h"
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_log.h"
@@ -16,8 +15,9 @@ namespace {
 using namespace KELDOAUTHSERVER;
 
 Access accessOf(Access::Kind kind, const Json::Value& row) {
+  const bool isToken = kind == Access::Kind::kToken;
   return {kind,
-          number(row[names::kId].asString()),
+          undoubled(row[isToken ? names::kAccessToken : names::kCode]),
           undoubled(row[names::kUsername]),
           undoubled(row[names::kClientId]),
           undoubled(row[names::kScope]),
@@ -34,6 +34,10 @@ long long rowCount(const char* table) {
 
 }  // namespace
 
+std::string Access::handle() const {
+  return base64Url(sha256(key));
+}
+
 std::vector<Client> allClients() {
   OAUTHDBClientInfo store(names::kClientInfoTable);
   Json::Value rows;
@@ -41,14 +45,6 @@ std::vector<Client> allClients() {
   std::vector<Client> clients;
   for (const Json::Value& row : rows) clients.push_back(clientOf(row));
   return clients;
-}
-
-std::optional<Client> clientWithId(long long id) {
-  OAUTHDBClientInfo store(names::kClientInfoTable);
-  Json::Value rows;
-  if (store.Get(id, &rows) == 0) throw Unavailable{};
-  if (rows.empty()) return std::nullopt;
-  return clientOf(rows[0]);
 }
 
 std::vector<Access> allAccess() {
@@ -90,18 +86,21 @@ bool setEnabled(long long id, bool enabled) {
   return (enabled ? store.Enable(id) : store.Disable(id)) != 0 || !hadNoRow(store);
 }
 
-bool removeAccess(Access::Kind kind, long long id) {
-  if (kind == Access::Kind::kToken) return removeToken(id);
+bool removeAccess(const Access& access) {
+  if (access.kind == Access::Kind::kToken) {
+    OAUTHDBToken tokens(names::kTokenTable);
+    return takeRow(tokens, names::kAccessToken, access.key);
+  }
   OAUTHDBGrantCode codes(names::kGrantCodeTable);
-  return codes.Del(id) != 0 || !hadNoRow(codes);
+  return takeRow(codes, names::kCode, access.key);
 }
 
 bool removeClient(const Client& client) {
   OAUTHDBClientInfo store(names::kClientInfoTable);
   // First of all it must not get in again.
-  if (store.Del(client.id) == 0 && hadNoRow(store)) return false;
+  if (!takeRow(store, names::kClientId, client.identifier)) return false;
   for (const Access& access : allAccess()) {
-    if (access.clientId == client.identifier) removeAccess(access.kind, access.id);
+    if (access.clientId == client.identifier) removeAccess(access);
   }
   return true;
 }

@@ -4,8 +4,6 @@
 #ifndef KELDOAUTH_EXAMPLES_CGI_ADMIN_ROWS_H
 #define KELDOAUTH_EXAMPLES_CGI_ADMIN_ROWS_H
 
-#include <map>
-#include <optional>
 #include <string>
 #include <vector>
 
@@ -14,18 +12,20 @@
 namespace service {
 
 std::vector<Client> allClients();
-std::optional<Client> clientWithId(long long id);
 
 /// What lets an application act for a user: a pair of tokens, or a code that
 /// has not been redeemed yet.
 struct Access {
   enum class Kind { kToken, kCode };
   Kind kind;
-  long long id;
+  std::string key;  // the access token or the code itself: never shown
   std::string user;
   std::string clientId;
   std::string scope;
   long long expires;
+
+  /// What a form may name it by.
+  [[nodiscard]] std::string handle() const;
 };
 
 std::vector<Access> allAccess();
@@ -51,7 +51,7 @@ std::vector<Fill> tableFill();
 
 /// False when there is no such row any more.
 bool setEnabled(long long id, bool enabled);
-bool removeAccess(Access::Kind kind, long long id);
+bool removeAccess(const Access& access);
 
 /// The application with everything that lets it in.
 bool removeClient(const Client& client);

@@ -9,6 +9,7 @@
 
 #include "core/oauth_db_basic.h"
 #include "core/oauth_errors.h"
+#include "utils/oauth_names.h"
 
 namespace service {
 namespace {
@@ -101,6 +102,12 @@ Answer redirectAnswer(const Request& request, const std::string& address) {
 bool hadNoRow(const KELDOAUTHSERVER::OAUTHDBBasic& store) {
   if (store.GetErrCode() != KELDOAUTHSERVER::errors::kNone.code) throw Unavailable{};
   return true;
+}
+
+bool takeRow(KELDOAUTHSERVER::OAUTHDBBasic& store, const char* column, const std::string& value) {
+  Json::Value request;
+  request[KELDOAUTHSERVER::names::kCondition][column] = value;
+  return store.DBDel(request) || !hadNoRow(store);
 }
 
 void write(const Answer& answer, std::ostream& output) {

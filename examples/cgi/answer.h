@@ -53,6 +53,13 @@ Answer redirectAnswer(const Request& request, const std::string& address);
 /// to work on. Otherwise throws Unavailable.
 bool hadNoRow(const KELDOAUTHSERVER::OAUTHDBBasic& store);
 
+/// Deletes the row whose `column` has this unique value. True for the one caller
+/// who deleted it, false when it is not there (any more). Never delete by `id`
+/// what was read a moment ago: SQLite gives the id of the last row, once it is
+/// deleted, to the next one, and of two requests with one code the slower would
+/// delete somebody else's.
+bool takeRow(KELDOAUTHSERVER::OAUTHDBBasic& store, const char* column, const std::string& value);
+
 void write(const Answer& answer, std::ostream& output);
 
 /// The whole life of a program: reads the request, answers with what `handle`

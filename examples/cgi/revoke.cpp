@@ -20,7 +20,7 @@ Answer handle(const Request& request) {
   if (token && token->clientId != client.identifier) {
     return oauthError(400, "invalid_grant", "The token was issued to another client");
   }
-  if (token) removeToken(token->id);
+  if (token) removeToken(*token);
   return Answer{};
 }
 

@@ -39,10 +39,11 @@ struct Grant {
   throw Refusal{oauthError(400, error, why)};
 }
 
-/// Refuses while the table is full, rather than after the grant is gone. Only
-/// then may expired tokens go: their refresh tokens go with them.
-void requireRoom() {
-  const auto most = static_cast<unsigned long>(getTableRowMax(names::kTokenMax));
+/// Refuses while the table is full, rather than after the grant is gone; `freed`
+/// rows of it will go first. Only then may expired tokens be purged: their
+/// refresh tokens go with them.
+void requireRoom(unsigned long freed) {
+  const auto most = static_cast<unsigned long>(getTableRowMax(names::kTokenMax)) + freed;
   OAUTHDBToken tokens(names::kTokenTable);
   if (tokens.DBCheckRowMax(most) != 0) return;
   tokens.Purge();
@@ -72,7 +73,6 @@ Answer success(const Json::Value& pair, const Grant& grant) {
 // A code ----------------------------------------------------------------------
 
 struct Code {
-  long long id;
   std::string user, clientId, scope, text, expires, packed, address;
   CodeState state;
 };
@@ -88,15 +88,10 @@ std::optional<Code> findCode(const std::string& text) {
   const std::string packed = undoubled(row[names::kState]);
   const std::optional<CodeState> state = unpackCodeState(packed);
   if (!state) return std::nullopt;
-  return Code{number(row[names::kId].asString()),
-              undoubled(row[names::kUsername]),
-              undoubled(row[names::kClientId]),
-              undoubled(row[names::kScope]),
-              text,
-              row[names::kExpiredTime].asString(),
-              packed,
-              row[names::kIp].asString(),
-              *state};
+  return Code{undoubled(row[names::kUsername]),    undoubled(row[names::kClientId]),
+              undoubled(row[names::kScope]),       text,
+              row[names::kExpiredTime].asString(), packed,
+              row[names::kIp].asString(),          *state};
 }
 
 bool isVerifier(const std::string& verifier, const std::string& challenge) {
@@ -124,7 +119,7 @@ void checkCode(const Client& client, const Parameters& form, const Code& code) {
 /// The code goes first: of several requests with it, one removes the row.
 void takeCode(const Code& code) {
   OAUTHDBGrantCode codes(names::kGrantCodeTable);
-  if (codes.Del(code.id) == 0 && hadNoRow(codes)) {
+  if (!takeRow(codes, names::kCode, code.text)) {
     refuse("invalid_grant", "The code was used before");
   }
 }
@@ -149,7 +144,7 @@ Answer redeemCode(const Client& client, const Parameters& form) {
     refuse("invalid_grant", "The code is unknown or was used before");
   }
   checkCode(client, form, *code);
-  requireRoom();
+  requireRoom(0);
   takeCode(*code);
   const Grant grant{code->user, code->scope, kFlowCode, {code->scope, digest, std::time(nullptr)}};
   const Json::Value pair = issue(client, grant);
@@ -188,8 +183,9 @@ Answer refresh(const Client& client, const Parameters& form) {
                     refreshedScope(form, *old),
                     old->flow,
                     {old->state.grantScope, old->state.codeDigest, std::time(nullptr)}};
+  requireRoom(1);
   // Removing first keeps the pairs at one, and makes the room for the new one.
-  if (!removeToken(old->id)) refuse("invalid_grant", "The refresh token was used before");
+  if (!removeToken(*old)) refuse("invalid_grant", "The refresh token was used before");
   const Json::Value pair = issue(client, grant);
   if (pair.isNull()) {
     giveBack(*old);
@@ -205,7 +201,7 @@ Answer actAsClient(const Client& client, const Parameters& form) {
   if (scopeNames(scope).empty() || !isWithin(scope, client.scope)) {
     refuse("invalid_scope", "The client is not registered for this scope");
   }
-  requireRoom();
+  requireRoom(0);
   const Grant grant{client.identifier, scope, kFlowClient, {scope, "", std::time(nullptr)}};
   const Json::Value pair = issue(client, grant);
   if (pair.isNull()) throw Unavailable{};

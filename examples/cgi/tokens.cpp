@@ -37,17 +37,12 @@ TokenState stateOf(const Json::Value& row) {
 
 }  // namespace
 
-bool Token::isLive() const {
-  return expires >= std::time(nullptr);
-}
-
 bool Token::isRefreshable() const {
   return flow == kFlowCode && expires + kRefreshSeconds >= std::time(nullptr);
 }
 
 Token tokenOf(const Json::Value& row) {
-  return {number(row[names::kId].asString()),
-          undoubled(row[names::kUsername]),
+  return {undoubled(row[names::kUsername]),
           undoubled(row[names::kClientId]),
           undoubled(row[names::kScope]),
           undoubled(row[names::kFlowType]),
@@ -86,9 +81,9 @@ std::optional<Token> verifiedToken(const std::string& text) {
   return token;
 }
 
-bool removeToken(long long id) {
+bool removeToken(const Token& token) {
   OAUTHDBToken tokens(names::kTokenTable);
-  return tokens.Del(id) || !hadNoRow(tokens);
+  return takeRow(tokens, names::kAccessToken, token.access);
 }
 
 void removeTokensOfCode(const std::string& clientId, const std::string& codeDigest,
@@ -100,7 +95,7 @@ void removeTokensOfCode(const std::string& clientId, const std::string& codeDige
     const Token token = tokenOf(row);
     if (token.clientId == clientId && token.state.codeDigest == codeDigest &&
         token.state.issued < before)
-      removeToken(token.id);
+      removeToken(token);
   }
 }
 

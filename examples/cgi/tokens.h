@@ -20,7 +20,6 @@ inline constexpr char kFlowCode[] = "authorization_code";
 inline constexpr char kFlowClient[] = "client_credentials";
 
 struct Token {
-  long long id;
   std::string user;  // the client's identifier in the client's own flow
   std::string clientId;
   std::string scope;
@@ -31,8 +30,7 @@ struct Token {
   std::string access;
   std::string refresh;
 
-  [[nodiscard]] bool isLive() const;         // the access token
-  [[nodiscard]] bool isRefreshable() const;  // the refresh token
+  [[nodiscard]] bool isRefreshable() const;
 };
 
 Token tokenOf(const Json::Value& row);
@@ -47,7 +45,7 @@ std::optional<Token> verifiedToken(const std::string& text);
 
 /// Removes the row. False when somebody else has removed it before. Throws
 /// Unavailable.
-bool removeToken(long long id);
+bool removeToken(const Token& token);
 
 /// Removes the tokens of a client that came from the code with this digest and were issued
 /// before `before`. For a code that comes a second time (RFC 6749, 4.1.2).

@@ -19,12 +19,6 @@ def submit(action, token=None, **fields):
                 {**FORM, **as_user("admin")})
 
 
-def row_of(client):
-    """The row of an application, by the identifier that the page shows."""
-    item = next(part for part in show().text.split('<li class="card">') if client.id in part)
-    return re.search(r'name="id" value="(\d+)"', item).group(1)
-
-
 class Page(unittest.TestCase):
     def test_is_for_administrators_alone(self):
         self.assertEqual(send("GET", "/admin").status, 401)
@@ -68,19 +62,18 @@ class Applications(unittest.TestCase):
     def test_disabled_one_gets_nothing_until_enabled(self):
         client = register()
         pair = client.tokens()
-        row = row_of(client)
-        self.assertEqual(submit("disable", id=row).location, "/admin?done=disabled")
+        self.assertEqual(submit("disable", client=client.id).location, "/admin?done=disabled")
         self.assertEqual(client.ask("x" * 43).status, 403)
         self.assertEqual(client.refresh(pair["refresh_token"]).json["error"], "invalid_client")
         self.assertEqual(whoami(pair["access_token"]).status, 401)
-        self.assertEqual(submit("enable", id=row).location, "/admin?done=enabled")
+        self.assertEqual(submit("enable", client=client.id).location, "/admin?done=enabled")
         self.assertEqual(whoami(pair["access_token"]).status, 200)
 
     def test_removed_one_leaves_no_token_behind(self):
         client = register()
         access = client.tokens()["access_token"]
         client.log_in()
-        self.assertEqual(submit("remove", id=row_of(client)).location, "/admin?done=removed")
+        self.assertEqual(submit("remove", client=client.id).location, "/admin?done=removed")
         self.assertEqual(whoami(access).status, 401)
         self.assertNotIn(client.id, show().text)
         with sqlite3.connect(service.DATABASE) as file:
@@ -95,17 +88,16 @@ class Access(unittest.TestCase):
         page = show("?view=access&user=bob")
         self.assertIn("Revoked", page.text)
         fields = Form(page.text[page.text.index('method="post"') - 6:]).fields
-        answer = submit("revoke", **{k: fields[k] for k in ("id", "kind", "user")})
+        answer = submit("revoke", **{k: fields[k] for k in ("access", "user")})
         self.assertEqual(answer.location, "/admin?done=revoked&view=access&user=bob")
         self.assertEqual(whoami(access).status, 401)
 
-    def test_row_of_somebody_else_is_not_touched(self):
+    def test_access_of_another_user_is_not_touched(self):
         access = register().tokens("alice")["access_token"]
-        with sqlite3.connect(service.DATABASE) as file:
-            row = file.execute("SELECT id FROM oauth_token WHERE access_token=?",
-                               (access,)).fetchone()[0]
-        answer = submit("revoke", id=row, kind="token", user="bob")
-        self.assertIn("done=gone", answer.location)
+        page = show("?view=access&user=alice").text
+        for handle in re.findall(r'name="access" value="([^"]+)"', page):
+            answer = submit("revoke", access=handle, user="bob")
+            self.assertIn("done=gone", answer.location)
         self.assertEqual(whoami(access).status, 200)
 
     def test_user_with_a_quote_is_found(self):
@@ -125,7 +117,7 @@ class AuditLog(unittest.TestCase):
     def test_login_and_changes_leave_an_entry(self):
         client = register(client_name="Traced")
         client.log_in()
-        submit("disable", id=row_of(client))
+        submit("disable", client=client.id)
         page = show("?view=log&filter=Traced").text
         self.assertIn("Access allowed[Traced] by alice", page)
         self.assertIn("Application disabled[Traced] by admin", page)
@@ -141,18 +133,17 @@ class Storage(unittest.TestCase):
 class Forgery(unittest.TestCase):
     def test_form_without_a_token_of_ours_changes_nothing(self):
         client = register()
-        row = row_of(client)
         genuine = Form(show().text).fields["form_token"]
         consent = Form(client.ask("x" * 43, "admin").text).fields["form_token"]
         late = "1" + genuine[10:] if genuine[10] == "." else "1." + genuine.split(".")[1]
         for token in ("", "x", genuine[:-1], "9" + genuine, consent, late):
-            self.assertEqual(submit("disable", token, id=row).status, 403, token)
+            self.assertEqual(submit("disable", token, client=client.id).status, 403, token)
         self.assertEqual(client.ask("x" * 43).status, 200)
 
     def test_query_does_not_change_anything(self):
         client = register()
         genuine = Form(show().text).fields["form_token"]
-        show(f"?action=disable&id={row_of(client)}&form_token={genuine}")
+        show(f"?action=disable&client={client.id}&form_token={genuine}")
         self.assertEqual(client.ask("x" * 43).status, 200)
 
 

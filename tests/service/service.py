@@ -21,6 +21,9 @@ CALLBACK = "http://127.0.0.1:9/callback"
 DATABASE = "/var/packages/Corvane/target/etc/oauth.db"
 SETTINGS = "/var/packages/Corvane/target/etc/oauth.cfg"
 
+# What must never reach a log file.
+SEEN_SECRETS = {INITIAL_TOKEN, *USERS.values()}
+
 FORM = {"Content-Type": "application/x-www-form-urlencoded"}
 
 
@@ -55,7 +58,10 @@ def send(method, path, body=None, headers=None):
     where = urllib.parse.urlsplit(ISSUER)
     connection = http.client.HTTPConnection(where.hostname, where.port, timeout=60)
     try:
-        connection.request(method, path, body=body, headers=headers or {})
+        try:
+            connection.request(method, path, body=body, headers=headers or {})
+        except (BrokenPipeError, ConnectionResetError):
+            pass  # A server need not read to the end what it refuses.
         return Answer(connection.getresponse())
     finally:
         connection.close()
@@ -125,6 +131,7 @@ class Client:
         assert page.status == 200, (page.status, page.text)
         answer = self.decide(page, user=user)
         assert answer.status == 303, (answer.status, answer.text)
+        SEEN_SECRETS.update((answer.returned["code"], verifier))
         return answer.returned["code"], verifier
 
     def post(self, endpoint, **parameters):
@@ -139,6 +146,7 @@ class Client:
     def tokens(self, user="alice", **changes):
         answer = self.redeem(*self.log_in(user, **changes))
         assert answer.status == 200, (answer.status, answer.text)
+        SEEN_SECRETS.update((answer.json["access_token"], answer.json["refresh_token"]))
         return answer.json
 
     def refresh(self, token, **changes):
@@ -162,6 +170,7 @@ def register(**metadata):
     answer = register_raw(metadata)
     assert answer.status == 201, (answer.status, answer.text)
     made = answer.json
+    SEEN_SECRETS.add(made["client_secret"])
     redirects = metadata["redirect_uris"]
     return Client(made["client_id"], made["client_secret"], redirects[0] if redirects else None)
 
@@ -177,6 +186,11 @@ def introspect(client, token, **more):
 def error_log():
     with open(RUN + "/error.log", encoding="utf-8", errors="replace") as log:
         return log.read()
+
+
+def secrets_in_error_log():
+    log = error_log()
+    return [secret for secret in SEEN_SECRETS if secret in log]
 
 
 def consent(address, user="alice", decision="allow"):
