@@ -51,8 +51,8 @@ std::vector<std::string> Statements::texts() {
 void Statements::before(std::function<void(const std::string&)> hook) {
   state.hook = std::move(hook);
 }
-void Statements::refuseCommits() {
-  state.refusesCommits = true;
+void Statements::refuseCommits(bool refuse) {
+  state.refusesCommits = refuse;
 }
 void Statements::dontWaitForLocks() {
   sqlite3_busy_handler(state.newest, nullptr, nullptr);

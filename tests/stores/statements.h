@@ -21,7 +21,7 @@ class Statements {
   static void before(std::function<void(const std::string&)> hook);
 
   /// SQLite takes back what a COMMIT was to keep, and the COMMIT fails.
-  static void refuseCommits();
+  static void refuseCommits(bool refuse);
 
   // The connection opened last
   /// gives up at the first lock that it meets;
