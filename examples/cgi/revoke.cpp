@@ -21,7 +21,8 @@ Answer handle(const Request& request) {
     return oauthError(400, "invalid_grant", "The token was issued to another client");
   }
   if (token) removeToken(*token);
-  return Answer{};
+  // The body means nothing, but there are clients that cannot read an empty one.
+  return jsonAnswer(200, Json::Value(Json::objectValue));
 }
 
 }  // namespace

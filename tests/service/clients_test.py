@@ -59,6 +59,7 @@ class Authlib(unittest.TestCase):
         session, _ = self.log_in()
         self.assertEqual(session.get(ISSUER + "/api/whoami").json()["sub"], "alice")
         record(self.NAME, "code with PKCE")
+        record(self.NAME, "secret in the header")
 
     def test_secret_in_the_body(self):
         _, token = self.log_in("client_secret_post")
@@ -118,6 +119,7 @@ class RequestsOauthlib(unittest.TestCase):
         session, _ = self.log_in()
         self.assertEqual(session.get(ISSUER + "/api/whoami").json()["sub"], "alice")
         record(self.NAME, "code with PKCE", "yes, the challenge made by hand")
+        record(self.NAME, "secret in the header")
 
     def test_secret_in_the_body(self):
         _, token = self.log_in(include_client_id=True)
