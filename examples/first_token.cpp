@@ -39,10 +39,10 @@ int main() {
     return fail("issuing a code", codes);
   }
 
-  // Only the request whose Del succeeds may go on to issue a token.
-  if (codes.Del(codes.GetIndex(issued[names::kCode].asString())) == 0) {
-    return fail("redeeming", codes);
-  }
+  // Only the request whose deletion succeeds may go on to issue a token.
+  Json::Value redeem;
+  redeem[names::kCondition][names::kCode] = issued[names::kCode];
+  if (!codes.DBDel(redeem)) return fail("redeeming", codes);
 
   OAUTHDBToken tokens(names::kTokenTable);
   Json::Value pair;

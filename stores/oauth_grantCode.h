@@ -2,10 +2,18 @@
 // The store holds rows; whether a code is still valid, and for whom, is for the
 // caller to decide: an expired code is found until it is purged or deleted.
 //
-// To redeem a code exactly once, read it with Get, check it, then call Del with
-// its id and go on only when Del succeeds: of several requests that redeem the
-// same code at the same moment, one removes the row and all others get 0.
-// Revoke does not serve for that: it succeeds for each of them.
+// To redeem a code exactly once, read it with Get, check it, then delete it *by
+// the code*, and go on only when that succeeds:
+//
+//   Json::Value request;
+//   request["condition"]["code"] = code;
+//   bool redeemed = codes.DBDel(request);
+//
+// Of several requests that redeem the same code at the same moment, one removes
+// the row and all others get false. Two other ways let more than one through:
+// - Revoke succeeds for each of them;
+// - Del goes by the row's id, and SQLite gives the highest id out again: when
+//   the row is gone, the same id may be another code's by now.
 //
 // Rows come back as DBGet delivers them: an array of objects with "id",
 // "username", "client_id", "scope", "code", "expired_time", "state" and "ip",
@@ -69,7 +77,8 @@ class OAUTHDBGrantCode : public OAUTHDBBasic {
   int Revoke(long long id);
 
   /// Removes the row. Non-zero for the one caller that removed it; 0 without an
-  /// error code when there is none (any more).
+  /// error code when there is none (any more). Not the way to redeem a code: see
+  /// the head of this file.
   int Del(long long id);
 
   /// Removes every row whose expiry lies before the current second. 1 when all

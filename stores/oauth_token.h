@@ -2,6 +2,10 @@
 // names::kTokenTable. The expiry is the access token's; a refresh token lives
 // as long as its row, so a purge right after the expiry ends it, too.
 //
+// To refresh exactly once, delete the row *by its refresh token* (DBDel with the
+// condition {"refresh_token": ...}), go on only when that succeeds, and issue
+// the new pair. An id will not do: SQLite gives the highest one out again.
+//
 // Rows come back as DBGet delivers them: an array of objects with "id",
 // "username", "client_id", "scope", "refresh_token", "access_token",
 // "expired_time", "flow_type", "state" and "ip", every value a text.
