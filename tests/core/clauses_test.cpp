@@ -28,13 +28,18 @@ void PrintTo(const Clause& clause, std::ostream* out) {
 
 class ClauseTest : public CoreTest {
  protected:
-  OAUTHDBBasic store;
+  void SetUp() override {
+    CoreTest::SetUp();
+    store.emplace();
+  }
+
+  std::optional<OAUTHDBBasic> store;
 };
 
 class ClauseTableTest : public ClauseTest, public ::testing::WithParamInterface<Clause> {
  protected:
   void TearDown() override {
-    expectNoError(store);
+    expectNoError(*store);
     EXPECT_THAT(SystemLog::lines(), IsEmpty());
     ClauseTest::TearDown();
   }
@@ -47,7 +52,7 @@ class ClauseTableTest : public ClauseTest, public ::testing::WithParamInterface<
 class InsertClauseTest : public ClauseTableTest {};
 
 TEST_P(InsertClauseTest, IsColumnsAndValues) {
-  EXPECT_EQ(store.GetInsertParam(doc), GetParam().sql);
+  EXPECT_EQ(store->GetInsertParam(doc), GetParam().sql);
   EXPECT_EQ(doc, GetParam().doc);
 }
 
@@ -86,7 +91,7 @@ INSTANTIATE_TEST_SUITE_P(Core, InsertClauseTest, ::testing::ValuesIn(kInserts),
 class PairsTest : public ClauseTableTest {};
 
 TEST_P(PairsTest, AreJoinedByTheSeparator) {
-  EXPECT_EQ(store.ConcateParam(doc, " + "), GetParam().sql);
+  EXPECT_EQ(store->ConcateParam(doc, " + "), GetParam().sql);
   EXPECT_EQ(doc, GetParam().doc);
 }
 
@@ -114,8 +119,8 @@ const Clause kPairs[] = {
 INSTANTIATE_TEST_SUITE_P(Core, PairsTest, ::testing::ValuesIn(kPairs), support::CaseName());
 
 TEST_F(ClauseTest, SeparatorGoesInAsItStands) {
-  EXPECT_EQ(store.ConcateParam(json("{'a': '1', 'b': '2'}"), ""), "a='1'b='2'");
-  EXPECT_EQ(store.ConcateParam(json("{'a': '1', 'b': '2'}"), "'%s'"), "a='1''%s'b='2'");
+  EXPECT_EQ(store->ConcateParam(json("{'a': '1', 'b': '2'}"), ""), "a='1'b='2'");
+  EXPECT_EQ(store->ConcateParam(json("{'a': '1', 'b': '2'}"), "'%s'"), "a='1''%s'b='2'");
 }
 
 // WHERE -----------------------------------------------------------------------
@@ -123,7 +128,7 @@ TEST_F(ClauseTest, SeparatorGoesInAsItStands) {
 class ConditionTest : public ClauseTableTest {};
 
 TEST_P(ConditionTest, IsNothingOrAWhereClause) {
-  EXPECT_EQ(store.GetConditionParam(doc), GetParam().sql);
+  EXPECT_EQ(store->GetConditionParam(doc), GetParam().sql);
   EXPECT_EQ(doc, GetParam().doc);
 }
 
@@ -145,7 +150,7 @@ INSTANTIATE_TEST_SUITE_P(Core, ConditionTest, ::testing::ValuesIn(kConditions),
 class UpdateClauseTest : public ClauseTableTest {};
 
 TEST_P(UpdateClauseTest, IsSetAndWhere) {
-  EXPECT_EQ(store.GetUpdateParam(doc), GetParam().sql);
+  EXPECT_EQ(store->GetUpdateParam(doc), GetParam().sql);
   EXPECT_EQ(doc, GetParam().doc);
 }
 
@@ -175,17 +180,17 @@ TEST_F(ClauseTest, BuildersTraceThemselvesAndEachOther) {
   Json::Value request;
   request["modified"] = row;
   request["condition"] = row;
-  EXPECT_THAT(traced(8, [&] { store.GetInsertParam(row); }), ElementsAre("==> GetInsertParam"));
-  EXPECT_THAT(traced(8, [&] { store.ConcateParam(row, ","); }), ElementsAre("==> ConcateParam"));
-  EXPECT_THAT(traced(8, [&] { store.GetConditionParam(row); }),
+  EXPECT_THAT(traced(8, [&] { store->GetInsertParam(row); }), ElementsAre("==> GetInsertParam"));
+  EXPECT_THAT(traced(8, [&] { store->ConcateParam(row, ","); }), ElementsAre("==> ConcateParam"));
+  EXPECT_THAT(traced(8, [&] { store->GetConditionParam(row); }),
               ElementsAre("==> GetConditionParam", "==> ConcateParam"));
-  EXPECT_THAT(traced(8, [&] { store.GetUpdateParam(request); }),
+  EXPECT_THAT(traced(8, [&] { store->GetUpdateParam(request); }),
               ElementsAre("==> GetUpdateParam", "==> ConcateParam", "==> GetConditionParam",
                           "==> ConcateParam"));
 }
 
 TEST_F(ClauseTest, EmptyConditionIsTracedWithoutPairs) {
-  EXPECT_THAT(tracedLines(8, [&] { store.GetConditionParam(Json::Value()); }),
+  EXPECT_THAT(tracedLines(8, [&] { store->GetConditionParam(Json::Value()); }),
               ElementsAre(Line{kError, "==> %s", "==> GetConditionParam"}));
 }
 
@@ -193,15 +198,15 @@ TEST_F(ClauseTest, BuildersAreSilentAtOtherLevels) {
   const Json::Value request = json("{'modified': {'a': '1'}, 'condition': {'a': '1'}}");
   EXPECT_THAT(traced(1 + 2 + 4,
                      [&] {
-                       store.GetInsertParam(request["modified"]);
-                       store.GetUpdateParam(request);
+                       store->GetInsertParam(request["modified"]);
+                       store->GetUpdateParam(request);
                      }),
               IsEmpty());
 }
 
 TEST_F(ClauseTest, BuildersEncryptNothing) {
   const Json::Value row = json("{'client_id': 'abc', 'client_secret': 'def'}");
-  EXPECT_EQ(store.ConcateParam(row, ", "), "client_id='abc', client_secret='def'");
+  EXPECT_EQ(store->ConcateParam(row, ", "), "client_id='abc', client_secret='def'");
   EXPECT_THAT(support::Platform::encrypted(), IsEmpty());
 }
 
