@@ -284,7 +284,7 @@ Answer storagePage(const std::string& user) {
         {table.what, count, limit, limit, count, table.what, count});
   }
   return view(kStorage, user,
-              "<ul class=\"cards\">\n" + rows +
+              "<ul class=\"cards small\">\n" + rows +
                   "</ul>\n<p class=\"hint\">A full table refuses new rows with an invitation to "
                   "try again; the audit log drops its oldest entries instead.</p>\n");
 }

@@ -156,7 +156,7 @@ test('an unknown application gets a page, not a redirect', async () => {
 test('an administrator registers, disables, enables, and removes, without JavaScript', async () => {
   await as('admin', async (page) => {
     await page.goto(service.issuer + '/')
-    await page.getByLabel('Name').fill("Anna's <b>Reader</b>")
+    await page.getByLabel('Name', { exact: true }).fill("Anna's <b>Reader</b>")
     await page.getByLabel('Redirect address').fill('https://reader.example/cb')
     await page.getByLabel('See and download your files').check()
     await page.getByRole('button', { name: 'Register' }).click()
@@ -201,10 +201,10 @@ test('every page of the administrator looks right', async () => {
     await page.goto(service.issuer + '/admin')
     await page.locator('summary').first().click()
     await inspect(page, 'removing')
-    await page.getByLabel('Name').fill('Printer')
+    await page.getByLabel('Name', { exact: true }).fill('Printer')
     await page.getByLabel('Redirect address').fill('http://printer.example/')
     await page.getByRole('button', { name: 'Register' }).click()
-    assert.equal(await page.getByLabel('Name').inputValue(), 'Printer')
+    assert.equal(await page.getByLabel('Name', { exact: true }).inputValue(), 'Printer')
     await inspect(page, 'fault')
     await page.getByLabel('Redirect address').fill('https://printer.example/')
     await page.getByRole('button', { name: 'Register' }).click()

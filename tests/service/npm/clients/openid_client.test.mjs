@@ -3,7 +3,7 @@
 import * as client from 'openid-client'
 import { strict as assert } from 'node:assert'
 import { before, test } from 'node:test'
-import * as service from './service.mjs'
+import * as service from '../service.mjs'
 
 const name = service.versioned('openid-client')
 const server = new URL(service.issuer)

@@ -5,7 +5,7 @@ import simple from 'simple-oauth2'
 import { createHash, randomBytes } from 'node:crypto'
 import { strict as assert } from 'node:assert'
 import { before, test } from 'node:test'
-import * as service from './service.mjs'
+import * as service from '../service.mjs'
 
 const name = service.versioned('simple-oauth2')
 const record = (feature, how) => service.record(name, feature, how)

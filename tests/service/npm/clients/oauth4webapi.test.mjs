@@ -3,7 +3,7 @@
 import * as oauth from 'oauth4webapi'
 import { strict as assert } from 'node:assert'
 import { before, test } from 'node:test'
-import * as service from './service.mjs'
+import * as service from '../service.mjs'
 
 const name = service.versioned('oauth4webapi')
 const insecure = { [oauth.allowInsecureRequests]: true }
