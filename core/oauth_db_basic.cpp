@@ -461,6 +461,10 @@ bool OAUTHDBBasic::RunChange(const std::string& sql, int& changed) {
   return changed > 0;
 }
 
+bool OAUTHDBBasic::InTransaction() const {
+  return db_ != nullptr && sqlite3_get_autocommit(db_) == 0;
+}
+
 // Encryption ------------------------------------------------------------------
 
 int OAUTHDBBasic::ParamEncrypt(Json::Value& doc) try {

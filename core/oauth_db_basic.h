@@ -176,6 +176,13 @@ class OAUTHDBBasic {
   bool FailUnexpectedly(const char* source, int line) noexcept;
 
  private:
+  friend class Transaction;
+
+  /// True between a BEGIN and the end of its transaction, which need not be a
+  /// COMMIT: a statement that meets an I/O error, a full medium or no memory
+  /// makes SQLite roll back by itself.
+  bool InTransaction() const;
+
   // The bodies of the public operations that start-up must see fail: they
   // throw.
   int Run(const std::string& sql, RowCallback callback, Json::Value* arg);

@@ -58,8 +58,8 @@ int addressError(const std::string& ip);
 std::vector<long long> expiredIds(const Json::Value& rows, long long now);
 
 /// Calls `remove(id)` for each of `ids` in order. Several removals share one
-/// transaction of `store`; where it is refused they run one by one. True unless
-/// a removal or the commit failed.
+/// transaction of `store`; where it is refused they run one by one, and where
+/// it is lost nothing is removed. True unless a removal or the commit failed.
 template <typename Remove>
 bool removeAll(OAUTHDBBasic& store, const std::vector<long long>& ids, Remove remove) {
   Transaction transaction(store);
@@ -67,6 +67,7 @@ bool removeAll(OAUTHDBBasic& store, const std::vector<long long>& ids, Remove re
 
   bool done = true;
   for (const long long id : ids) {
+    if (transaction.isLost()) break;
     if (!remove(id)) done = false;
   }
   return transaction.commit() && done;

@@ -3,36 +3,33 @@
 #include <string>
 
 namespace KELDOAUTHSERVER {
-namespace {
-
-/// SQLite's code for a COMMIT that finds no transaction.
-constexpr int kNothingToCommit = 1;
-
-}  // namespace
 
 Transaction::~Transaction() {
-  if (open_) runAside("ROLLBACK");
+  rollBack();
 }
 
 void Transaction::begin() {
   open_ = runAside("BEGIN IMMEDIATE");
 }
 
+bool Transaction::isLost() const {
+  return open_ && !store_.InTransaction();
+}
+
 bool Transaction::commit() {
   if (!open_) return true;
-  open_ = false;
-
-  const int code = store_.GetErrCode();
-  const std::string message = store_.GetErrMsg();
-  if (store_.DBCmd("COMMIT", nullptr, nullptr) != 0) return true;
-
-  if (store_.GetErrCode() == kNothingToCommit) {
-    store_.SetErrCode(code);
-    store_.SetErrMsg(message);
-  } else {
-    runAside("ROLLBACK");
+  if (isLost() || store_.DBCmd("COMMIT", nullptr, nullptr) == 0) {
+    rollBack();
+    return false;
   }
-  return false;
+  open_ = false;
+  return true;
+}
+
+/// A failed COMMIT may have ended the transaction, too.
+void Transaction::rollBack() {
+  if (open_ && store_.InTransaction()) runAside("ROLLBACK");
+  open_ = false;
 }
 
 bool Transaction::runAside(const char* sql) {

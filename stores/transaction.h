@@ -19,13 +19,16 @@ class Transaction {
   /// follow stand each for itself, and the object's error stays as it was.
   void begin();
 
+  /// True when SQLite has ended the transaction by itself and taken everything
+  /// back. The object carries the reason; what runs now stands for itself.
+  bool isLost() const;
+
   /// True when there is nothing to commit or the commit succeeded. After a
-  /// failure everything is taken back and the object carries the reason: that of
-  /// the commit, or, where SQLite had ended the transaction by itself, that of
-  /// the statement which made it.
+  /// failure everything is taken back and the object carries the reason.
   bool commit();
 
  private:
+  void rollBack();
   /// Runs `sql` without a trace on the object's error.
   bool runAside(const char* sql);
 
