@@ -14,7 +14,8 @@ extern "C" {
 /// NUL-terminated, into the caller's `out` of `outSize` bytes (we pass 1024).
 /// Deterministic: the same text gives the same ciphertext in every process, so
 /// that an encrypted column can be compared for equality.
-/// Returns non-zero on success, 0 on failure; `out` is not to be read then.
+/// Returns non-zero on success, 0 on failure, a text that does not fit with its
+/// terminator included; `out` is not to be read then.
 int KCORECryptSzEncrypt(const char* clear, char* out, size_t outSize);
 
 /// The inverse, with the same conventions: what KCORECryptSzEncrypt wrote

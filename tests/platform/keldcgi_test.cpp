@@ -32,7 +32,7 @@ class CgiAddressTest : public support::World {
   }
 
   static int getRemoteIp(char* buffer, std::size_t size) {
-    return standIn<decltype(KeldCgiGetRemoteIP)>(kCgi, "KeldCgiGetRemoteIP")(buffer, size);
+    return standIn<decltype(KeldCgiGetRemoteIP)>("KeldCgiGetRemoteIP")(buffer, size);
   }
 };
 

@@ -1,13 +1,12 @@
 // How an absent key comes to be: whole or not at all, once for everybody, and
 // for its owner alone.
 
+#include <pthread.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
@@ -28,16 +27,30 @@ using ::testing::IsEmpty;
 
 class KeyCreationTest : public CipherTest {
  protected:
-  /// Runs `body` in a process of its own, which ends with its result.
+  static constexpr unsigned kPatience = 120;  // seconds
+
+  /// Runs `body` in a process of its own, which ends with its result, or is
+  /// ended when it waits for what never comes.
   static pid_t inProcess(const std::function<int()>& body) {
     const pid_t child = ::fork();
-    if (child == 0) ::_exit(body());
+    if (child == 0) {
+      ::alarm(kPatience);
+      ::_exit(body());
+    }
     return child;
   }
   static int statusOf(pid_t child) {
     int status = -1;
     EXPECT_EQ(::waitpid(child, &status, 0), child);
     return status;
+  }
+  /// Whether it came to a stop; else it has ended.
+  static bool killWhereItStops(pid_t child) {
+    int status = 0;
+    EXPECT_EQ(::waitpid(child, &status, WUNTRACED), child);
+    if (!WIFSTOPPED(status)) return false;
+    ::kill(child, SIGKILL);
+    return diedOfKill(statusOf(child));
   }
   static bool diedOfKill(int status) { return WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL; }
 
@@ -210,9 +223,17 @@ INSTANTIATE_TEST_SUITE_P(KeyCreation, BadPlaceTest, ::testing::ValuesIn(kBadPlac
 
 /// What processes share with the test.
 struct Shared {
-  static constexpr int kRacers = 50;
-  std::atomic<int> arrived{0};
-  std::atomic<int> lost{0};
+  static constexpr unsigned kRacers = 50;
+
+  Shared() {
+    pthread_barrierattr_t attributes;
+    pthread_barrierattr_init(&attributes);
+    pthread_barrierattr_setpshared(&attributes, PTHREAD_PROCESS_SHARED);
+    pthread_barrier_init(&gate, &attributes, kRacers);
+    pthread_barrierattr_destroy(&attributes);
+  }
+
+  pthread_barrier_t gate{};  // opens when all have arrived
   char ciphers[kRacers][64] = {};
 };
 
@@ -230,11 +251,7 @@ class KeyRaceTest : public KeyCreationTest {
     KeyCreationTest::TearDown();
   }
 
-  /// Returns when as many processes have come this far.
-  void waitForAll() const {
-    ++shared_->arrived;
-    while (shared_->arrived < Shared::kRacers) std::this_thread::yield();
-  }
+  void waitForAll() const { pthread_barrier_wait(&shared_->gate); }
 
   /// Each process encrypts the same text; `prepare` runs in it before.
   void race(const std::function<void()>& prepare) {
@@ -263,7 +280,6 @@ class KeyRaceTest : public KeyCreationTest {
 TEST_F(KeyRaceTest, FiftyProcessesThatStartTogetherAgreeOnOneKey) {
   for (int round = 0; round < 5; ++round) {
     removeAll();
-    shared_->arrived = 0;
     race([&] { waitForAll(); });
     expectOneKey();
   }
@@ -278,7 +294,6 @@ TEST_F(KeyRaceTest, FiftyProcessesThatPublishTogetherAgreeOnOneKey) {
       return 0;
     });
   });
-  EXPECT_EQ(shared_->arrived, Shared::kRacers);
   expectOneKey();
 }
 
@@ -286,10 +301,10 @@ TEST_F(KeyCreationTest, KillAtAnyStepLeavesNoKeyOrAWholeOne) {
   int steps = 0;
   for (bool killed = true; killed; ++steps) {
     removeAll();
-    killed = diedOfKill(statusOf(inProcess([&] {
-      SystemCalls::killAt(steps + 1);
+    killed = killWhereItStops(inProcess([&] {
+      SystemCalls::stopAt(steps + 1);
       return encrypt("text").has_value() ? 0 : 1;
-    })));
+    }));
     expectNoneOrAll();
   }
   EXPECT_EQ(steps, 9) << "eight calls to die at, and a run that gets by";

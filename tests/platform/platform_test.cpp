@@ -32,7 +32,7 @@ std::string base64Url(const std::string& bytes) {
 Text call(const char* name, const std::string& text, std::size_t size) {
   std::vector<char> out(size + 1, kWatch);
   const int result =
-      standIn<int(const char*, char*, std::size_t)>(kCore, name)(text.c_str(), out.data(), size);
+      standIn<int(const char*, char*, std::size_t)>(name)(text.c_str(), out.data(), size);
   EXPECT_EQ(out[size], kWatch) << name << " wrote beyond " << size << " bytes";
   if (result == 0) return std::nullopt;
   return std::string(out.data());

@@ -55,8 +55,8 @@ void SystemCalls::follow(Script script) {
 void SystemCalls::fail(const std::string& name, int error) {
   follow([name, error](const std::string& called) { return called == name ? error : 0; });
 }
-void SystemCalls::killAt(int nth) {
-  follow([left = nth](const std::string&) mutable { return --left == 0 ? raise(SIGKILL) : 0; });
+void SystemCalls::stopAt(int nth) {
+  follow([left = nth](const std::string&) mutable { return --left == 0 ? raise(SIGSTOP) : 0; });
 }
 void SystemCalls::moveOneByte() {
   state.oneByte = true;

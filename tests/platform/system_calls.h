@@ -18,8 +18,9 @@ class SystemCalls {
   static void follow(Script script);
   /// All calls of `name` fail.
   static void fail(const std::string& name, int error);
-  /// The n-th call (1 is the next) ends the process as kill -9 does.
-  static void killAt(int nth);
+  /// The process stops before the n-th call (1 is the next), for its parent to
+  /// kill it there.
+  static void stopAt(int nth);
   /// read and write move one byte per call.
   static void moveOneByte();
   /// secure_getenv answers as it does in a process with raised privileges.
