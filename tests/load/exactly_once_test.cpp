@@ -20,13 +20,37 @@ using KELDOAUTHSERVER::OAUTHDBGrantCode;
 
 constexpr int kProcesses = 8;
 
-using Redeem = int (*)(OAUTHDBGrantCode& codes, long long id);
+/// A row as a request has read it before it redeems.
+struct Found {
+  std::string code;
+  long long id;
+};
 
-int redeemWithDel(OAUTHDBGrantCode& codes, long long id) {
-  return codes.Del(id);
+using Redeem = bool (*)(OAUTHDBGrantCode& codes, const Found& found);
+
+bool redeemByCode(OAUTHDBGrantCode& codes, const Found& found) {
+  Json::Value request;
+  request[names::kCondition][names::kCode] = found.code;
+  return codes.DBDel(request);
 }
-int redeemWithRevoke(OAUTHDBGrantCode& codes, long long id) {
-  return codes.Revoke(id);
+bool redeemById(OAUTHDBGrantCode& codes, const Found& found) {
+  return codes.Del(found.id) != 0;
+}
+bool redeemWithRevoke(OAUTHDBGrantCode& codes, const Found& found) {
+  return codes.Revoke(found.id) != 0;
+}
+
+std::string issueCode(OAUTHDBGrantCode& codes) {
+  Json::Value out;
+  EXPECT_TRUE(codes.Add("alice", support::id64('c'), "read", "state", "", out));
+  return out[names::kCode].asString();
+}
+
+/// With id 0 when there is no such code.
+Found find(OAUTHDBGrantCode& codes, const std::string& code) {
+  Json::Value rows;
+  const bool found = codes.Get(code, &rows) != 0 && rows.size() == 1;
+  return {code, found ? std::atoll(rows[0U][names::kId].asCString()) : 0};
 }
 
 struct Round {
@@ -65,25 +89,28 @@ class ExactlyOnceTest : public support::World {
     SetUp();
     round_->finds = round_->successes = round_->errors = 0;
     OAUTHDBGrantCode codes(names::kGrantCodeTable);
-    Json::Value out;
-    EXPECT_TRUE(codes.Add("alice", support::id64('c'), "read", "state", "", out));
-    std::strncpy(round_->code.data(), out[names::kCode].asCString(), round_->code.size() - 1);
+    std::strncpy(round_->code.data(), issueCode(codes).c_str(), round_->code.size() - 1);
   }
 
   void request(Redeem redeem) {
     OAUTHDBGrantCode codes(names::kGrantCodeTable);
-    Json::Value rows;
-    const bool found = codes.Get(round_->code.data(), &rows) != 0 && rows.size() == 1;
-    const long long id = found ? std::atoll(rows[0U][names::kId].asCString()) : 0;
-    if (found) ++round_->finds;
+    const Found found = find(codes, round_->code.data());
+    if (found.id > 0) ++round_->finds;
     round_->found.wait();
-    if (redeem(codes, id) != 0) ++round_->successes;
+    if (redeem(codes, found)) ++round_->successes;
     if (codes.GetErrCode() != 255) ++round_->errors;
   }
 };
 
+TEST_F(ExactlyOnceTest, DeletingByCodeSucceedsForOneOfAll) {
+  redeemAtOnce(redeemByCode, [this] {
+    EXPECT_EQ(round_->successes, 1);
+    EXPECT_EQ(rowsOfTheCode(), "0");
+  });
+}
+
 TEST_F(ExactlyOnceTest, DelSucceedsForOneOfAll) {
-  redeemAtOnce(redeemWithDel, [this] {
+  redeemAtOnce(redeemById, [this] {
     EXPECT_EQ(round_->successes, 1);
     EXPECT_EQ(rowsOfTheCode(), "0");
   });
@@ -94,6 +121,34 @@ TEST_F(ExactlyOnceTest, RevokeSucceedsForEachOfThem) {
     EXPECT_EQ(round_->successes, kProcesses);
     EXPECT_EQ(rowsOfTheCode(), "1");
   });
+}
+
+/// One request is overtaken by another with the same code, and by the issue of
+/// the next code, which gets the id of the one that is gone.
+class OvertakenRequestTest : public ExactlyOnceTest {
+ protected:
+  void SetUp() override {
+    ExactlyOnceTest::SetUp();
+    OAUTHDBGrantCode codes(names::kGrantCodeTable);
+    found_ = find(codes, issueCode(codes));
+    EXPECT_TRUE(redeemByCode(codes, found_));
+    next_ = issueCode(codes);
+  }
+
+  Found found_;
+  std::string next_;
+};
+
+TEST_F(OvertakenRequestTest, DeletingByCodeFails) {
+  OAUTHDBGrantCode codes(names::kGrantCodeTable);
+  EXPECT_FALSE(redeemByCode(codes, found_));
+  EXPECT_EQ(find(codes, next_).id, found_.id);
+}
+
+TEST_F(OvertakenRequestTest, DelSucceedsAndTakesTheNextCodeAway) {
+  OAUTHDBGrantCode codes(names::kGrantCodeTable);
+  EXPECT_TRUE(redeemById(codes, found_));
+  EXPECT_EQ(find(codes, next_).id, 0);
 }
 
 }  // namespace

@@ -1,7 +1,5 @@
 #include "tests/load/visitor.h"
 
-#include <cstdlib>
-
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_token.h"
@@ -28,10 +26,6 @@ std::string anyIdentifier() {
 
 std::string textOf(const Json::Value& document, const char* member) {
   return document[member].asString();
-}
-
-long long idOf(const Json::Value& rows) {
-  return rows.size() == 1 ? std::atoll(textOf(rows[0U], names::kId).c_str()) : 0;
 }
 
 }  // namespace
@@ -73,7 +67,9 @@ void Visitor::redeemCode() {
   ledger_.add(names::kGrantCodeTable, code);
   Json::Value rows;
   took("find code", codes, codes.Get(code, &rows) != 0 && rows.size() == 1);
-  if (took("redeem code", codes, codes.Del(idOf(rows)) != 0)) {
+  Json::Value request;
+  request[names::kCondition][names::kCode] = code;
+  if (took("redeem code", codes, codes.DBDel(request))) {
     ledger_.remove(names::kGrantCodeTable, code);
   }
 }
