@@ -28,7 +28,8 @@ const std::vector<Command>& allCommands() {
       {"code", "revoke"},   {"code", "remove"},    {"code", "purge"},    {"token", "issue"},
       {"token", "list"},    {"token", "show"},     {"token", "verify"},  {"token", "edit"},
       {"token", "refresh"}, {"token", "revoke"},   {"token", "purge"},   {"log", "list"},
-      {"log", "add"},       {"log", "clear"},      {"", "status"}};
+      {"log", "add"},       {"log", "clear"},      {"", "status"},       {"", "backup"},
+      {"", "restore"},      {"", "rekey"}};
   return commands;
 }
 
@@ -220,8 +221,10 @@ TEST_F(Usage, CompletionOffersEveryCommandAndOption) {
 
 TEST_F(Usage, CompletionOffersFilesWhereAFileIsMeant) {
   writeFile("/tmp/secret.txt", "");
-  EXPECT_THAT(complete("client add --secret-file /tmp/sec"),
-              testing::ElementsAre("/tmp/secret.txt"));
+  for (const char* before : {"client add --secret-file", "token verify --token-file", "backup"}) {
+    EXPECT_THAT(complete(std::string(before) + " /tmp/sec"),
+                testing::ElementsAre("/tmp/secret.txt"));
+  }
 }
 
 TEST_F(Usage, CompletionDoesNotInventValues) {

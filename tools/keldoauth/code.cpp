@@ -99,7 +99,7 @@ Json::Value chosenRow(Codes& codes, const Arguments& arguments) {
     throw Failure(kUsage, "name the code by either ID or --code-file");
   }
   if (arguments.id) return rowById(codes, *arguments.id);
-  const Json::Value row = findCode(codes, readSecret(*arguments.codeFile, "Code"));
+  Json::Value row = findCode(codes, readSecret(*arguments.codeFile, "Code"));
   if (row.isNull()) throw notFound(Codes::kNoun);
   return row;
 }

@@ -11,6 +11,7 @@
 #include <cstdio>
 #include <cstring>
 #include <string>
+#include <utility>
 
 #include "tools/keldoauth/health.h"
 #include "utils/oauth_names.h"
@@ -44,7 +45,7 @@ std::string octal(mode_t mode) {
 
 /// A path and what is known about it; `status` is all zero when it is absent.
 struct Inspected {
-  explicit Inspected(const std::string& name) : path(name) {
+  explicit Inspected(std::string name) : path(std::move(name)) {
     const bool isThere = stat(path.c_str(), &status) == 0;
     error = isThere ? 0 : errno;
   }

@@ -4,7 +4,7 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <clocale>
-#include <cstdlib>
+#include <cstdio>
 #include <exception>
 #include <iostream>
 #include <string>
@@ -57,16 +57,18 @@ void addCommands(CLI::App& app, Invocation& invocation) {
 
 /// What the command line got to: the group or the command that it names.
 const CLI::App& reached(const CLI::App& app) {
-  const std::vector<CLI::App*> named = app.get_subcommands();
-  return named.empty() ? app : reached(*named.front());
+  const CLI::App* at = &app;
+  while (!at->get_subcommands().empty()) at = at->get_subcommands().front();
+  return *at;
 }
 
 /// "client add", empty for the program itself.
 std::string commandName(const CLI::App& app) {
-  const CLI::App* const parent = app.get_parent();
-  if (parent == nullptr) return {};
-  const std::string group = commandName(*parent);
-  return group + (group.empty() ? "" : " ") + app.get_name();
+  std::string name;
+  for (const CLI::App* at = &app; at->get_parent() != nullptr; at = at->get_parent()) {
+    name.insert(0, at->get_name() + (name.empty() ? "" : " "));
+  }
+  return name;
 }
 
 /// What is wrong with a command line that reached `app`.
@@ -147,7 +149,7 @@ ExitCode answer(int argc, char** argv) {
 }  // namespace
 }  // namespace tool
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
   // Only to tell characters apart; the messages stay English.
   std::setlocale(LC_CTYPE, "C.UTF-8");
   const tool::ExitCode exit = tool::answer(argc, argv);
@@ -155,4 +157,7 @@ int main(int argc, char** argv) {
   if (std::cout.good()) return exit;
   std::cerr << "keldoauth: cannot write to standard output\n";
   return tool::kNotWritten;
+} catch (const std::exception& error) {
+  std::fprintf(stderr, "keldoauth: %s\n", error.what());
+  return tool::kUnavailable;
 }

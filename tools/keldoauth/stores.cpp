@@ -35,9 +35,10 @@ void requireReady(OAUTHDBBasic& store) {
   if (store.GetErrCode() == errors::kNone.code) return;
 
   // A start-up step may fail and still leave every table there.
-  const Failure failure = libraryFailure(store);
+  const int code = store.GetErrCode();
+  const std::string message = store.GetErrMsg();
   Json::Value count;
-  if (store.DBGetRowCount(count) == 0) throw failure;
+  if (store.DBGetRowCount(count) == 0) throw libraryFailure(code, message);
   store.SetErrCode(errors::kNone.code);
 }
 

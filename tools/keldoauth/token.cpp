@@ -67,11 +67,11 @@ void printIssued(const Json::Value& document, std::ostream& out) {
 // Looking up ----------------------------------------------------------------------
 
 Json::Value rowInFile(Tokens& tokens, const Arguments& arguments) {
-  const Json::Value row = arguments.tokenFile
-                              ? findToken(tokens, &OAUTHDBToken::GetWithAccessToken,
-                                          readSecret(*arguments.tokenFile, "Access token"))
-                              : findToken(tokens, &OAUTHDBToken::GetWithRefreshToken,
-                                          readSecret(*arguments.refreshTokenFile, "Refresh token"));
+  Json::Value row = arguments.tokenFile
+                        ? findToken(tokens, &OAUTHDBToken::GetWithAccessToken,
+                                    readSecret(*arguments.tokenFile, "Access token"))
+                        : findToken(tokens, &OAUTHDBToken::GetWithRefreshToken,
+                                    readSecret(*arguments.refreshTokenFile, "Refresh token"));
   if (row.isNull()) throw notFound(Tokens::kNoun);
   return row;
 }

@@ -79,7 +79,7 @@ Answer refreshToken(const Arguments& arguments) {
   const Json::Value row = findToken(tokens, &OAUTHDBToken::GetWithRefreshToken, token);
   if (row.isNull()) throw Failure(kInvalid, "refresh token is unknown or was used before");
   removeSeen(tokens, row);
-  const Answer answer = reissue(tokens, row, arguments.expiresIn);
+  Answer answer = reissue(tokens, row, arguments.expiresIn);
   transaction.commit();
   return answer;
 }
