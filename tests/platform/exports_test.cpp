@@ -38,7 +38,7 @@ std::vector<std::string> linesOf(const std::string& command) {
 /// Names that begin with "__" belong to the compiler's instrumentation.
 std::vector<std::string> exportsOf(const std::string& file) {
   return linesOf("readelf --dyn-syms --wide '" + file +
-                 "' | awk '$1 ~ /^[0-9]+:$/ && $7 != \"UND\" && $8 !~ /^__/ {print $8}'");
+                 "' | awk '$5 ~ /GLOBAL|WEAK/ && $7 != \"UND\" && $8 !~ /^__/ {print $8}'");
 }
 
 std::string sonameOf(const std::string& file) {
