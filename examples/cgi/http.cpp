@@ -76,6 +76,12 @@ bool equalWords(std::string_view a, std::string_view b) {
                     [](char x, char y) { return lower(x) == lower(y); });
 }
 
+std::optional<std::string> bearerToken(const std::string& header) {
+  const std::size_t blank = std::min(header.find(' '), header.size());
+  if (!equalWords(header.substr(0, blank), "Bearer")) return std::nullopt;
+  return header.substr(std::min(header.find_first_not_of(' ', blank), header.size()));
+}
+
 std::optional<Parameters> Parameters::parse(std::string_view text) {
   Parameters parameters;
   while (!text.empty()) {

@@ -16,8 +16,8 @@
 
 namespace service {
 
-inline constexpr std::size_t kMaxQuery = 8 * 1024;
-inline constexpr std::size_t kMaxBody = 16 * 1024;
+inline constexpr std::size_t kMaxQuery = 8192;
+inline constexpr std::size_t kMaxBody = 16384;
 inline constexpr std::size_t kMaxParameters = 64;
 
 /// The pairs of a query or a form. A parameter without a value counts as
@@ -58,6 +58,10 @@ Request readRequest(const Environment& environment, std::istream& body);
 
 /// `%41` and `+` as a form means them. Nothing for bad encoding or a NUL byte.
 std::optional<std::string> formDecode(std::string_view text);
+
+/// The token of an Authorization header of the Bearer scheme, empty when it is
+/// missing there; nothing for another scheme.
+std::optional<std::string> bearerToken(const std::string& header);
 
 /// Whether two words of a header are equal but for their case.
 bool equalWords(std::string_view a, std::string_view b);

@@ -36,22 +36,18 @@ constexpr char kDefaultMethod[] = "client_secret_basic";
 
 void requireInitialToken(const Request& request) {
   const std::string& expected = settings().initialAccessToken;
-  const std::string& header = request.authorization;
-  const bool bearer = equalWords(header.substr(0, header.find(' ')), "Bearer");
-  if (!bearer) {
-    throw Refusal{plainAnswer(401).with("WWW-Authenticate", "Bearer realm=\"registration\"")};
+  const std::optional<std::string> token = bearerToken(request.authorization);
+  if (!token) {
+    throw Refusal{plainAnswer(401).with("WWW-Authenticate", R"(Bearer realm="registration")")};
   }
-  const std::size_t start = header.find_first_not_of(' ', header.find(' '));
-  const std::string token = start == std::string::npos ? "" : header.substr(start);
-  if (!expected.empty() && equalSecrets(token, expected)) return;
+  if (!expected.empty() && equalSecrets(*token, expected)) return;
   throw Refusal{
       oauthError(401, "invalid_token", "Not the initial access token")
-          .with("WWW-Authenticate", "Bearer realm=\"registration\", error=\"invalid_token\"")};
+          .with("WWW-Authenticate", R"(Bearer realm="registration", error="invalid_token")")};
 }
 
 Json::Value readMetadata(const Request& request) {
-  if (request.contentType != "application/json")
-    refuse("The content type must be application/json");
+  if (request.contentType != "application/json") refuse("The content type must be JSON's");
   Json::CharReaderBuilder builder;
   Json::CharReaderBuilder::strictMode(&builder.settings_);
   builder["stackLimit"] = 20;
@@ -72,7 +68,7 @@ std::string text(const Json::Value& metadata, const char* name, const std::strin
   const Json::Value& value = metadata[name];
   if (value.isNull()) return otherwise;
   if (!value.isString()) refuse(std::string(name) + " must be a string");
-  const std::string found = value.asString();
+  std::string found = value.asString();
   if (found.find('\0') != std::string::npos) refuse(std::string(name) + " has a NUL character");
   return found;
 }
@@ -116,13 +112,13 @@ std::string readRedirects(const Json::Value& metadata) {
 }
 
 std::string readScope(const Json::Value& metadata) {
-  const std::string scope = knownScopes(text(metadata, "scope", kDefaultScope));
+  std::string scope = knownScopes(text(metadata, "scope", kDefaultScope));
   if (scope.empty()) refuse("scope names nothing that this server knows");
   return scope;
 }
 
 std::string readName(const Json::Value& metadata) {
-  const std::string name = text(metadata, "client_name", "Unnamed application");
+  std::string name = text(metadata, "client_name", "Unnamed application");
   if (name.empty() || name.size() > kMaxName) refuse("client_name must be 1 to 64 bytes long");
   return name;
 }

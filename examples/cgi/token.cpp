@@ -165,7 +165,7 @@ void giveBack(const Token& token) {
 }
 
 std::string refreshedScope(const Parameters& form, const Token& old) {
-  const std::string asked = form.value("scope");
+  std::string asked = form.value("scope");
   if (asked.empty()) return old.state.grantScope;
   if (scopeNames(asked).empty() || !isWithin(asked, old.state.grantScope)) {
     refuse("invalid_scope", "The scope is wider than the one granted");

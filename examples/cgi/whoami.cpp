@@ -21,18 +21,15 @@ Answer refuse(int status, const std::string& error, const std::string& why,
 
 Answer handle(const Request& request) {
   if (!request.isRead()) return methodNotAllowed("GET, HEAD");
-  const std::string& header = request.authorization;
-  const std::size_t blank = header.find(' ');
+  const std::optional<std::string> text = bearerToken(request.authorization);
   // Who shows no token learns only that one is needed.
-  if (!equalWords(header.substr(0, blank), "Bearer")) {
+  if (!text) {
     return plainAnswer(401).with("WWW-Authenticate",
                                  std::string(kRealm) + ", scope=\"" + kScope + "\"");
   }
-  const std::size_t start =
-      blank == std::string::npos ? blank : header.find_first_not_of(' ', blank);
-  if (start == std::string::npos) return refuse(400, "invalid_request", "The token is missing");
+  if (text->empty()) return refuse(400, "invalid_request", "The token is missing");
 
-  const std::optional<Token> token = verifiedToken(header.substr(start));
+  const std::optional<Token> token = verifiedToken(*text);
   if (!token) return refuse(401, "invalid_token", "The token is unknown, expired or revoked");
   if (!isWithin(kScope, token->scope)) {
     return refuse(403, "insufficient_scope", "The token does not cover this",
