@@ -4,7 +4,7 @@
 #include <cstring>
 
 /// The web server names the address in the environment of a CGI program.
-__attribute__((visibility("default"))) int KeldCgiGetRemoteIP(char* buffer, size_t size) {
+int KeldCgiGetRemoteIP(char* buffer, size_t size) {
   const char* address = std::getenv("REMOTE_ADDR");
   if (buffer == nullptr || address == nullptr || *address == '\0') return -1;
 

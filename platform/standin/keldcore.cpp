@@ -13,8 +13,6 @@
 
 #include "platform/standin/key_file.h"
 
-#define KELDCORE_EXPORT __attribute__((visibility("default")))
-
 namespace {
 
 constexpr std::array<std::uint8_t, 10> kVersionLabel{'k', 'e', 'l', 'd', 'c',
@@ -75,7 +73,7 @@ bool decode(const char* text, Sealed& bytes, std::size_t& size) {
 
 }  // namespace
 
-KELDCORE_EXPORT int KCORECryptSzEncrypt(const char* clear, char* out, size_t outSize) {
+int KCORECryptSzEncrypt(const char* clear, char* out, size_t outSize) {
   if (clear == nullptr || out == nullptr) return 0;
   const std::size_t size = std::strlen(clear) + SIV_DIGEST_SIZE;
   if (size > kMaxSealed) return 0;
@@ -92,7 +90,7 @@ KELDCORE_EXPORT int KCORECryptSzEncrypt(const char* clear, char* out, size_t out
   return 1;
 }
 
-KELDCORE_EXPORT int KCORECryptSzDecrypt(const char* cipher, char* out, size_t outSize) {
+int KCORECryptSzDecrypt(const char* cipher, char* out, size_t outSize) {
   if (cipher == nullptr || out == nullptr) return 0;
   Sealed sealed;
   std::size_t size = 0;

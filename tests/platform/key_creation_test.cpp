@@ -211,10 +211,18 @@ TEST_P(BadPlaceTest, IsOneLinePerCallAndNoKey) {
   EXPECT_THAT(filesIn(kStateDir), IsEmpty());
 }
 
+/// Leads nowhere, at any length.
+std::string dots(int count) {
+  std::string path;
+  for (int i = 0; i < count; ++i) path += "./";
+  return path;
+}
+
 const BadPlace kBadPlaces[] = {
     {"MissingFolder", "/tmp/absent/keldcore.key", "No such file or directory"},
     {"FileForAFolder", "/tmp/file/keldcore.key", "Not a directory"},
     {"NameWithoutRoomForADraft", "/tmp/" + std::string(250, 'k'), "File name too long"},
+    {"PathWithoutRoomForADraft", "/tmp/" + dots(2043) + "k", "File name too long"},
     {"NameTooLong", "/tmp/" + std::string(256, 'k'), "File name too long"},
     {"PathTooLong", "/tmp/" + std::string(5000, 'k'), "File name too long"},
 };
