@@ -10,7 +10,7 @@ if(KELDOAUTH_PLATFORM STREQUAL "system" AND NOT (KELDCORE_LIBRARY AND KELDCGI_LI
   message(FATAL_ERROR "KELDOAUTH_PLATFORM is system, but libkeldcore or libkeldcgi is missing")
 endif()
 
-if(KELDCORE_LIBRARY AND KELDCGI_LIBRARY)
+if(KELDCORE_LIBRARY AND KELDCGI_LIBRARY AND NOT KELDOAUTH_PLATFORM STREQUAL "standin")
   message(STATUS "Platform libraries: ${KELDCORE_LIBRARY}, ${KELDCGI_LIBRARY}")
   foreach(name core cgi)
     string(TOUPPER ${name} upper)
