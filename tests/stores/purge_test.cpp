@@ -262,17 +262,19 @@ TEST_P(PurgeTest, RowThatAnotherRemovedFirstFailsWithoutACode) {
   EXPECT_THAT(ids(table()), IsEmpty());
 }
 
-/// The transaction is over with the refusal: what was deleted before is back,
-/// what follows stands for itself, and there is nothing left to commit.
-TEST_P(PurgeTest, DeletionThatEndsTheTransactionIsTheReasonKept) {
+/// The transaction is over with the refusal, and so is the purge: what was
+/// deleted before is back, and nothing more is tried.
+TEST_P(PurgeTest, DeletionThatEndsTheTransactionEndsThePurge) {
   insertExpiringAt({5, 6, 7});
+  const std::vector<Row> before = everything();
   refuseDeletion(2, "ROLLBACK");
   const Outcome outcome = purge();
   EXPECT_TRUE(failed(outcome, 19, "kept"));
-  EXPECT_THAT(ids(table()), ElementsAre("1", "2"));
-  EXPECT_THAT(outcome.lines,
-              ElementsAre(commandFailed("kept", 19), deleteFailed(),
-                          commandFailed("cannot commit - no transaction is active", 1)));
+  EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("kept", 19), deleteFailed()));
+  EXPECT_THAT(outcome.statements,
+              ElementsAre(select(), "BEGIN IMMEDIATE", deletion(1), deletion(2)));
+  sql("DROP TRIGGER refuse;");
+  EXPECT_EQ(everything(), before);
 }
 
 // BEGIN that is refused ---------------------------------------------------------------
@@ -339,6 +341,8 @@ TEST_P(PurgeTest, CommitThatSqliteTurnsIntoARollbackIsAFailure) {
   const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseCommits(true); },
                                 [](OAUTHDBBasic& /*store*/) { Statements::refuseCommits(false); });
   EXPECT_TRUE(failed(outcome, 19, "constraint failed"));
+  EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("constraint failed", 19)));
+  EXPECT_EQ(outcome.statements.back(), "COMMIT");  // there is nothing left to take back
   EXPECT_THAT(ids(table()), ElementsAre("1", "2"));
 }
 
