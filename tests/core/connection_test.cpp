@@ -303,9 +303,7 @@ TEST_F(FailedOpenTest, CountingIsRefused) {
 TEST_F(FailedOpenTest, DropGetsTheEnginesStandingText) {
   EXPECT_EQ(store->DBDrop(), 0);
   expectError(*store, 21, "bad parameter or other API misuse");
-  EXPECT_THAT(lines(),
-              ElementsAre(Line{kError, "Run Command failed!![%s][%d]",
-                               "Run Command failed!![bad parameter or other API misuse][21]"}));
+  EXPECT_THAT(lines(), ElementsAre(runFailed("bad parameter or other API misuse", 21)));
 }
 
 TEST_F(FailedOpenTest, DropIsTracedAsAFailure) {

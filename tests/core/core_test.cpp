@@ -38,6 +38,11 @@ Line plain(const std::string& text) {
   return {kError, text, text};
 }
 
+Line runFailed(const std::string& text, int code) {
+  return {kError, "Run Command failed!![%s][%d]",
+          "Run Command failed!![" + text + "][" + std::to_string(code) + "]"};
+}
+
 Json::Value json(std::string text) {
   std::replace(text.begin(), text.end(), '\'', '"');
   std::istringstream stream(text);

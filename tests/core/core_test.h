@@ -33,6 +33,8 @@ std::ostream& operator<<(std::ostream& out, const Line& line);
 
 /// A failure line without arguments: its text is its format.
 Line plain(const std::string& text);
+/// The line of a statement that the engine refused.
+Line runFailed(const std::string& text, int code);
 
 /// An object on a table, as the stores are.
 class Table : public KELDOAUTHSERVER::OAUTHDBBasic {

@@ -132,6 +132,15 @@ TEST_F(ExceptionsTest, NullResultIsRefused) {
   EXPECT_EQ(request, json("{'condition': {'client_id': 'a'}}"));
 }
 
+TEST_F(ExceptionsTest, ArgumentThatTheCallbackCannotFillIsRefused) {
+  Json::Value object(Json::objectValue);
+  EXPECT_EQ(store->DBCmd("SELECT 1", OAUTHDBBasic::TabCountCallback, &object), 0);
+  expectError(*store, -2, "Bad parameters");
+  Json::Value text("a");
+  EXPECT_EQ(store->DBCmd("SELECT 1", OAUTHDBBasic::IsTabExistCallback, &text), 0);
+  EXPECT_THAT(SystemLog::lines(), IsEmpty());
+}
+
 TEST_F(ExceptionsTest, BuildersTakeAnyDocument) {
   for (const char* text : {"[]", "['a']", "7", "'a'", "true", "{'a': []}", "{'a': {'b': 1}}",
                            "{'modified': 7, 'condition': ['x']}"}) {
@@ -468,8 +477,7 @@ TEST_F(EngineMemoryTest, StatementWithoutMemoryFailsAsAnyOther) {
   EXPECT_EQ(store->DBCmd("SELECT '" + big + "' || '" + big + "'", nullptr, nullptr), 0);
   sqlite3_hard_heap_limit64(0);
   expectError(*store, kNoMemory, "out of memory");
-  EXPECT_THAT(lines(), ElementsAre(Line{kError, "Run Command failed!![%s][%d]",
-                                        "Run Command failed!![out of memory][7]"}));
+  EXPECT_THAT(lines(), ElementsAre(runFailed("out of memory", 7)));
   EXPECT_EQ(store->DBCmd("SELECT 1", nullptr, nullptr), 1);
 }
 

@@ -18,11 +18,6 @@ static_assert(!std::is_move_assignable_v<OAUTHDBBasic>);
 
 using ExecutorTest = CoreTest;
 
-Line runFailed(const std::string& text, int code) {
-  return {kError, "Run Command failed!![%s][%d]",
-          "Run Command failed!![" + text + "][" + std::to_string(code) + "]"};
-}
-
 // The last error and the table ------------------------------------------------
 
 TEST_F(ExecutorTest, FreshObjectHasFailedNothing) {

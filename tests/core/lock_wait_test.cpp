@@ -143,8 +143,7 @@ TEST_F(LockWaitTest, AfterFiveSecondsTheDatabaseIsLocked) {
   // The wait is measured in whole milliseconds.
   EXPECT_GT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(4990));
   expectError(*store, kLocked, "database is locked");
-  EXPECT_THAT(lines(), ElementsAre(Line{kError, "Run Command failed!![%s][%d]",
-                                        "Run Command failed!![database is locked][5]"}));
+  EXPECT_THAT(lines(), ElementsAre(runFailed("database is locked", 5)));
 }
 
 }  // namespace
