@@ -40,11 +40,12 @@ configure() {
     -DKELDOAUTH_PLATFORM=standin "$@"
 }
 
-# build FOLDER [TARGET...]
+# build FOLDER [TARGET...]: on a terminal ninja counts its steps in one line.
 build() {
-  local folder=$1
+  local folder=$1 loudness=quietly
   shift
-  quietly cmake --build "$folder" --parallel "$(nproc)" ${1:+--target "$@"}
+  if [[ -t 1 ]]; then loudness='command'; fi
+  "$loudness" cmake --build "$folder" --parallel "$(nproc)" ${1:+--target "$@"}
 }
 
 # require_private_mounts: everything that runs the library needs them.
