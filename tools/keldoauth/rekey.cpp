@@ -194,7 +194,8 @@ Answer rekey(const Arguments& arguments) {
 }
 
 void printRekeyed(const Json::Value& document, std::ostream& out) {
-  out << "Encrypted " << counted(document["converted"].asUInt64(), "value")
+  out << "Encrypted "
+      << counted(static_cast<std::size_t>(document["converted"].asUInt64()), "value")
       << " with a new key, which is now in " << cellText(document["key_file"]) << ".\n"
       << "Copies made before need the key that they were made with.\n";
 }
