@@ -103,7 +103,12 @@ int Kernel::openDevices() {
 
 extern "C" {
 
-int open(const char* path, int flags, ...) {
+/// Under the names that the linker knows: which of them `open` stands for is a
+/// matter of the size of file offsets.
+int openWithSmallOffsets(const char* path, int flags, ...) __asm__("open");
+int openWithLargeOffsets(const char* path, int flags, ...) __asm__("open64");
+
+int openWithSmallOffsets(const char* path, int flags, ...) {
   va_list arguments;
   va_start(arguments, flags);
   const mode_t mode = modeOf(flags, arguments);
@@ -111,7 +116,7 @@ int open(const char* path, int flags, ...) {
   return openFile("open", path, flags, mode);
 }
 
-int open64(const char* path, int flags, ...) {
+int openWithLargeOffsets(const char* path, int flags, ...) {
   va_list arguments;
   va_start(arguments, flags);
   const mode_t mode = modeOf(flags, arguments);
