@@ -44,7 +44,7 @@ std::string_view escapeOf(char c) {
     case '\r':
       return {};
     default:
-      return (c >= 0 && c < ' ') || c == '\x7f' ? kReplacement : std::string_view();
+      return static_cast<unsigned char>(c) < ' ' || c == '\x7f' ? kReplacement : std::string_view();
   }
 }
 
