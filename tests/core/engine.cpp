@@ -25,6 +25,7 @@ EngineState engine;
 
 struct WaitingState {
   std::function<void(int)> onNap;
+  timespec start{};  // of the standing clock
   int naps = 0;
   long long napped = 0;
 };
@@ -32,9 +33,30 @@ WaitingState waiting;
 
 constexpr long long kNanoseconds = 1000000000;
 
+/// What the C library calls its functions for this program's time_t.
+#ifdef __USE_TIME_BITS64
+constexpr char kClockGettime[] = "__clock_gettime64";
+constexpr char kNanosleep[] = "__nanosleep64";
+#else
+constexpr char kClockGettime[] = "clock_gettime";
+constexpr char kNanosleep[] = "nanosleep";
+#endif
+
 template <typename Function>
 Function original(const char* name) {
   return reinterpret_cast<Function>(dlsym(RTLD_NEXT, name));
+}
+
+int realClock(clockid_t clock, timespec* now) {
+  static const auto real = original<decltype(&clock_gettime)>(kClockGettime);
+  return real(clock, now);
+}
+
+timespec later(timespec start, long long nanoseconds) {
+  const long long sum = start.tv_nsec + nanoseconds;
+  start.tv_sec += static_cast<time_t>(sum / kNanoseconds);
+  start.tv_nsec = static_cast<long>(sum % kNanoseconds);
+  return start;
 }
 
 template <typename Hook, typename Argument>
@@ -79,6 +101,7 @@ void Waiting::release() {
   waiting = {};
 }
 void Waiting::onNap(std::function<void(int)> hook) {
+  realClock(CLOCK_MONOTONIC, &waiting.start);
   waiting.onNap = std::move(hook);
 }
 int Waiting::naps() {
@@ -117,7 +140,7 @@ int sqlite3_exec(sqlite3* db, const char* sql, int (*callback)(void*, int, char*
 }
 
 int nanosleep(const timespec* duration, timespec* remaining) {
-  if (!waiting.onNap) return original<decltype(&nanosleep)>("nanosleep")(duration, remaining);
+  if (!waiting.onNap) return original<decltype(&nanosleep)>(kNanosleep)(duration, remaining);
   ++waiting.naps;
   waiting.napped += static_cast<long long>(duration->tv_sec) * kNanoseconds + duration->tv_nsec;
   waiting.onNap(waiting.naps);
@@ -125,15 +148,11 @@ int nanosleep(const timespec* duration, timespec* remaining) {
 }
 
 int clock_gettime(clockid_t clock, timespec* now) noexcept {
-  static const auto real = original<decltype(&clock_gettime)>("clock_gettime");
-  const int result = real(clock, now);
-  if (clock != CLOCK_MONOTONIC || waiting.napped == 0) return result;
-
-  const long long shifted =
-      static_cast<long long>(now->tv_sec) * kNanoseconds + now->tv_nsec + waiting.napped;
-  now->tv_sec = static_cast<time_t>(shifted / kNanoseconds);
-  now->tv_nsec = static_cast<long>(shifted % kNanoseconds);
-  return result;
+  if (clock == CLOCK_MONOTONIC && waiting.onNap) {
+    *now = later(waiting.start, waiting.napped);
+    return 0;
+  }
+  return realClock(clock, now);
 }
 
 }  // extern "C"

@@ -27,13 +27,14 @@ class Engine {
   static void refuseExec(const std::string& start, int code);
 };
 
-/// Makes waiting take no time: nanosleep() returns at once and moves the
-/// monotonic clock on instead.
+/// Makes waiting take no time: the monotonic clock stands, and nanosleep() moves
+/// it on and returns at once.
 class Waiting {
  public:
   static void release();
 
-  /// `hook` is called in place of each nap, with its number from 1 on.
+  /// From now on; `hook` is called in place of each nap, with its number from
+  /// 1 on.
   static void onNap(std::function<void(int nth)> hook);
   static int naps();
   static long long napped();  // nanoseconds
