@@ -60,6 +60,7 @@ void* resizeForSqlite(void* memory, int size) {
 }  // namespace
 
 void FailingMemory::install() {
+  if (realSqlite.xMalloc != nullptr) return;
   sqlite3_shutdown();
   sqlite3_config(SQLITE_CONFIG_GETMALLOC, &realSqlite);
   sqlite3_mem_methods failing = realSqlite;

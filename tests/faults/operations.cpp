@@ -51,7 +51,7 @@ struct Arguments {
   std::string ip6 = "2001:db8:ffff:ffff::1";
   std::string message = "it's noted, and at some length";
   std::string filter = "entry";
-  std::string order = "ORDER BY id DESC";
+  std::string order = "ORDER BY id ASC LIMIT 100";
 };
 
 const Arguments& with() {
@@ -394,6 +394,15 @@ void leaveTransactionBehind() {
   copy("/tmp/left.db-journal", journal);
 }
 
+template <typename Choice>
+std::vector<Operation> only(Choice choice) {
+  std::vector<Operation> chosen;
+  for (Operation& operation : everyOperation()) {
+    if (choice(operation)) chosen.push_back(std::move(operation));
+  }
+  return chosen;
+}
+
 }  // namespace
 
 void furnish(Household household) {
@@ -427,12 +436,21 @@ std::vector<Operation> everyOperation() {
 }
 
 std::vector<Operation> everyWriter() {
-  std::vector<Operation> writers;
-  for (Operation& operation : everyOperation()) {
-    const bool recovers = operation.household == Household::kWithHotJournal;
-    if (operation.units > 0 || recovers) writers.push_back(std::move(operation));
-  }
-  return writers;
+  return only([](const Operation& operation) {
+    return operation.units > 0 || operation.household == Household::kWithHotJournal;
+  });
+}
+
+std::vector<Operation> everyChange() {
+  return only([](const Operation& operation) {
+    return operation.units > 0 && !operation.isConstruction();
+  });
+}
+
+std::vector<Operation> everyLookUp() {
+  return only([](const Operation& operation) {
+    return operation.units == 0 && !operation.isConstruction();
+  });
 }
 
 void PrintTo(const Operation& operation, std::ostream* out) {

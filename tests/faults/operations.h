@@ -62,6 +62,10 @@ std::vector<Operation> everyOperation();
 /// Those that write to the file when nothing goes wrong.
 std::vector<Operation> everyWriter();
 
+/// Those of a store that change rows, and those that only read.
+std::vector<Operation> everyChange();
+std::vector<Operation> everyLookUp();
+
 /// Fills the state folder, with the clock at kNow afterwards.
 void furnish(Household household);
 

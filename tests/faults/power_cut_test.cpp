@@ -7,6 +7,7 @@
 #include "tests/faults/scene.h"
 #include "tests/faults/write_back_disk.h"
 #include "tests/support/case_name.h"
+#include "tests/support/long_form.h"
 
 namespace faults {
 namespace {
@@ -25,7 +26,7 @@ class PowerCutTest : public Scene, public ::testing::WithParamInterface<Operatio
   /// other luck for what was under way.
   template <typename Check>
   void cutEverywhere(FolderWrites folderWrites, Check check) {
-    const unsigned seeds = isLongForm() ? 500 : 8;
+    const unsigned seeds = support::isLongForm() ? 250 : 8;
     int cuts = 0;
     for (unsigned seed = 1; seed <= seeds; ++seed) {
       cutDuring_ = true;

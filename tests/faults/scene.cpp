@@ -4,7 +4,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cstdlib>
 #include <filesystem>
 #include <set>
 
@@ -107,11 +106,6 @@ mode_t modeOf(const char* path) {
 }
 
 }  // namespace
-
-bool isLongForm() {
-  const char* wish = std::getenv("KELDOAUTH_LONG");
-  return wish != nullptr && std::string(wish) == "1";
-}
 
 void Scene::SetUp() {
   World::SetUp();

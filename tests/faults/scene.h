@@ -21,9 +21,6 @@ struct Inspection {
   std::string integrity;  // "ok", or what SQLite finds wrong
 };
 
-/// True when the experiments shall run in their long form.
-bool isLongForm();
-
 class Scene : public support::World {
  protected:
   /// With a umask that takes nothing away, so that what is private is so by the
