@@ -1,5 +1,6 @@
 #include "tests/load/crash_model.h"
 
+#include <algorithm>
 #include <iterator>
 #include <ostream>
 #include <tuple>
@@ -41,10 +42,13 @@ Row tokenRow(int serial, const char* expiry) {
   return row;
 }
 
+bool isExpired(const Table::value_type& row) {
+  return row.second.at("expired_time") == texts::kPastExpiry;
+}
+
 void removeExpired(Table& table) {
   for (auto row = table.begin(); row != table.end();) {
-    const bool expired = row->second.at("expired_time") == texts::kPastExpiry;
-    row = expired ? table.erase(row) : std::next(row);
+    row = isExpired(*row) ? table.erase(row) : std::next(row);
   }
 }
 
@@ -110,7 +114,11 @@ State afterChange(State state, const Operation& operation) {
 
 // Drawing -----------------------------------------------------------------------
 
-/// What an operation needs to find.
+int expiredRows(const Table& table) {
+  return static_cast<int>(std::count_if(table.begin(), table.end(), isExpired));
+}
+
+/// The table of which an operation needs a row; null when it needs none.
 const Table* tableOf(const State& state, Action action) {
   switch (action) {
     case Action::kDisableClient:
@@ -125,8 +133,16 @@ const Table* tableOf(const State& state, Action action) {
     case Action::kClearLog:
       return &state.log;
     default:
-      return nullptr;  // nothing
+      return nullptr;
   }
+}
+
+bool isPossible(const State& state, Action action) {
+  // One row would need no transaction.
+  if (action == Action::kPurgeCodes) return expiredRows(state.codes) > 1;
+  if (action == Action::kPurgeTokens) return expiredRows(state.tokens) > 1;
+  const Table* table = tableOf(state, action);
+  return table == nullptr || !table->empty();
 }
 
 }  // namespace
@@ -171,14 +187,15 @@ std::vector<State> statesAfter(const State& before, const Operation& operation) 
 
 Operation drawOperation(const State& state, int& serial, std::mt19937& random) {
   constexpr int kActions = static_cast<int>(Action::kClearLog) + 1;
-  for (;;) {
-    const auto action = static_cast<Action>(random() % kActions);
-    const Table* table = tableOf(state, action);
-    if (table == nullptr) return {action, serial++};
-    if (table->empty()) continue;
-    const auto nth = static_cast<std::ptrdiff_t>(random() % table->size());
-    return {action, std::next(table->begin(), nth)->first};
-  }
+  Action action{};
+  do {
+    action = static_cast<Action>(random() % kActions);
+  } while (!isPossible(state, action));
+
+  const Table* table = tableOf(state, action);
+  if (table == nullptr) return {action, serial++};
+  const auto nth = static_cast<std::ptrdiff_t>(random() % table->size());
+  return {action, std::next(table->begin(), nth)->first};
 }
 
 }  // namespace load

@@ -9,9 +9,10 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdlib>
-#include <ctime>
 #include <fstream>
+#include <thread>
 
 #include "stores/oauth_log.h"
 #include "tests/load/crash_model.h"
@@ -26,10 +27,11 @@ namespace {
 namespace names = KELDOAUTHSERVER::names;
 using support::Row;
 
-/// How much a writer gets done before it is killed: some messages, and then up
-/// to so long, which is more than a transaction takes on a disk.
+using Clock = std::chrono::steady_clock;
+using std::chrono::microseconds;
+
+/// A writer tells of so much at the most before its last moments begin.
 constexpr unsigned kMostMessages = 8;
-constexpr unsigned kLongestMicroseconds = 20000;
 
 class CrashTest : public support::World {
  protected:
@@ -67,11 +69,14 @@ class CrashTest : public support::World {
  private:
   static Message receive(int pipe, bool& open);
   void note(const Message& message);
+  void watchSome(int pipe);
+  void waitUpToTwoOperations();
 
   static constexpr char kJournal[] = "/var/packages/Corvane/target/etc/oauth.db-journal";
 
   mode_t umask_ = 0;
   int serial_ = 1;
+  microseconds operationTakes_{10000};  // lately
   std::mt19937 random_{support::isLongForm() ? std::random_device()() : 1U};
 };
 
@@ -98,24 +103,43 @@ void CrashTest::note(const Message& message) {
   }
 }
 
+/// Follows the writer for a while and learns how fast it is.
+void CrashTest::watchSome(int pipe) {
+  bool open = true;
+  Clock::time_point before{};
+  for (auto messages = random_() % kMostMessages; open && messages > 0; --messages) {
+    const Message message = receive(pipe, open);
+    if (!open) return;
+    note(message);
+    const Clock::time_point now = Clock::now();
+    if (message.news == News::kSucceeded && before != Clock::time_point()) {
+      const auto took = std::chrono::duration_cast<microseconds>(now - before);
+      operationTakes_ = (3 * operationTakes_ + took) / 4;
+    }
+    before = now;
+  }
+}
+
+/// So that every moment of an operation has its turn, however fast the disk is.
+void CrashTest::waitUpToTwoOperations() {
+  const auto limit = static_cast<unsigned long>(2 * operationTakes_.count() + 1);
+  std::this_thread::sleep_for(microseconds(random_() % limit));
+}
+
 void CrashTest::crash() {
   int pipe[2];
   ASSERT_EQ(pipe2(pipe, O_CLOEXEC), 0);
   const auto seed = static_cast<unsigned>(random_());
   const pid_t writer = startProcess([&] { writeForEver(pipe[1], states_.front(), serial_, seed); });
   close(pipe[1]);
-
-  bool open = true;
-  for (auto messages = random_() % kMostMessages; open && messages > 0; --messages) {
-    note(receive(pipe[0], open));
-  }
-  const timespec moment{0, static_cast<long>(random_() % kLongestMicroseconds) * 1000};
-  nanosleep(&moment, nullptr);
+  watchSome(pipe[0]);
+  waitUpToTwoOperations();
   kill(writer, SIGKILL);
   int status = 0;
   waitpid(writer, &status, 0);
   EXPECT_TRUE(WIFSIGNALED(status)) << "the writer ended by itself";
 
+  bool open = true;
   for (Message message = receive(pipe[0], open); open; message = receive(pipe[0], open)) {
     note(message);
   }
