@@ -164,7 +164,7 @@ std::vector<TraceCase> codeTraces() {
        {"oauth_grantCode:216 ==> Get", kDecryptId, kDecryptId, kGetDone}},
       {"CodePurge",
        [] {
-         support::Clock::setTo(10000000000LL);
+         for (const int id : {1, 2}) editCodeAndExpiry(id, {{"expired_time", "5"}});
          return onCodes([](auto& s) { return s.Purge(); });
        },
        {"oauth_grantCode:225 ==> Purge", "oauth_grantCode:216 ==> Get", kDecryptId, kDecryptId,
@@ -211,7 +211,7 @@ std::vector<TraceCase> tokenTraces() {
        {"oauth_token:252 ==> Get", kDecryptId, kDecryptId, kGetDone}},
       {"TokenPurge",
        [] {
-         support::Clock::setTo(10000000000LL);
+         for (const int id : {1, 2}) editTokenAndExpiry(id, {{"expired_time", "5"}});
          return onTokens([](auto& s) { return s.Purge(); });
        },
        {"oauth_token:261 ==> Purge", "oauth_token:252 ==> Get", kDecryptId, kDecryptId, kGetDone,
