@@ -2,6 +2,7 @@
 
 #include <array>
 #include <cinttypes>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 
@@ -27,16 +28,18 @@ void require(int result, sqlite3* db, const std::string& sql) {
 
 }  // namespace
 
-std::string serialText(long long serial) {
+std::string tokenText(long long serial) {
+  constexpr std::uint64_t kScatter = 0x9E3779B97F4A7C15;  // odd: no two serials meet
+  const auto number = static_cast<std::uint64_t>(serial);
   std::array<char, 65> text{};
-  std::snprintf(text.data(), text.size(), "%064llx", static_cast<unsigned long long>(serial));
+  std::snprintf(text.data(), text.size(), "%016" PRIx64 "%048" PRIx64, number * kScatter, number);
   return text.data();
 }
 
 const std::string& clientIdCipher() {
   static const std::string cipher = [] {
     std::array<char, 1024> text{};
-    if (KCORECryptSzEncrypt(serialText(1).c_str(), text.data(), text.size()) == 0) {
+    if (KCORECryptSzEncrypt(tokenText(1).c_str(), text.data(), text.size()) == 0) {
       std::fputs("the platform's cipher refuses\n", stderr);
       std::exit(1);
     }
@@ -76,7 +79,7 @@ void BareStore::registerClient(long long serial) {
 
 void BareStore::issueToken(long long serial) {
   select("SELECT COUNT(*) FROM oauth_token;");
-  const std::string token = serialText(serial);
+  const std::string token = tokenText(serial);
   run("INSERT INTO oauth_token (access_token, client_id, expired_time, flow_type, id, ip, "
       "refresh_token, scope, state, username) VALUES('" +
       token + "', '" + clientIdCipher() +

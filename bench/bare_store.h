@@ -31,8 +31,9 @@ class BareStore {
   sqlite3* db_ = nullptr;
 };
 
-/// 64 hexadecimal digits that no other serial has.
-std::string serialText(long long serial);
+/// A token of 64 hexadecimal digits that no other serial has. One after the other
+/// they scatter over an index, as drawn ones do.
+std::string tokenText(long long serial);
 
 /// What the platform's cipher makes of an identifier; the same for all rows.
 const std::string& clientIdCipher();

@@ -58,7 +58,7 @@ void registerBare(benchmark::State& state) {
 void issueLibrary(benchmark::State& state) {
   install({static_cast<int>(state.range(0)), 0, 0});
   OAUTHDBToken tokens(names::kTokenTable);
-  const std::string client = serialText(1);
+  const std::string client = tokenText(1);
   Json::Value out;
   for (auto _ : state) {
     require(state, tokens.Add("alice", client, "photos.read", "authorization_code", "af0ifjsldkj",
@@ -77,7 +77,7 @@ void issueBare(benchmark::State& state) {
 void verifyLibrary(benchmark::State& state) {
   install({static_cast<int>(state.range(0)), 0, 0});
   OAUTHDBToken tokens(names::kTokenTable);
-  const std::string token = serialText(state.range(0) / 2);
+  const std::string token = tokenText(state.range(0) / 2);
   for (auto _ : state) {
     Json::Value holder;
     require(state, tokens.Verify(token, holder));
@@ -87,7 +87,7 @@ void verifyLibrary(benchmark::State& state) {
 void refreshLibrary(benchmark::State& state) {
   install({static_cast<int>(state.range(0)), 0, 0});
   OAUTHDBToken tokens(names::kTokenTable);
-  const std::string token = serialText(state.range(0) / 2);
+  const std::string token = tokenText(state.range(0) / 2);
   for (auto _ : state) {
     Json::Value rows;
     require(state, tokens.GetWithRefreshToken(token, &rows) && rows.size() == 1);
@@ -98,7 +98,7 @@ void lookUpBare(benchmark::State& state, const char* column) {
   install({static_cast<int>(state.range(0)), 0, 0});
   BareStore store;
   const std::string sql = std::string("SELECT * FROM oauth_token WHERE ") + column + "='" +
-                          serialText(state.range(0) / 2) + "' ;";
+                          tokenText(state.range(0) / 2) + "' ;";
   for (auto _ : state) store.select(sql);
 }
 

@@ -18,7 +18,7 @@ namespace names = KELDOAUTHSERVER::names;
 
 void fillTokens(BareStore& store, const Contents& contents) {
   for (int row = 1; row <= contents.tokens; ++row) {
-    const std::string token = serialText(row);
+    const std::string token = tokenText(row);
     store.run("INSERT INTO oauth_token VALUES('alice', '" + clientIdCipher() +
               "', 'photos.read', '" + token + "', '" + token + "', '" +
               (row <= contents.expired ? "1000" : "4102444800") +
