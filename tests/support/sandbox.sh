@@ -43,7 +43,7 @@ for entry in /mnt/var/*; do
     mount --rbind "$entry" "/var/$name"
   fi
 done
-mkdir -p -m 755 "$state_dir"
+(umask 022 && mkdir -p "$state_dir")
 if [[ -n ${KELDOAUTH_STATE:-} ]]; then
   mount --move /mnt/state "$state_dir"
 else
