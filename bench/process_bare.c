@@ -85,7 +85,8 @@ int main(int argc, char** argv) {
   for (size_t i = 0; i < sizeof kStartUp / sizeof *kStartUp; ++i) {
     if (sqlite3_exec(db, kStartUp[i], NULL, NULL, NULL) != SQLITE_OK) return 2;
   }
-  const int result = strcmp(argv[1], "verify") == 0 ? verify(db, argv[2]) : issue(db, atoi(argv[2]));
+  const int result =
+      strcmp(argv[1], "verify") == 0 ? verify(db, argv[2]) : issue(db, atoi(argv[2]));
   sqlite3_close(db);
   return result;
 }
