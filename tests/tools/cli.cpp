@@ -35,7 +35,7 @@ constexpr char kErrors[] = "/tmp/cli.err";
 Arguments commandLine(const Arguments& arguments) {
   Arguments words;
   std::istringstream emulator(KELDOAUTH_EMULATOR);
-  for (std::string word; std::getline(emulator, word, ':');) words.push_back(word);
+  for (std::string word; std::getline(emulator, word, ';');) words.push_back(word);
   words.emplace_back(KELDOAUTH_CLI);
   words.insert(words.end(), arguments.begin(), arguments.end());
   return words;
