@@ -30,17 +30,6 @@ constexpr char kInput[] = "/tmp/cli.in";
 constexpr char kOutput[] = "/tmp/cli.out";
 constexpr char kErrors[] = "/tmp/cli.err";
 
-/// Programs for another processor need their emulator in front, also when they
-/// are started from an emulated one.
-Arguments commandLine(const Arguments& arguments) {
-  Arguments words;
-  std::istringstream emulator(KELDOAUTH_EMULATOR);
-  for (std::string word; std::getline(emulator, word, ';');) words.push_back(word);
-  words.emplace_back(KELDOAUTH_CLI);
-  words.insert(words.end(), arguments.begin(), arguments.end());
-  return words;
-}
-
 [[noreturn]] void execute(Arguments words) {
   std::vector<char*> argv;
   for (std::string& word : words) argv.push_back(word.data());
@@ -125,6 +114,15 @@ std::string converse(int terminal, const std::vector<Typed>& typed) {
 
 }  // namespace
 
+Arguments commandLine(const std::string& program, const Arguments& arguments) {
+  Arguments words;
+  std::istringstream emulator(KELDOAUTH_EMULATOR);
+  for (std::string word; std::getline(emulator, word, ';');) words.push_back(word);
+  words.push_back(program);
+  words.insert(words.end(), arguments.begin(), arguments.end());
+  return words;
+}
+
 void CliTest::SetUp() {
   World::SetUp();
   ::unsetenv("COLUMNS");
@@ -132,7 +130,7 @@ void CliTest::SetUp() {
 
 Outcome CliTest::run(const Arguments& arguments, const std::string& input) {
   writeFile(kInput, input);
-  return collect(spawn(commandLine(arguments), kOutput));
+  return collect(spawn(commandLine(KELDOAUTH_CLI, arguments), kOutput));
 }
 
 Outcome CliTest::runProgram(const Arguments& words) {
@@ -144,13 +142,13 @@ Outcome CliTest::runEightTimes(const Arguments& arguments, const std::string& in
   static constexpr char kScript[] =
       "input=$1; shift; for i in 1 2 3 4 5 6 7 8; do \"$@\" <<<\"$input\" & done; wait";
   Arguments words{"/bin/bash", "-c", kScript, "bash", input};
-  const Arguments command = commandLine(arguments);
+  const Arguments command = commandLine(KELDOAUTH_CLI, arguments);
   words.insert(words.end(), command.begin(), command.end());
   return runProgram(words);
 }
 
 Outcome CliTest::runAsNobody(const Arguments& arguments) {
-  Arguments words = commandLine(arguments);
+  Arguments words = commandLine(KELDOAUTH_CLI, arguments);
   *std::find(words.begin(), words.end(), KELDOAUTH_CLI) = publicCopy();
   writeFile(kInput, "");
   return collect(spawn(words, kOutput, [] {
@@ -163,7 +161,7 @@ Outcome CliTest::runAsNobody(const Arguments& arguments) {
 
 Outcome CliTest::runInto(const std::string& path, const Arguments& arguments) {
   writeFile(kInput, "");
-  return collect(spawn(commandLine(arguments), path.c_str()));
+  return collect(spawn(commandLine(KELDOAUTH_CLI, arguments), path.c_str()));
 }
 
 Outcome CliTest::collect(int exit) {
@@ -172,7 +170,7 @@ Outcome CliTest::collect(int exit) {
 
 Outcome CliTest::runOnTerminal(const Arguments& arguments, const std::vector<Typed>& typed,
                                unsigned short columns) {
-  const Arguments words = commandLine(arguments);
+  const Arguments words = commandLine(KELDOAUTH_CLI, arguments);
   const winsize size{24, columns, 0, 0};
   int terminal = -1;
   const pid_t child = forkpty(&terminal, nullptr, nullptr, &size);

@@ -90,6 +90,10 @@ class CliTest : public support::World {
 
 inline constexpr unsigned int kNobody = 65534;
 
+/// The words that start `program`. Programs for another processor need their
+/// emulator in front, also when they are started from an emulated one.
+Arguments commandLine(const std::string& program, const Arguments& arguments);
+
 /// False in the namespace of an ordinary user, who is alone there.
 bool canBecomeNobody();
 

@@ -1,15 +1,13 @@
 // keldoauth backup and restore: whole copies of the database, made by SQLite's
 // own means while the service runs.
 
-#include <fcntl.h>
-#include <unistd.h>
-
 #include <cstdlib>
 #include <filesystem>
-#include <ostream>
+#include <iostream>
 
 #include "tools/keldoauth/command.h"
 #include "tools/keldoauth/database_file.h"
+#include "tools/keldoauth/encrypted_values.h"
 #include "tools/keldoauth/files.h"
 #include "tools/keldoauth/output.h"
 #include "tools/keldoauth/stores.h"
@@ -22,34 +20,6 @@ using namespace KELDOAUTHSERVER;
 namespace tool {
 namespace {
 
-/// An empty file of the owner's alone under a name of its own beside `path`;
-/// gone with the scope, together with whatever SQLite put beside it.
-class Draft {
- public:
-  explicit Draft(const std::string& path) : name_(path + ".XXXXXX") {
-    const int descriptor = mkostemp(name_.data(), O_CLOEXEC);
-    if (descriptor < 0) throw systemFailure(name_);
-    close(descriptor);
-  }
-  ~Draft() {
-    unlink(name_.c_str());
-    unlink((name_ + "-journal").c_str());
-  }
-  Draft(const Draft&) = delete;
-  Draft& operator=(const Draft&) = delete;
-
-  [[nodiscard]] const std::string& name() const { return name_; }
-
-  /// Gives the file the name `path`, which must be free.
-  void publish(const std::string& path) const {
-    if (link(name_.c_str(), path.c_str()) != 0) throw systemFailure(path);
-    syncFolderOf(path);
-  }
-
- private:
-  std::string name_;
-};
-
 Json::Value describe(const std::string& file) {
   Json::Value document;
   document["file"] = file;
@@ -59,17 +29,23 @@ Json::Value describe(const std::string& file) {
 
 // Backup ----------------------------------------------------------------------------
 
+/// What is wrong with the copy was wrong with the store.
+void requireSound(DatabaseFile& copy) try { copy.requireStore(); } catch (const Failure& failure) {
+  throw Failure(kUnavailable, "the database is no whole store: " + failure.text(),
+                "no copy was kept; an older one can be restored");
+}
+
 Answer backup(const Arguments& arguments) {
-  const std::string& path = *arguments.file;
-  const Draft draft(path);
+  const Draft draft(*arguments.file);
   {
-    DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kRead);
+    DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
     DatabaseFile copy(draft.name(), DatabaseFile::Use::kWrite);
     store.copyTo(copy);
-    copy.requireStore();
+    copy.leaveWal();
+    requireSound(copy);
   }
-  draft.publish(path);
-  return {describe(path)};
+  draft.publish();
+  return {describe(*arguments.file)};
 }
 
 void printBackup(const Json::Value& document, std::ostream& out) {
@@ -82,21 +58,54 @@ void printBackup(const Json::Value& document, std::ostream& out) {
 
 /// Makes an empty store where there is none, as any program of the service
 /// would.
-void requireTarget() {
-  Log();
+void requireTarget() try { Log(); } catch (const Failure& failure) {
+  throw Failure(failure.exit, failure.what(),
+                "if the database is damaged, move it away together with its journal", failure.code);
+}
+
+Failure nothingChanged(const Failure& failure) {
+  return {failure.exit, failure.what(),
+          failure.hint + (failure.hint.empty() ? "" : "; ") + "the store is as it was",
+          failure.code};
+}
+
+void replaceStore(DatabaseFile& copy) {
+  DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
+  try {
+    copy.copyTo(store);
+  } catch (const Failure& failure) {
+    throw nothingChanged(failure);
+  }
+  store.requireStore();
+}
+
+void warnOfOtherKey() {
+  std::cerr << "keldoauth: restore: the platform's key is not the one of this copy\n"
+               "hint: put back the key that belongs to it; until then no client is found\n";
 }
 
 Answer restore(const Arguments& arguments) {
   const std::string& path = *arguments.file;
+  requireReadableFile(path);
+  if (isSameFile(path, names::kDatabaseFile)) {
+    throw Failure(kRefused, printable(path) + " is the database itself");
+  }
   DatabaseFile copy(path, DatabaseFile::Use::kRead);
+  copy.holdStill();
   copy.requireStore();
   confirm(arguments, "Replace everything in the store by " + printable(path) + "?");
 
+  const MaintenanceLock lock;
   requireTarget();
-  DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
-  copy.copyTo(store);
-  store.requireStore();
-  return {describe(path)};
+  replaceStore(copy);
+
+  Answer answer{describe(path)};
+  const bool isReadable = isAllReadable();
+  answer.document["key_fits"] = isReadable;
+  if (isReadable) return answer;
+  warnOfOtherKey();
+  answer.exit = kUnhealthy;
+  return answer;
 }
 
 void printRestored(const Json::Value& document, std::ostream& out) {

@@ -6,12 +6,16 @@
 
 #include <string>
 
+#include "tools/keldoauth/failure.h"
+
 struct sqlite3;
 
 namespace tool {
 
 class DatabaseFile {
  public:
+  /// kRead never writes, so that it refuses a file that a crash left in need of
+  /// a roll-back.
   enum class Use { kRead, kWrite };
 
   /// Opens an existing file; statements wait up to 30 seconds for locks.
@@ -21,19 +25,27 @@ class DatabaseFile {
   DatabaseFile(const DatabaseFile&) = delete;
   DatabaseFile& operator=(const DatabaseFile&) = delete;
 
-  /// Throws unless SQLite finds the file whole and every table of the store is
-  /// in it.
+  /// From here to the end all is read as of one moment. Throws.
+  void holdStill();
+
+  /// Throws kRefused unless SQLite finds the file whole and every table of the
+  /// store is in it with its columns.
   void requireStore();
 
   /// Makes `target` a copy of this database as of one moment, in one
   /// transaction of `target`, while others read and write either. Throws.
   void copyTo(DatabaseFile& target);
 
+  /// Makes it a file that needs no other beside it. Throws.
+  void leaveWal();
+
  private:
   std::string text(const std::string& sql);
-  [[noreturn]] void fail();
+  [[nodiscard]] Failure failure() const;
+  [[nodiscard]] Failure failure(int code) const;
 
   std::string path_;
+  Use use_;
   sqlite3* db_ = nullptr;
 };
 

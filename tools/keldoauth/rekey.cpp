@@ -4,18 +4,22 @@
 // Two files are at stake, the database and the key, and the machine may stop at
 // any moment. The new key waits beside the old one under its own name; the
 // database changes in one transaction, in which every value is read back with
-// the new key before it is committed; then the new key takes the old one's
-// place. A run that was interrupted is taken up by the next: values that the
-// waiting key decrypts are done.
+// the new key before it is committed; it is read once more from the file, and
+// then the new key takes the old one's place. A run that was interrupted is
+// taken up by the next: values that the waiting key decrypts are done.
+
+#include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <ostream>
+#include <utility>
 #include <vector>
 
 #include "core/oauth_db_basic.h"
 #include "tools/keldoauth/command.h"
+#include "tools/keldoauth/encrypted_values.h"
 #include "tools/keldoauth/files.h"
 #include "tools/keldoauth/output.h"
 #include "tools/keldoauth/stores.h"
@@ -45,74 +49,68 @@ void use(const std::string& keyFile) {
   setenv(kKeyVariable, keyFile.c_str(), 1);
 }
 
-// The library's own conversions, one value at a time -------------------------------
+// Keys ------------------------------------------------------------------------------
 
-bool convert(int (*conversion)(Json::Value&), std::string& text) {
-  Json::Value document;
-  document[names::kClientId] = text;
-  if (conversion(document) == 0) return false;
-  text = document[names::kClientId].asString();
-  return true;
+void requireKeyFile(const Keys& keys) {
+  if (std::filesystem::exists(keys.current)) return;
+  throw Failure(kRefused, "no key file " + printable(keys.current),
+                "only the stand-in cipher has one; it is made when it is first needed");
 }
 
-std::string encrypted(std::string text) {
-  if (!convert(OAUTHDBBasic::ParamEncrypt, text)) {
-    throw Failure(kUnavailable, "the cipher refuses to encrypt", "the system log says why");
-  }
-  return text;
-}
-
-// Encrypted values ------------------------------------------------------------------
-
-struct Value {
-  std::string id;      // of the row
-  std::string column;  // encrypted
-  std::string cipher;  // as stored
-  std::string clear;
-};
-
-constexpr const char* kTables[] = {names::kClientInfoTable, names::kGrantCodeTable,
-                                   names::kTokenTable};
-
-int collectRow(void* rows, int count, char** values, char** columns) {
-  Json::Value row;
-  for (int i = 0; i < count; ++i) row[columns[i]] = values[i] != nullptr ? values[i] : "";
-  static_cast<Json::Value*>(rows)->append(row);
-  return 0;
-}
-
-/// As they are stored: the library's own look-ups would decrypt them.
-std::vector<Value> storedValues(OAUTHDBBasic& store) {
-  Json::Value rows(Json::arrayValue);
-  if (store.DBCmd("SELECT * FROM " + store.GetTabName(), collectRow, &rows) == 0) {
-    throw libraryFailure(store);
-  }
-  std::vector<Value> values;
-  for (const Json::Value& row : rows) {
-    for (const char* column : {names::kClientId, names::kClientSecret}) {
-      if (!row.isMember(column)) continue;
-      values.push_back({row[names::kId].asString(), column, row[column].asString(), {}});
+/// The key to come. An interrupted run may have left one, and values that are
+/// encrypted with it. One that is made here is gone with the scope, until it is
+/// to be kept.
+class NextKey {
+ public:
+  /// A platform library that keeps its key elsewhere gives the same ciphertext
+  /// whatever the variable says.
+  explicit NextKey(const Keys& keys)
+      : file_(keys.next), isMineToRemove_(!std::filesystem::exists(file_)) {
+    use(keys.current);
+    const std::string before = encrypted("probe");
+    use(keys.next);
+    if (encrypted("probe") == before) {
+      throw Failure(kRefused, "the platform's cipher does not take its key from a file");
     }
   }
-  return values;
+  ~NextKey() {
+    if (isMineToRemove_) unlink(file_.c_str());
+  }
+  NextKey(const NextKey&) = delete;
+  NextKey& operator=(const NextKey&) = delete;
+
+  /// From now on values may depend on it.
+  void keep() {
+    syncFolderOf(file_);
+    isMineToRemove_ = false;
+  }
+
+ private:
+  std::string file_;
+  bool isMineToRemove_;
+};
+
+/// The old key goes here. A commit survives a power cut only when the folder
+/// knows that its journal is gone.
+void replaceKey(const Keys& keys) {
+  syncFolderOf(names::kDatabaseFile);
+  if (std::rename(keys.next.c_str(), keys.current.c_str()) != 0) throw systemFailure(keys.current);
+  syncFolderOf(keys.current);
 }
 
-bool decrypt(Value& value) {
-  value.clear = value.cipher;
-  return convert(OAUTHDBBasic::ParamDecrypt, value.clear);
-}
+// Values ----------------------------------------------------------------------------
 
 /// Those that the current key decrypts, with their clear text. Throws for a
 /// value that neither key does.
-std::vector<Value> valuesToConvert(OAUTHDBBasic& store, const Keys& keys) {
-  std::vector<Value> todo;
-  std::vector<Value> others;
+std::vector<EncryptedValue> valuesToConvert(OAUTHDBBasic& store, const Keys& keys) {
+  std::vector<EncryptedValue> todo;
+  std::vector<EncryptedValue> others;
   use(keys.current);
-  for (Value& value : storedValues(store)) {
+  for (EncryptedValue& value : encryptedValues(store)) {
     (decrypt(value) ? todo : others).push_back(std::move(value));
   }
   use(keys.next);
-  for (Value& value : others) {
+  for (EncryptedValue& value : others) {
     if (decrypt(value)) continue;
     throw Failure(kRefused,
                   store.GetTabName() + " " + value.id + ": " + value.column +
@@ -123,8 +121,8 @@ std::vector<Value> valuesToConvert(OAUTHDBBasic& store, const Keys& keys) {
 }
 
 /// With the next key in use.
-void convertValues(OAUTHDBBasic& store, const std::vector<Value>& values) {
-  for (const Value& value : values) {
+void convertValues(OAUTHDBBasic& store, const std::vector<EncryptedValue>& values) {
+  for (const EncryptedValue& value : values) {
     Json::Value request;
     request[names::kCondition][names::kId] = value.id;
     request[names::kModified][value.column] = value.clear;
@@ -133,50 +131,33 @@ void convertValues(OAUTHDBBasic& store, const std::vector<Value>& values) {
 }
 
 void requireAllReadable(OAUTHDBBasic& store) {
-  for (Value& value : storedValues(store)) {
+  for (EncryptedValue& value : encryptedValues(store)) {
     if (!decrypt(value)) throw Failure(kUnavailable, "a value cannot be read back");
   }
 }
 
-std::size_t convertStore(const Keys& keys) {
+std::size_t convertStore(const Keys& keys, NextKey& next) {
   std::size_t converted = 0;
   OAUTHDBBasic store;
   requireReady(store);
   Transaction transaction(store);
-  for (const char* table : kTables) {
+  for (const char* table : kTablesWithSecrets) {
     store.SetTabName(table);
-    const std::vector<Value> values = valuesToConvert(store, keys);
+    const std::vector<EncryptedValue> values = valuesToConvert(store, keys);
     convertValues(store, values);
     requireAllReadable(store);
     converted += values.size();
   }
+  next.keep();
   transaction.commit();
   return converted;
 }
 
-// Keys ------------------------------------------------------------------------------
-
-void requireKeyFile(const Keys& keys) {
-  if (std::filesystem::exists(keys.current)) return;
-  throw Failure(kRefused, "no key file " + printable(keys.current),
-                "only the stand-in cipher has one; it is made when it is first needed");
-}
-
-/// Makes the next key, unless an interrupted run has left one. A platform
-/// library that keeps its key elsewhere gives the same ciphertext whatever the
-/// variable says.
-void requireNextKey(const Keys& keys) {
-  use(keys.current);
-  const std::string before = encrypted("probe");
-  use(keys.next);
-  if (encrypted("probe") == before) {
-    throw Failure(kRefused, "the platform's cipher does not take its key from a file");
-  }
-}
-
-void replaceKey(const Keys& keys) {
-  if (std::rename(keys.next.c_str(), keys.current.c_str()) != 0) throw systemFailure(keys.current);
-  syncFolderOf(keys.current);
+/// Through a connection of its own, and with what came in since the commit.
+void verifyStore() {
+  if (isAllReadable()) return;
+  throw Failure(kUnavailable, "the store has values that the new key does not decrypt",
+                "both keys are still there; stop the service and run the command again");
 }
 
 Answer rekey(const Arguments& arguments) {
@@ -185,9 +166,11 @@ Answer rekey(const Arguments& arguments) {
   confirm(arguments,
           "Encrypt every identifier and secret with a new key? "
           "Stop the service first: what it writes meanwhile would be lost.");
-  requireNextKey(keys);
+  const MaintenanceLock lock;
+  NextKey next(keys);
   Answer answer;
-  answer.document["converted"] = Json::UInt64(convertStore(keys));
+  answer.document["converted"] = Json::UInt64(convertStore(keys, next));
+  verifyStore();
   replaceKey(keys);
   answer.document["key_file"] = keys.current;
   return answer;

@@ -1,0 +1,273 @@
+// Backup and restore while eight processes write.
+
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <filesystem>
+#include <random>
+#include <set>
+#include <thread>
+
+#include "stores/oauth_grantCode.h"
+#include "stores/oauth_log.h"
+#include "tests/load/processes.h"
+#include "tests/operations/operations.h"
+#include "tests/support/long_form.h"
+#include "utils/oauth_names.h"
+
+namespace operations {
+namespace {
+
+namespace fs = std::filesystem;
+namespace names = KELDOAUTHSERVER::names;
+using support::Row;
+
+constexpr int kWriters = 8;
+
+/// How far each writer came. It writes the code of a serial, then the log entry
+/// of the same serial.
+struct Progress {
+  std::array<std::atomic<int>, kWriters> begun{};
+  std::array<std::atomic<int>, kWriters> done{};
+  std::array<std::atomic<int>, kWriters> lastFailure{};
+  std::array<std::atomic<int>, kWriters> failures{};
+  std::atomic<bool> isOver{false};
+};
+
+/// "3.000017", writer and serial.
+std::string nameOf(int writer, int serial) {
+  const std::string digits = std::to_string(serial);
+  return std::to_string(writer) + "." + std::string(6 - digits.size(), '0') + digits;
+}
+
+bool writePair(KELDOAUTHSERVER::OAUTHDBBasic& failed, const std::string& name) {
+  Json::Value out;
+  KELDOAUTHSERVER::OAUTHDBGrantCode codes(names::kGrantCodeTable);
+  const std::string client(64, 'c');
+  if (codes.Add(name, client, "read", "state", "192.0.2.1", out) == 0) {
+    failed.SetErrCode(codes.GetErrCode());
+    return false;
+  }
+  return true;
+}
+
+/// One half of the writers keeps its log open all the time.
+void writeUntilOver(Progress& progress, int writer) {
+  KELDOAUTHSERVER::OAUTHDBLog log(names::kLogTable);
+  for (int serial = 1; !progress.isOver; ++serial) {
+    const auto number = static_cast<std::size_t>(writer);
+    const std::string name = nameOf(writer, serial);
+    progress.begun[number] = serial;
+    if (writePair(log, name) && log.Add(name) != 0) {
+      progress.done[number] = serial;
+      continue;
+    }
+    progress.lastFailure[number] = log.GetErrCode();
+    ++progress.failures[number];
+  }
+}
+
+class Crowds : public Operations {
+ protected:
+  void SetUp() override {
+    Operations::SetUp();
+    writeSettings(R"({"grantcode_max": 10000, "log_max": 10000})");
+    expectNextProgramReady();
+  }
+
+  static int size(int usual, int inLongForm) { return support::isLongForm() ? inLongForm : usual; }
+
+  /// Lets the writers in, runs `body` in this process, and sends them away.
+  template <typename Body>
+  void whileTheyWrite(Body body) {
+    const bool allEnded = load::runProcesses(
+        kWriters, [&](int number) { writeUntilOver(*progress_.operator->(), number); },
+        [&] {
+          waitForEachWriter();
+          body();
+          progress_->isOver = true;
+        });
+    EXPECT_TRUE(allEnded);
+  }
+
+  /// Until each has written two pairs more.
+  void waitForEachWriter() {
+    const Serials now = copyOf(progress_->done);
+    for (std::size_t number = 0; number < kWriters; ++number) {
+      while (progress_->done[number] < now[number] + 2) std::this_thread::yield();
+    }
+  }
+
+  [[nodiscard]] int totalDone() const {
+    int sum = 0;
+    for (const auto& done : progress_->done) sum += done;
+    return sum;
+  }
+
+  using Serials = std::array<int, kWriters>;
+
+  static Serials copyOf(const std::array<std::atomic<int>, kWriters>& counts) {
+    Serials serials{};
+    std::copy(counts.begin(), counts.end(), serials.begin());
+    return serials;
+  }
+
+  static std::set<std::string> texts(const std::vector<Row>& rows, const char* column) {
+    std::set<std::string> found;
+    for (const Row& row : rows) found.insert(row.at(column));
+    return found;
+  }
+
+  /// For each writer all pairs up to one between the two, and perhaps the code
+  /// of the one after it.
+  static void expectPrefixes(const Content& content, const Serials& least, const Serials& most) {
+    const auto codes = texts(content.at(names::kGrantCodeTable), names::kUsername);
+    const auto entries = texts(content.at(names::kLogTable), names::kMsg);
+    std::size_t expectedEntries = 0;
+    std::size_t expectedCodes = 0;
+    for (int writer = 0; writer < kWriters; ++writer) {
+      const auto number = static_cast<std::size_t>(writer);
+      int serial = 0;
+      while (entries.count(nameOf(writer, serial + 1)) != 0) ++serial;
+      EXPECT_GE(serial, least[number]) << "an acknowledged row of writer " << writer << " is lost";
+      EXPECT_LE(serial, most[number]);
+      for (int code = 1; code <= serial; ++code) {
+        EXPECT_EQ(codes.count(nameOf(writer, code)), 1U) << "a later row without an earlier one";
+      }
+      expectedEntries += static_cast<std::size_t>(serial);
+      expectedCodes += static_cast<std::size_t>(serial) + codes.count(nameOf(writer, serial + 1));
+    }
+    EXPECT_EQ(entries.size(), expectedEntries) << "a gap before some row";
+    EXPECT_EQ(codes.size(), expectedCodes);
+  }
+
+  static std::set<int> serialsOf(const std::set<std::string>& names, int writer) {
+    std::set<int> serials;
+    for (const std::string& name : names) {
+      if (name.rfind(std::to_string(writer) + ".", 0) == 0) {
+        serials.insert(std::stoi(name.substr(name.find('.') + 1)));
+      }
+    }
+    return serials;
+  }
+
+  /// Of an empty copy: rows up to `gone` went, and from some row before `kept`
+  /// on each one is there.
+  void expectSuffixes(const Content& content, const Serials& gone, const Serials& kept) const {
+    const auto codes = texts(content.at(names::kGrantCodeTable), names::kUsername);
+    const auto entries = texts(content.at(names::kLogTable), names::kMsg);
+    for (int writer = 0; writer < kWriters; ++writer) {
+      const auto number = static_cast<std::size_t>(writer);
+      for (const std::set<int>& serials : {serialsOf(codes, writer), serialsOf(entries, writer)}) {
+        ASSERT_FALSE(serials.empty());
+        const int first = *serials.begin();
+        const int last = progress_->done[number];
+        EXPECT_GE(first, gone[number]) << "a row from before the restore";
+        EXPECT_LE(first, kept[number] + 1) << "a row from after the restore is lost";
+        EXPECT_GE(*serials.rbegin(), last);
+        EXPECT_EQ(static_cast<int>(serials.size()), *serials.rbegin() - first + 1) << "a gap";
+      }
+    }
+  }
+
+  void expectNoFailures() const {
+    for (const auto& failures : progress_->failures) EXPECT_EQ(failures, 0);
+  }
+
+  /// Starts a command and kills it after up to so many milliseconds.
+  void killSoon(const Arguments& arguments, int milliseconds) {
+    const int command = load::startProcess([&] {
+      setpgid(0, 0);
+      run(arguments);
+    });
+    std::uniform_int_distribution<int> moment(0, milliseconds * 1000);
+    std::this_thread::sleep_for(std::chrono::microseconds(moment(random_)));
+    kill(-command, SIGKILL);
+    kill(command, SIGKILL);
+    int status = 0;
+    waitpid(command, &status, 0);
+    if (WIFSIGNALED(status)) ++kills_;
+  }
+
+  int kills_ = 0;
+  std::mt19937 random_{support::isLongForm() ? std::random_device()() : 1U};
+  load::Shared<Progress> progress_;
+};
+
+TEST_F(Crowds, BackupHasAllThatWasAcknowledgedBeforeItBegan) {
+  const int rounds = size(12, 300);
+  whileTheyWrite([&] {
+    for (int round = 0; round < rounds && !HasFailure(); ++round) {
+      const Serials least = copyOf(progress_->done);
+      ASSERT_THAT(backUp(), ExitsWith(cli::kOk));
+      const Serials most = copyOf(progress_->begun);
+      expectPrivate(kCopies);
+      expectPrefixes(contentOf(kCopy), least, most);
+      fs::remove(kCopy);
+    }
+  });
+  expectNoFailures();
+  RecordProperty("backups", rounds);
+  RecordProperty("rows", 2 * totalDone());
+}
+
+TEST_F(Crowds, KilledBackupsDisturbNobodyAndLeaveNoHalfCopy) {
+  const int rounds = size(30, 1000);
+  whileTheyWrite([&] {
+    for (int round = 0; round < rounds && !HasFailure(); ++round) {
+      const Serials least = copyOf(progress_->done);
+      killSoon({"backup", kCopy}, 40);
+      expectPrivate(kCopies);
+      if (fs::exists(kCopy)) {
+        expectPrefixes(contentOf(kCopy), least, copyOf(progress_->begun));
+      }
+      putBack(kCopies, {});
+    }
+  });
+  expectNoFailures();
+  EXPECT_GT(kills_, 0);
+  expectPrefixes(contentOf(), copyOf(progress_->done), copyOf(progress_->begun));
+  RecordProperty("kills", kills_);
+}
+
+TEST_F(Crowds, KilledRestoresLeaveASoundStore) {
+  const int rounds = size(30, 1000);
+  backUp();
+  whileTheyWrite([&] {
+    for (int round = 0; round < rounds && !HasFailure(); ++round) {
+      killSoon({"restore", "--yes", kCopy}, 40);
+      expectNextProgramReady();
+      contentOf();
+      expectPrivate(kStateDir);
+    }
+  });
+  expectNoFailures();
+  EXPECT_GT(kills_, 0);
+  RecordProperty("kills", kills_);
+}
+
+TEST_F(Crowds, RestoreTakesWhatWasThereAndNothingThatComes) {
+  const int rounds = size(6, 100);
+  backUp();
+  Serials gone{};
+  Serials kept{};
+  whileTheyWrite([&] {
+    for (int round = 0; round < rounds; ++round) {
+      gone = copyOf(progress_->done);
+      EXPECT_THAT(restore(), ExitsWith(cli::kOk));
+      kept = copyOf(progress_->begun);
+      waitForEachWriter();
+    }
+  });
+  expectNoFailures();
+  expectSuffixes(contentOf(), gone, kept);
+  RecordProperty("restores", rounds);
+}
+
+}  // namespace
+}  // namespace operations

@@ -1,0 +1,268 @@
+// keldoauth rekey.
+
+#include <fcntl.h>
+#include <sqlite3.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdlib>
+#include <filesystem>
+
+#include "platform/keldcore.h"
+#include "tests/operations/operations.h"
+
+namespace operations {
+namespace {
+
+namespace fs = std::filesystem;
+using support::Row;
+using testing::Contains;
+using testing::HasSubstr;
+using testing::Not;
+
+/// What a key makes of every encrypted value, nothing where it is not its own.
+using Clear = std::vector<std::string>;
+
+class Rekey : public Operations {
+ protected:
+  void SetUp() override {
+    Operations::SetUp();
+    furnish();
+    before_ = filesIn(kStateDir);
+    clear_ = clearWith(kKey);
+    ASSERT_THAT(clear_, Not(Contains("")));
+    ASSERT_EQ(clear_.size(), 12U);
+  }
+
+  void TearDown() override {
+    ::unsetenv("KELDCORE_KEY_FILE");
+    Operations::TearDown();
+  }
+
+  static Outcome rekey() { return run({"rekey", "--yes"}); }
+
+  static Clear clearWith(const std::string& key) {
+    Clear clear;
+    ::setenv("KELDCORE_KEY_FILE", key.c_str(), 1);
+    for (const char* column :
+         {"client_id FROM oauth_clientInfo", "client_secret FROM oauth_clientInfo",
+          "client_id FROM oauth_grantCode", "client_id FROM oauth_token"}) {
+      for (const Row& row : sql(std::string("SELECT ") + column + " ORDER BY id")) {
+        std::array<char, 1024> text{};
+        const int done = KCORECryptSzDecrypt(row.begin()->second.c_str(), text.data(), text.size());
+        clear.emplace_back(done != 0 ? text.data() : "");
+      }
+    }
+    ::unsetenv("KELDCORE_KEY_FILE");
+    return clear;
+  }
+
+  /// What one of two keys makes of each value.
+  static Clear clearWithEither(const std::string& one, const std::string& other) {
+    Clear clear = clearWith(one);
+    const Clear others = clearWith(other);
+    for (std::size_t i = 0; i < clear.size(); ++i) {
+      if (clear[i].empty()) clear[i] = others[i];
+    }
+    return clear;
+  }
+
+  void expectRefused(const Outcome& outcome, int exit, const std::string& error) const {
+    EXPECT_THAT(outcome, ExitsWith(exit));
+    EXPECT_EQ(outcome.err, "keldoauth: rekey: " + error);
+  }
+
+  std::map<std::string, std::string> before_;
+  Clear clear_;
+};
+
+TEST_F(Rekey, EncryptsEveryValueWithANewKey) {
+  const Outcome outcome = rekey();
+  EXPECT_THAT(outcome, ExitsWith(cli::kOk));
+  EXPECT_THAT(outcome.out, HasSubstr("Encrypted 12 values with a new key"));
+  EXPECT_EQ(clearWith(kKey), clear_);
+  EXPECT_NE(readFile(kKey), before_["keldcore.key"]);
+  EXPECT_FALSE(fs::exists(kNextKey));
+}
+
+TEST_F(Rekey, LeavesNothingThatTheOldKeyDecrypts) {
+  writeFile("/tmp/old.key", before_["keldcore.key"]);
+  ::chmod("/tmp/old.key", 0600);
+  rekey();
+  EXPECT_EQ(clearWith("/tmp/old.key"), Clear(12));
+}
+
+TEST_F(Rekey, KeepsItsFilesPrivate) {
+  rekey();
+  expectPrivate(kStateDir);
+}
+
+TEST_F(Rekey, OfAnEmptyStore) {
+  sql("DELETE FROM oauth_clientInfo; DELETE FROM oauth_grantCode; DELETE FROM oauth_token");
+  EXPECT_THAT(rekey().out, HasSubstr("Encrypted 0 values"));
+}
+
+TEST_F(Rekey, TwiceInARow) {
+  rekey();
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_EQ(clearWith(kKey), clear_);
+}
+
+// Killed ----------------------------------------------------------------------------
+
+TEST_F(Rekey, KilledAtAnyStepIsFinishedByTheNextRun) {
+  int resumed = 0;
+  const auto check = [&] {
+    expectPrivate(kStateDir);
+    if (!fs::exists(kNextKey)) fs::copy(kKey, kNextKey);
+    EXPECT_EQ(clearWithEither(kKey, kNextKey), clear_) << "a key was lost";
+    if (readFile(kKey) == readFile(kNextKey)) fs::remove(kNextKey);
+    if (clearWith(kKey) != clear_) ++resumed;
+    EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+    EXPECT_EQ(clearWith(kKey), clear_);
+    EXPECT_FALSE(fs::exists(kNextKey));
+    contentOf();
+  };
+  const int steps = dieAtEachStep(
+      {"rekey", "--yes"}, [&] { putBack(kStateDir, before_); }, check);
+  EXPECT_GT(steps, 50);
+  EXPECT_GT(resumed, 0) << "no kill struck between the commit and the new key's place";
+  RecordProperty("steps", steps);
+}
+
+TEST_F(Rekey, KilledTwice) {
+  for (int nth = 5; nth < 90 && !HasFailure(); nth += 7) {
+    SCOPED_TRACE(nth);
+    putBack(kStateDir, before_);
+    dieAt(nth, Death::kBeforeTheStep, {"rekey", "--yes"});
+    dieAt(90 - nth, Death::kWithinTheStep, {"rekey", "--yes"});
+    EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+    EXPECT_EQ(clearWith(kKey), clear_);
+  }
+}
+
+TEST_F(Rekey, TakesUpAStoreInWhichTheServiceHasWrittenSinceTheKill) {
+  const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
+  putBack(kStateDir, before_);
+  const auto rename = std::find(steps.begin(), steps.end(), std::string("rename ") + kKey);
+  ASSERT_NE(rename, steps.end());
+  dieAt(static_cast<int>(rename - steps.begin()) + 1, Death::kBeforeTheStep, {"rekey", "--yes"});
+  EXPECT_EQ(clearWith(kKey), Clear(12)) << "nothing was left to take up";
+  furnish("later");
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_THAT(clearWith(kKey), Not(Contains("")));
+}
+
+TEST_F(Rekey, RemovesTheOldKeyOnlyWhenTheNewValuesAreOnTheDisk) {
+  const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
+  const auto at = [&](const std::string& step) {
+    return std::find(steps.rbegin(), steps.rend(), step).base() - steps.begin();
+  };
+  const auto committed = at(std::string("unlink ") + kJournal);
+  const auto renamed = at(std::string("rename ") + kKey);
+  const auto folder = std::string("sync ") + kStateDir;
+  ASSERT_GT(committed, 0);
+  ASSERT_GT(renamed, committed);
+  EXPECT_NE(std::find(steps.begin() + committed, steps.begin() + renamed, folder),
+            steps.begin() + renamed);
+  EXPECT_GT(at(folder), renamed);
+}
+
+TEST_F(Rekey, KnowsItsNewKeyOnTheDiskBeforeItCommits) {
+  const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
+  const auto made = std::find(steps.begin(), steps.end(), std::string("link ") + kNextKey);
+  const auto written = std::find(steps.begin(), steps.end(), std::string("write ") + kDatabase);
+  ASSERT_LT(made, written);
+  EXPECT_NE(std::find(made, written, std::string("sync ") + kStateDir), written);
+}
+
+// Refusals --------------------------------------------------------------------------
+
+TEST_F(Rekey, OfAValueThatNeitherKeyDecryptsChangesNothing) {
+  execute(kDatabase, "UPDATE oauth_grantCode SET client_id='unknown' WHERE id=2");
+  const auto before = filesIn(kStateDir);
+  expectRefused(rekey(), cli::kRefused,
+                "oauth_grantCode 2: client_id is encrypted with another key\n"
+                "hint: nothing was changed\n");
+  EXPECT_EQ(filesIn(kStateDir), before);
+}
+
+TEST_F(Rekey, WithAnotherKeyChangesNothing) {
+  writeFile(kKey, std::string(64, 'k'));
+  const auto before = filesIn(kStateDir);
+  expectRefused(rekey(), cli::kRefused,
+                "oauth_clientInfo 1: client_id is encrypted with another key\n"
+                "hint: nothing was changed\n");
+  EXPECT_EQ(filesIn(kStateDir), before);
+}
+
+TEST_F(Rekey, WithoutAKeyMakesNone) {
+  fs::remove(kKey);
+  expectRefused(rekey(), cli::kRefused,
+                std::string("no key file ") + kKey +
+                    "\nhint: only the stand-in cipher has one; it is made when it is first "
+                    "needed\n");
+  EXPECT_FALSE(fs::exists(kKey));
+}
+
+TEST_F(Rekey, InAFolderThatCannotBeWrittenChangesNothing) {
+  {
+    const cli::ReadOnlyFolder readOnly;
+    expectRefused(rekey(), cli::kUnavailable,
+                  "the cipher refuses to encrypt\nhint: the system log says why\n");
+  }
+  EXPECT_EQ(filesIn(kStateDir), before_);
+}
+
+TEST_F(Rekey, WithItsKeyApartAndADatabaseThatCannotBeWrittenChangesNothing) {
+  const std::string key = "/tmp/copies/apart.key";
+  fs::copy_file(kKey, key);
+  fs::remove(kKey);
+  ::setenv("KELDCORE_KEY_FILE", key.c_str(), 1);
+  const auto keys = filesIn(kCopies);
+  const cli::ReadOnlyFolder readOnly;
+  expectRefused(rekey(), cli::kUnavailable,
+                "attempt to write a readonly database (8)\n"
+                "hint: 'keldoauth status' shows who may write the folder and the database\n");
+  EXPECT_EQ(filesIn(kCopies), keys);
+}
+
+TEST_F(Rekey, WithAWaitingKeyThatIsNoneChangesNothing) {
+  writeFile(kNextKey, "half a key");
+  ::chmod(kNextKey, 0600);
+  const auto before = filesIn(kStateDir);
+  expectRefused(rekey(), cli::kUnavailable,
+                "the cipher refuses to encrypt\nhint: the system log says why\n");
+  EXPECT_EQ(filesIn(kStateDir), before);
+}
+
+TEST_F(Rekey, BesideAnotherOneChangesNothing) {
+  const int folder = open(kStateDir, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  ASSERT_EQ(flock(folder, LOCK_EX), 0);
+  expectRefused(rekey(), cli::kRefused,
+                "another restore or rekey is at work\nhint: nothing was changed\n");
+  EXPECT_EQ(filesIn(kStateDir), before_);
+  close(folder);
+}
+
+TEST_F(Rekey, UnderALockThatNeverGoesChangesNothing) {
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(kDatabase, &db), SQLITE_OK);
+  ASSERT_EQ(sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr), SQLITE_OK);
+  expectRefused(hurry({"rekey", "--yes"}), cli::kUnavailable,
+                "database is locked (5)\nhint: another process holds the database; try again\n");
+  sqlite3_close(db);
+  EXPECT_EQ(filesIn(kStateDir), before_);
+}
+
+TEST_F(Rekey, AtTheSameTimeEightTimesLosesNothing) {
+  runEightTimes({"rekey", "--yes"}, "");
+  EXPECT_EQ(clearWith(kKey), clear_);
+  EXPECT_FALSE(fs::exists(kNextKey));
+}
+
+}  // namespace
+}  // namespace operations
