@@ -32,16 +32,9 @@ std::string scopeItems(const std::string& scope) {
   return items;
 }
 
-/// After the form the browser is redirected to the application, and that, too,
-/// the page's policy must allow. It has no syntax for an IPv6 address.
-std::string policyTarget(const std::string& redirect) {
-  const std::string origin = originOf(redirect);
-  return origin.find('[') == std::string::npos ? origin : origin.substr(0, origin.find('/'));
-}
-
 constexpr char kQuestion[] = R"(<main class="card consent">
 <p class="eyebrow">Signed in as <strong>{}</strong></p>
-<h1><span class="app">{}</span> asks for access to your box</h1>
+<h1><bdi class="app">{}</bdi> asks for access to your box</h1>
 <p>You will return to <strong class="address">{}</strong></p>
 <h2>It would be able to</h2>
 <ul class="scopes">
@@ -70,11 +63,11 @@ std::string formSubject(const AuthorizationRequest& asked) {
 
 Answer consentPage(const std::string& user, const AuthorizationRequest& asked) {
   const std::string origin = originOf(asked.redirect);
-  return page(200, asked.client.name + " asks for access",
-              fill(kQuestion, {user, asked.client.name, origin}) + scopeItems(asked.scope) +
-                  "</ul>\n<form method=\"post\" action=\"/oauth/authorize\">\n" +
-                  hiddenRequest(user, asked) + kDecision,
-              policyTarget(asked.redirect));
+  return pageLeadingAway(asked.client.name + " asks for access",
+                         fill(kQuestion, {user, asked.client.name, origin}) +
+                             scopeItems(asked.scope) +
+                             "</ul>\n<form method=\"post\" action=\"/oauth/authorize\">\n" +
+                             hiddenRequest(user, asked) + kDecision);
 }
 
 }  // namespace service

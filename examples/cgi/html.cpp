@@ -48,6 +48,10 @@ std::string_view escapeOf(char c) {
   }
 }
 
+constexpr char kPolicy[] =
+    "default-src 'none'; style-src 'self'; img-src 'self'; base-uri 'none'; "
+    "frame-ancestors 'none'";
+
 constexpr char kHead[] = R"(<!DOCTYPE html>
 <html lang="en">
 <head>
@@ -60,6 +64,15 @@ constexpr char kHead[] = R"(<!DOCTYPE html>
 </head>
 <body>
 )";
+
+Answer pageUnder(const std::string& policy, int status, const std::string& title,
+                 const std::string& main) {
+  return Answer{status,
+                {{"Content-Type", "text/html; charset=utf-8"},
+                 {"Content-Security-Policy", policy},
+                 {"X-Frame-Options", "DENY"}},
+                fill(kHead, {title}) + main + "</body>\n</html>\n"};
+}
 
 }  // namespace
 
@@ -87,17 +100,12 @@ std::string fill(std::string_view pattern, std::initializer_list<std::string_vie
   return filled.append(pattern);
 }
 
-Answer page(int status, const std::string& title, const std::string& main,
-            const std::string& formTarget) {
-  const std::string policy =
-      "default-src 'none'; style-src 'self'; img-src 'self'; base-uri 'none'; "
-      "frame-ancestors 'none'; form-action 'self'" +
-      (formTarget.empty() ? "" : " " + formTarget);
-  return Answer{status,
-                {{"Content-Type", "text/html; charset=utf-8"},
-                 {"Content-Security-Policy", policy},
-                 {"X-Frame-Options", "DENY"}},
-                fill(kHead, {title}) + main + "</body>\n</html>\n"};
+Answer page(int status, const std::string& title, const std::string& main) {
+  return pageUnder(std::string(kPolicy) + "; form-action 'self'", status, title, main);
+}
+
+Answer pageLeadingAway(const std::string& title, const std::string& main) {
+  return pageUnder(kPolicy, 200, title, main);
 }
 
 Answer messagePage(int status, const std::string& title, const std::string& text) {

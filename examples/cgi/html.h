@@ -20,10 +20,13 @@ std::string escape(std::string_view text);
 std::string fill(std::string_view pattern, std::initializer_list<std::string_view> texts);
 
 /// A page with this title and the markup `main`. Its policy allows our style
-/// sheet and nothing else: no script, no frame, and forms to this server and
-/// to `formTarget` only.
-Answer page(int status, const std::string& title, const std::string& main,
-            const std::string& formTarget = "");
+/// sheet and nothing else: no script, no frame, and forms to this server only.
+Answer page(int status, const std::string& title, const std::string& main);
+
+/// The same for a page whose form takes the user away to an application. The
+/// browser would hold every redirect on that way against a list of targets, and
+/// where the application sends the user next is its own affair.
+Answer pageLeadingAway(const std::string& title, const std::string& main);
 
 /// A page that says one thing.
 Answer messagePage(int status, const std::string& title, const std::string& text);

@@ -19,12 +19,13 @@ const looks = [
   { name: 'phone-dark', width: 390, height: 844, colorScheme: 'dark' },
 ]
 
-let browser, landing, landingAddress, client
+let browser, landing, landingAddress, client, onward
 const arrived = []
 
 before(async () => {
   landing = createServer((request, answer) => {
     arrived.push(new URL(request.url, landingAddress))
+    if (onward) return answer.writeHead(302, { location: onward }).end()
     answer.setHeader('content-type', 'text/html')
     answer.end('<!DOCTYPE html><html lang="en"><title>Client</title><h1>Welcome back</h1>')
   })
@@ -133,6 +134,26 @@ for (const [button, check] of [
     })
   })
 }
+
+test('an application may send the user on to where it likes', async () => {
+  const home = createServer((request, answer) => {
+    answer.setHeader('content-type', 'text/html')
+    answer.end('<!DOCTYPE html><html lang="en"><title>Home</title><h1>At home</h1>')
+  })
+  await new Promise((resolve) => home.listen(0, '127.0.0.1', resolve))
+  onward = `http://127.0.0.1:${home.address().port}/`
+  try {
+    await as('alice', async (page) => {
+      await page.goto(question('onward'))
+      await page.getByRole('button', { name: 'Allow' }).click()
+      await page.waitForURL(onward, { timeout: 10000 })
+      assert.equal(await page.textContent('h1'), 'At home')
+    })
+  } finally {
+    onward = undefined
+    home.close()
+  }
+})
 
 test('consent works by keyboard', async () => {
   await as('bob', async (page) => {
