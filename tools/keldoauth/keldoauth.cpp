@@ -92,9 +92,12 @@ Json::Value documentOf(const Failure& failure) {
   return document;
 }
 
+/// In one piece: others may write to the same place.
 ExitCode report(const std::string& command, const Failure& failure, bool asJson) {
-  std::cerr << "keldoauth: " << command << (command.empty() ? "" : ": ") << failure.text() << '\n';
-  if (!failure.hint.empty()) std::cerr << "hint: " << failure.hint << '\n';
+  std::string text =
+      "keldoauth: " + command + (command.empty() ? "" : ": ") + failure.text() + '\n';
+  if (!failure.hint.empty()) text += "hint: " + failure.hint + '\n';
+  std::cerr << text;
   if (asJson) printJson(std::cout, documentOf(failure));
   return failure.exit;
 }
