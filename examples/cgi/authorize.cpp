@@ -70,10 +70,6 @@ bool isChallenge(const std::string& text) {
          text.find_first_of(".~") == std::string::npos;
 }
 
-std::string packedState(const AuthorizationRequest& asked) {
-  return pack(CodeState{asked.redirect, asked.redirectWasGiven, asked.challenge, asked.state});
-}
-
 /// Faults that the application hears of.
 void readRest(const Request& request, const Parameters& given, AuthorizationRequest& asked) {
   if (!given.isDoubled("state")) asked.state = given.value("state");
@@ -92,12 +88,9 @@ void readRest(const Request& request, const Parameters& given, AuthorizationRequ
   if (given.value("code_challenge_method") != "S256" || !isChallenge(asked.challenge)) {
     refuse(request, asked, "invalid_request", "PKCE with the method S256 is required");
   }
-  asked.scope = given.has("scope") ? given.value("scope") : asked.client.scope;
-  if (scopeNames(asked.scope).empty() || !isWithin(asked.scope, asked.client.scope)) {
+  asked.scope = given.has("scope") ? tidyScope(given.value("scope")) : asked.client.scope;
+  if (asked.scope.empty() || !isWithin(asked.scope, asked.client.scope)) {
     refuse(request, asked, "invalid_scope", "The application is not registered for this scope");
-  }
-  if (packedState(asked).size() > kMaxPackedState) {
-    refuse(request, asked, "invalid_request", "state is too long");
   }
 }
 
@@ -110,11 +103,13 @@ AuthorizationRequest readAsked(const Request& request, const Parameters& given) 
 
 /// A full table gets one chance: codes that nobody redeemed in time may go.
 std::string issueCode(const Request& request, const AuthorizationRequest& asked) {
+  const std::string state =
+      pack(CodeState{asked.redirect, asked.redirectWasGiven, asked.challenge});
   for (const bool mayPurge : {true, false}) {
     OAUTHDBGrantCode codes(names::kGrantCodeTable);
     Json::Value issued;
-    if (codes.Add(request.user, asked.client.identifier, asked.scope, packedState(asked),
-                  getRemoteIP(), issued) != 0) {
+    if (codes.Add(request.user, asked.client.identifier, asked.scope, state, getRemoteIP(),
+                  issued) != 0) {
       return issued[names::kCode].asString();
     }
     if (!mayPurge || codes.GetErrCode() != errors::kGrantCodeFull.code) break;

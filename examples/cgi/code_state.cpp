@@ -14,16 +14,15 @@ constexpr char kImplied[] = "implied";
 
 std::string pack(const CodeState& state) {
   return base64Url(state.redirect) + "." + (state.redirectWasGiven ? kGiven : kImplied) + "." +
-         state.challenge + "." + base64Url(state.clientState);
+         state.challenge;
 }
 
 std::optional<CodeState> unpackCodeState(const std::string& text) {
   const std::vector<std::string> fields = split(text, '.');
-  if (fields.size() != 4) return std::nullopt;
+  if (fields.size() != 3) return std::nullopt;
   std::optional<std::string> redirect = base64UrlDecode(fields[0]);
-  std::optional<std::string> clientState = base64UrlDecode(fields[3]);
-  if (!redirect || !clientState) return std::nullopt;
-  return CodeState{*redirect, fields[1] != kImplied, fields[2], *clientState};
+  if (!redirect) return std::nullopt;
+  return CodeState{*redirect, fields[1] != kImplied, fields[2]};
 }
 
 std::string pack(const TokenState& state) {

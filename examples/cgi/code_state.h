@@ -2,12 +2,11 @@
 // column whose text is the service's own:
 //
 //   of a code    base64url(redirect address) . how it was named . PKCE challenge
-//                . base64url(the client's state)
 //   of a token   base64url(scope of the grant) . digest of the code . when issued
 //
 // Base64url has no quote, so the text comes back from the store as it went in,
-// and no dot, so the fields cannot run into each other. The column takes 2048
-// bytes: redirect address and the client's state share about 1490.
+// and no dot, so the fields cannot run into each other. The client's own state
+// goes back to it together with the code: nobody has to keep that.
 
 #ifndef KELDOAUTH_EXAMPLES_CGI_CODE_STATE_H
 #define KELDOAUTH_EXAMPLES_CGI_CODE_STATE_H
@@ -18,13 +17,14 @@
 
 namespace service {
 
-inline constexpr std::size_t kMaxPackedState = 2048;
+/// The longest redirect address that fits, packed, into the 2048 bytes of the
+/// column.
+inline constexpr std::size_t kMaxRedirect = 1400;
 
 struct CodeState {
-  std::string redirect;     // where the code was sent
-  bool redirectWasGiven;    // in the request; then redeeming must repeat it
-  std::string challenge;    // PKCE, S256
-  std::string clientState;  // as the client sent it
+  std::string redirect;   // where the code was sent
+  bool redirectWasGiven;  // in the request; then redeeming must repeat it
+  std::string challenge;  // PKCE, S256
 };
 
 std::string pack(const CodeState& state);

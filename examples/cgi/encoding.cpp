@@ -34,6 +34,10 @@ std::optional<std::string> decode(base64_decode_ctx& decoder, std::string_view t
   return bytes;
 }
 
+bool isContinuation(char c) {
+  return (static_cast<unsigned char>(c) & 0xC0U) == 0x80U;
+}
+
 bool isUnreserved(char c) {
   return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '-' ||
          c == '.' || c == '_' || c == '~';
@@ -98,6 +102,29 @@ std::string percentEncode(std::string_view text) {
     encoded += kDigits[byte & 15U];
   }
   return encoded;
+}
+
+std::size_t characterLength(std::string_view text) {
+  const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
+  const unsigned char first = byte(0);
+  if (first < 0x80) return 1;
+  const std::size_t length = first < 0xC2 ? 0 : first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
+  if (first > 0xF4 || length == 0 || text.size() < length) return 0;
+  for (std::size_t i = 1; i < length; ++i) {
+    if (!isContinuation(text[i])) return 0;
+  }
+  const bool overlong = (first == 0xE0 && byte(1) < 0xA0) || (first == 0xF0 && byte(1) < 0x90);
+  const bool outside = (first == 0xED && byte(1) > 0x9F) || (first == 0xF4 && byte(1) > 0x8F);
+  return overlong || outside ? 0 : length;
+}
+
+bool isUtf8(std::string_view text) {
+  while (!text.empty()) {
+    const std::size_t length = characterLength(text);
+    if (length == 0) return false;
+    text.remove_prefix(length);
+  }
+  return true;
 }
 
 bool equalSecrets(std::string_view a, std::string_view b) {

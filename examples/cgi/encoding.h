@@ -3,6 +3,7 @@
 #ifndef KELDOAUTH_EXAMPLES_CGI_ENCODING_H
 #define KELDOAUTH_EXAMPLES_CGI_ENCODING_H
 
+#include <cstddef>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -23,6 +24,11 @@ std::string hmacSha256(std::string_view key, std::string_view text);
 
 /// For the value of a parameter in a query or a form.
 std::string percentEncode(std::string_view text);
+
+/// How many bytes the character at the start of `text`, which is not empty,
+/// takes; 0 when they are not UTF-8 (RFC 3629).
+std::size_t characterLength(std::string_view text);
+bool isUtf8(std::string_view text);
 
 /// Takes as long for a near miss as for a far one.
 bool equalSecrets(std::string_view a, std::string_view b);

@@ -2,30 +2,12 @@
 
 #include <cstddef>
 
+#include "examples/cgi/encoding.h"
+
 namespace service {
 namespace {
 
 constexpr char kReplacement[] = "\xEF\xBF\xBD";
-
-bool isContinuation(char c) {
-  return (static_cast<unsigned char>(c) & 0xC0U) == 0x80U;
-}
-
-/// How many bytes the character at the start of `text` takes; 0 when they are
-/// not UTF-8 (RFC 3629).
-std::size_t characterLength(std::string_view text) {
-  const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
-  const unsigned char first = byte(0);
-  if (first < 0x80) return 1;
-  const std::size_t length = first < 0xC2 ? 0 : first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
-  if (first > 0xF4 || length == 0 || text.size() < length) return 0;
-  for (std::size_t i = 1; i < length; ++i) {
-    if (!isContinuation(text[i])) return 0;
-  }
-  const bool overlong = (first == 0xE0 && byte(1) < 0xA0) || (first == 0xF0 && byte(1) < 0x90);
-  const bool outside = (first == 0xED && byte(1) > 0x9F) || (first == 0xF4 && byte(1) > 0x8F);
-  return overlong || outside ? 0 : length;
-}
 
 std::string_view escapeOf(char c) {
   switch (c) {

@@ -9,6 +9,7 @@
 
 #include "core/oauth_errors.h"
 #include "examples/cgi/answer.h"
+#include "examples/cgi/code_state.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/redirect.h"
 #include "examples/cgi/scopes.h"
@@ -104,6 +105,7 @@ std::string readRedirects(const Json::Value& metadata) {
     if (!address.isString() || !isRedirectAddress(address.asString())) {
       refuseRedirect("Only https, or http on the loopback interface, without a fragment");
     }
+    if (address.asString().size() > kMaxRedirect) refuseRedirect("An address is too long");
     stored += (stored.empty() ? "" : " ") + withoutScheme(address.asString());
   }
   if (stored.empty() && usesRedirects(metadata)) refuseRedirect("redirect_uris is missing");
@@ -120,6 +122,8 @@ std::string readScope(const Json::Value& metadata) {
 std::string readName(const Json::Value& metadata) {
   std::string name = text(metadata, "client_name", "Unnamed application");
   if (name.empty() || name.size() > kMaxName) refuse("client_name must be 1 to 64 bytes long");
+  // The reader of JSON lets any bytes through, its writer, too.
+  if (!isUtf8(name)) refuse("client_name must be UTF-8");
   return name;
 }
 

@@ -27,6 +27,12 @@ std::vector<std::string> scopeNames(const std::string& list) {
   return names;
 }
 
+std::string tidyScope(const std::string& list) {
+  std::string tidy;
+  for (const std::string& name : scopeNames(list)) tidy += (tidy.empty() ? "" : " ") + name;
+  return tidy;
+}
+
 std::string knownScopes(const std::string& list) {
   std::string known;
   for (const std::string& name : scopeNames(list)) {

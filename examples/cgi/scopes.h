@@ -24,6 +24,9 @@ inline constexpr std::array<Scope, 4> kScopes{{
 /// The words of a blank-separated list, each once, in order.
 std::vector<std::string> scopeNames(const std::string& list);
 
+/// The same as a list with one blank between two words.
+std::string tidyScope(const std::string& list);
+
 /// The words in `list` that this box knows; blank-separated.
 std::string knownScopes(const std::string& list);
 
