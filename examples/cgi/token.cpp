@@ -23,8 +23,8 @@ using namespace KELDOAUTHSERVER;
 constexpr std::size_t kCodeBytes = 64;
 constexpr std::size_t kLeastVerifier = 43;
 constexpr std::size_t kMostVerifier = 128;
-/// Two requests with one code so close together are a client that tried twice;
-/// later, the code has been seen by somebody else.
+/// Two requests with one code or refresh token so close together are a client
+/// that tried twice; later, it has been seen by somebody else.
 constexpr long long kGraceSeconds = 10;
 
 /// What a new pair is issued for.
@@ -39,18 +39,7 @@ struct Grant {
   throw Refusal{oauthError(400, error, why)};
 }
 
-/// Refuses while the table is full, rather than after the grant is gone; `freed`
-/// rows of it will go first. Only then may expired tokens be purged: their
-/// refresh tokens go with them.
-void requireRoom(unsigned long freed) {
-  const auto most = static_cast<unsigned long>(getTableRowMax(names::kTokenMax)) + freed;
-  OAUTHDBToken tokens(names::kTokenTable);
-  if (tokens.DBCheckRowMax(most) != 0) return;
-  tokens.Purge();
-  if (tokens.DBCheckRowMax(most) == 0) throw Unavailable{};
-}
-
-/// The pair; null when it could not be stored.
+/// A new pair; null when it could not be stored.
 Json::Value issue(const Client& client, const Grant& grant) {
   OAUTHDBToken tokens(names::kTokenTable);
   Json::Value pair;
@@ -164,10 +153,21 @@ void giveBack(const Token& token) {
              std::to_string(token.expires), token.flow, pack(token.state), token.address, ignored);
 }
 
+/// The pair that follows; null when it could not be stored.
+Json::Value issueNext(const Client& client, const Grant& grant, const Pair& pair) {
+  const long long expires = grant.state.issued + getExpiredPeriod(names::kTokenExpired);
+  OAUTHDBToken tokens(names::kTokenTable);
+  Json::Value stored;
+  return tokens.Add(grant.user, client.identifier, grant.scope, pair.refresh, pair.access,
+                    std::to_string(expires), grant.flow, pack(grant.state), getRemoteIP(), stored)
+             ? stored
+             : Json::Value();
+}
+
 std::string refreshedScope(const Parameters& form, const Token& old) {
-  std::string asked = form.value("scope");
-  if (asked.empty()) return old.state.grantScope;
-  if (scopeNames(asked).empty() || !isWithin(asked, old.state.grantScope)) {
+  if (!form.has("scope")) return old.state.grantScope;
+  std::string asked = tidyScope(form.value("scope"));
+  if (asked.empty() || !isWithin(asked, old.state.grantScope)) {
     refuse("invalid_scope", "The scope is wider than the one granted");
   }
   return asked;
@@ -175,7 +175,9 @@ std::string refreshedScope(const Parameters& form, const Token& old) {
 
 Answer refresh(const Client& client, const Parameters& form) {
   if (!form.has("refresh_token")) refuse("invalid_request", "refresh_token is missing");
-  const std::optional<Token> old = findRefreshToken(form.value("refresh_token"));
+  const std::string text = form.value("refresh_token");
+  const std::optional<Token> old = findRefreshToken(text);
+  if (!old) removeTokensOfFamily(client.identifier, text, std::time(nullptr) - kGraceSeconds);
   if (!old || old->clientId != client.identifier || !old->isRefreshable()) {
     refuse("invalid_grant", "The refresh token is unknown, expired or was used before");
   }
@@ -183,10 +185,11 @@ Answer refresh(const Client& client, const Parameters& form) {
                     refreshedScope(form, *old),
                     old->flow,
                     {old->state.grantScope, old->state.codeDigest, std::time(nullptr)}};
+  const Pair next = nextPair(text);
   requireRoom(1);
   // Removing first keeps the pairs at one, and makes the room for the new one.
   if (!removeToken(*old)) refuse("invalid_grant", "The refresh token was used before");
-  const Json::Value pair = issue(client, grant);
+  const Json::Value pair = issueNext(client, grant, next);
   if (pair.isNull()) {
     giveBack(*old);
     throw Unavailable{};
@@ -197,8 +200,8 @@ Answer refresh(const Client& client, const Parameters& form) {
 // The client itself -----------------------------------------------------------
 
 Answer actAsClient(const Client& client, const Parameters& form) {
-  const std::string scope = form.has("scope") ? form.value("scope") : client.scope;
-  if (scopeNames(scope).empty() || !isWithin(scope, client.scope)) {
+  const std::string scope = form.has("scope") ? tidyScope(form.value("scope")) : client.scope;
+  if (scope.empty() || !isWithin(scope, client.scope)) {
     refuse("invalid_scope", "The client is not registered for this scope");
   }
   requireRoom(0);

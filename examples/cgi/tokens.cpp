@@ -1,6 +1,8 @@
 #include "examples/cgi/tokens.h"
 
 #include <ctime>
+#include <functional>
+#include <vector>
 
 #include "core/oauth_errors.h"
 #include "examples/cgi/answer.h"
@@ -8,6 +10,7 @@
 #include "examples/cgi/encoding.h"
 #include "stores/oauth_token.h"
 #include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
 
 namespace service {
 namespace {
@@ -15,6 +18,8 @@ namespace {
 using namespace KELDOAUTHSERVER;
 
 constexpr std::size_t kTokenBytes = 64;
+/// 60 random bits name a family; the other three quarters are the secret.
+constexpr std::size_t kFamilyBytes = 16;
 
 using LookUp = bool (OAUTHDBToken::*)(const std::string&, Json::Value*);
 
@@ -26,6 +31,22 @@ std::optional<Token> find(LookUp lookUp, const std::string& text) {
   if (!(tokens.*lookUp)(text, &rows)) throw Unavailable{};
   if (rows.empty()) return std::nullopt;
   return tokenOf(rows[0]);
+}
+
+/// In one transaction: there may be many, and each alone waits for the medium.
+void removeTokens(const std::function<bool(const Token&)>& isOne) {
+  OAUTHDBToken tokens(names::kTokenTable);
+  Json::Value rows;
+  if (!tokens.Get(&rows)) throw Unavailable{};
+  std::vector<std::string> ended;
+  for (const Json::Value& row : rows) {
+    const Token token = tokenOf(row);
+    if (isOne(token)) ended.push_back(token.access);
+  }
+  if (ended.empty()) return;
+  if (tokens.DBCmd("BEGIN IMMEDIATE", nullptr, nullptr) == 0) throw Unavailable{};
+  for (const std::string& access : ended) takeRow(tokens, names::kAccessToken, access);
+  if (tokens.DBCmd("COMMIT", nullptr, nullptr) == 0) throw Unavailable{};
 }
 
 /// A token that this service did not issue has a state of its own kind.
@@ -86,17 +107,38 @@ bool removeToken(const Token& token) {
   return takeRow(tokens, names::kAccessToken, token.access);
 }
 
+Pair nextPair(const std::string& refresh) {
+  return {getRandomStr(kTokenBytes),
+          refresh.substr(0, kFamilyBytes) + getRandomStr(kTokenBytes).substr(kFamilyBytes)};
+}
+
 void removeTokensOfCode(const std::string& clientId, const std::string& codeDigest,
                         long long before) {
+  removeTokens([&](const Token& token) {
+    return token.clientId == clientId && token.state.codeDigest == codeDigest &&
+           token.state.issued < before;
+  });
+}
+
+void removeTokensOfFamily(const std::string& clientId, const std::string& refresh,
+                          long long before) {
+  if (refresh.size() != kTokenBytes) return;
+  removeTokens([&](const Token& token) {
+    return token.clientId == clientId && token.state.issued < before &&
+           token.refresh.compare(0, kFamilyBytes, refresh, 0, kFamilyBytes) == 0;
+  });
+}
+
+void requireRoom(unsigned long freed) {
+  const auto most = static_cast<unsigned long>(getTableRowMax(names::kTokenMax)) + freed;
   OAUTHDBToken tokens(names::kTokenTable);
-  Json::Value rows;
-  if (!tokens.Get(&rows)) throw Unavailable{};
-  for (const Json::Value& row : rows) {
-    const Token token = tokenOf(row);
-    if (token.clientId == clientId && token.state.codeDigest == codeDigest &&
-        token.state.issued < before)
-      removeToken(token);
-  }
+  if (tokens.DBCheckRowMax(most) != 0) return;
+  removeTokens([](const Token& token) {
+    return token.expires < std::time(nullptr) && !token.isRefreshable();
+  });
+  if (tokens.DBCheckRowMax(most) != 0) return;
+  tokens.Purge();
+  if (tokens.DBCheckRowMax(most) == 0) throw Unavailable{};
 }
 
 }  // namespace service

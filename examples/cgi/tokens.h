@@ -47,10 +47,30 @@ std::optional<Token> verifiedToken(const std::string& text);
 /// Unavailable.
 bool removeToken(const Token& token);
 
-/// Removes the tokens of a client that came from the code with this digest and were issued
-/// before `before`. For a code that comes a second time (RFC 6749, 4.1.2).
+struct Pair {
+  std::string access;
+  std::string refresh;
+};
+
+/// Draws the pair that follows one with this refresh token. The first quarter of
+/// a refresh token names its family, all that came one from the other; the rest
+/// is drawn anew.
+Pair nextPair(const std::string& refresh);
+
+// For codes and refresh tokens that come a second time (RFC 6749, 4.1.2; RFC
+// 9700, 4.14.2): each removes the tokens of a client that came from it and were
+// issued before `before`.
+
 void removeTokensOfCode(const std::string& clientId, const std::string& codeDigest,
                         long long before);
+void removeTokensOfFamily(const std::string& clientId, const std::string& refresh,
+                          long long before);
+
+/// Throws Unavailable while the table is full, rather than after the grant is
+/// gone; `freed` rows of it will go first. To make room, tokens that are worth
+/// nothing go; only when there are none, all expired ones, for their refresh
+/// tokens go with them.
+void requireRoom(unsigned long freed);
 
 }  // namespace service
 

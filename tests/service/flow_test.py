@@ -161,6 +161,13 @@ class Refreshing(unittest.TestCase):
         self.assertEqual(self.client.refresh(old["refresh_token"]).status, 200)
 
 
+    def test_scope_is_answered_tidily(self):
+        old = self.client.tokens(scope=" files.read  profile files.read ")
+        self.assertEqual(old["scope"], "files.read profile")
+        new = self.client.refresh(old["refresh_token"], scope=" profile  profile")
+        self.assertEqual(new.json["scope"], "profile")
+
+
 class ClientCredentials(unittest.TestCase):
     def test_token_stands_for_the_client_and_cannot_be_refreshed(self):
         client = register(scope="profile files.read")

@@ -123,6 +123,21 @@ class Trouble(unittest.TestCase):
         with limits(token_max=1):
             self.assertEqual(self.client.redeem(code, verifier).status, 200)
 
+    def test_worthless_tokens_go_before_those_that_can_be_renewed(self):
+        with sqlite3.connect(service.DATABASE) as file:
+            file.execute("DELETE FROM oauth_token")
+        idle = self.client.tokens()
+        forgotten = self.client.tokens()
+        self.client.post("token", grant_type="client_credentials")
+        with sqlite3.connect(service.DATABASE) as file:
+            file.execute("UPDATE oauth_token SET expired_time=CAST(unixepoch()-60 AS text)")
+            file.execute("UPDATE oauth_token SET expired_time='1' WHERE access_token=?",
+                         (forgotten["access_token"],))
+        with limits(token_max=3):
+            live = [self.client.tokens(), self.client.tokens()]
+        for pair in (idle, *live):
+            self.assertEqual(self.client.refresh(pair["refresh_token"]).status, 200)
+
     def test_full_code_table_is_said_to_the_user(self):
         page = self.client.ask(challenge_of("v" * 43))
         self.client.log_in()
