@@ -16,7 +16,7 @@ Answer show(const Request& request, const Parameters& query) {
   const std::string view = query.value("view");
   const std::string done = query.value("done");
   if (view == "access") return accessPage(request.user, done, query.value("user"));
-  if (view == "log") return logPage(request.user, query.value("filter"));
+  if (view == "log") return logPage(request.user, query.value("filter"), query.value("page"));
   if (view == "storage") return storagePage(request.user);
   return applicationsPage(request.user, done, {});
 }

@@ -5,6 +5,7 @@
 #include "core/oauth_errors.h"
 #include "examples/cgi/admin_pages.h"
 #include "examples/cgi/admin_rows.h"
+#include "examples/cgi/code_state.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/html.h"
 #include "examples/cgi/redirect.h"
@@ -37,7 +38,9 @@ std::string chosenScope(const Parameters& form) {
 std::string faultOf(const Draft& draft) {
   if (draft.name.empty()) return "The application needs a name.";
   if (draft.name.size() > kMaxName) return "The name is too long: 64 bytes at most.";
-  if (!isRedirectAddress(draft.redirect) || draft.redirect.size() > 2048) {
+  if (!isUtf8(draft.name)) return "The name cannot be read.";
+  if (draft.redirect.size() > kMaxRedirect) return "The redirect address is too long.";
+  if (!isRedirectAddress(draft.redirect)) {
     return "The redirect address must start with https://, or with http:// for 127.0.0.1 and "
            "localhost, and have no fragment.";
   }

@@ -1,5 +1,6 @@
 #include "examples/cgi/admin_pages.h"
 
+#include <algorithm>
 #include <array>
 #include <ctime>
 #include <map>
@@ -115,7 +116,7 @@ std::string registrationForm(const std::string& user, const Draft& draft) {
              "autocomplete=\"off\"></p>\n"
              "<p class=\"field\"><label for=\"redirect\">Redirect address</label>\n"
              "<input id=\"redirect\" name=\"redirect\" type=\"url\" value=\"{}\" required "
-             "maxlength=\"2048\" placeholder=\"https://\" autocomplete=\"off\" "
+             "maxlength=\"1400\" placeholder=\"https://\" autocomplete=\"off\" "
              "aria-describedby=\"redirect-hint\"></p>\n"
              "<p class=\"hint\" id=\"redirect-hint\">Where users return to. https, or http for "
              "127.0.0.1 and localhost.</p>\n",
@@ -216,6 +217,25 @@ std::string accessOfUser(const std::string& user, const std::string& shown,
   return heading + "<ul class=\"cards\">\n" + items + "</ul>\n";
 }
 
+// Audit log -------------------------------------------------------------------
+
+/// No log is so long that it had more pages.
+int pageNumber(const std::string& text) {
+  return static_cast<int>(std::clamp(number(text), 1LL, 1000LL));
+}
+
+std::string logTurn(const std::string& filter, int page, const char* word) {
+  return fill("<a class=\"button\" href=\"/admin?view=log&amp;filter={}&amp;page={}\">{}</a>\n",
+              {percentEncode(filter), std::to_string(page), word});
+}
+
+std::string logTurns(const std::string& filter, int page, bool more) {
+  if (page == 1 && !more) return {};
+  return "<nav class=\"actions\" aria-label=\"Pages of the log\">\n" +
+         (page > 1 ? logTurn(filter, page - 1, "Newer") : "") +
+         (more ? logTurn(filter, page + 1, "Older") : "") + "</nav>\n";
+}
+
 }  // namespace
 
 Answer applicationsPage(const std::string& user, const std::string& done, const Draft& draft) {
@@ -248,9 +268,13 @@ Answer accessPage(const std::string& user, const std::string& done, const std::s
                                  : accessOfUser(user, shown, all, names)));
 }
 
-Answer logPage(const std::string& user, const std::string& filter) {
+Answer logPage(const std::string& user, const std::string& filter, const std::string& number) {
+  const int page = pageNumber(number);
+  std::vector<LogEntry> entries = logEntries(filter, page);
+  const bool more = entries.size() > kLogRows;
+  if (more) entries.pop_back();
   std::string rows;
-  for (const LogEntry& entry : logEntries(filter)) {
+  for (const LogEntry& entry : entries) {
     rows += "<tr><td>" + timeText(entry.time) + fill("</td><td>{}</td></tr>\n", {entry.text});
   }
   return view(kLog, user,
@@ -261,13 +285,14 @@ Answer logPage(const std::string& user, const std::string& filter) {
                    "aria-describedby=\"filter-hint\">\n"
                    "<button>Filter</button>\n</form>\n"
                    "<p class=\"hint\" id=\"filter-hint\">% stands for any text, _ for any "
-                   "character. The newest {} entries are shown.</p>\n",
-                   {filter, std::to_string(kLogRows)}) +
+                   "character.</p>\n",
+                   {filter}) +
                   (rows.empty() ? "<p class=\"empty\">No entry.</p>\n"
                                 : "<div class=\"card\"><table>\n<thead><tr><th "
                                   "scope=\"col\">Time</th><th scope=\"col\">Entry</th></tr></thead>"
                                   "\n<tbody>\n" +
-                                      rows + "</tbody></table></div>\n"));
+                                      rows + "</tbody></table></div>\n") +
+                  logTurns(filter, page, more));
 }
 
 Answer storagePage(const std::string& user) {

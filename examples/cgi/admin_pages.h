@@ -26,7 +26,7 @@ Answer applicationsPage(const std::string& user, const std::string& done, const 
 /// `shown` is whose access is shown; empty for the list of users.
 Answer accessPage(const std::string& user, const std::string& done, const std::string& shown);
 
-Answer logPage(const std::string& user, const std::string& filter);
+Answer logPage(const std::string& user, const std::string& filter, const std::string& page);
 Answer storagePage(const std::string& user);
 
 /// The only time that a secret is shown.

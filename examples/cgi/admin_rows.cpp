@@ -1,7 +1,10 @@
 #include "examples/cgi/admin_rows.h"
 
+#include <ctime>
+
 #include "examples/cgi/answer.h"
 #include "examples/cgi/encoding.h"
+#include "examples/cgi/tokens.h"
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_log.h"
@@ -22,6 +25,10 @@ Access accessOf(Access::Kind kind, const Json::Value& row) {
           undoubled(row[names::kClientId]),
           undoubled(row[names::kScope]),
           number(row[names::kExpiredTime].asString())};
+}
+
+bool isLive(const Json::Value& row) {
+  return number(row[names::kExpiredTime].asString()) >= std::time(nullptr);
 }
 
 long long rowCount(const char* table) {
@@ -52,20 +59,27 @@ std::vector<Access> allAccess() {
   Json::Value rows;
   OAUTHDBToken tokens(names::kTokenTable);
   if (!tokens.Get(&rows)) throw Unavailable{};
-  for (const Json::Value& row : rows) all.push_back(accessOf(Access::Kind::kToken, row));
+  for (const Json::Value& row : rows) {
+    if (isLive(row) || tokenOf(row).isRefreshable()) {
+      all.push_back(accessOf(Access::Kind::kToken, row));
+    }
+  }
 
   OAUTHDBGrantCode codes(names::kGrantCodeTable);
   if (codes.Get(&rows) == 0) throw Unavailable{};
-  for (const Json::Value& row : rows) all.push_back(accessOf(Access::Kind::kCode, row));
+  for (const Json::Value& row : rows) {
+    if (isLive(row)) all.push_back(accessOf(Access::Kind::kCode, row));
+  }
   return all;
 }
 
-std::vector<LogEntry> logEntries(const std::string& filter) {
+std::vector<LogEntry> logEntries(const std::string& filter, int page) {
   OAUTHDBLog log(names::kLogTable);
   Json::Value rows;
-  const std::string newest = "ORDER BY id DESC LIMIT " + std::to_string(kLogRows);
+  const std::string shown = "ORDER BY id DESC LIMIT " + std::to_string(kLogRows + 1) + " OFFSET " +
+                            std::to_string((page - 1) * kLogRows);
   // Messages are kept with their quotes doubled.
-  if (log.Get(getSQLFormatStr(filter), newest, &rows) == 0) throw Unavailable{};
+  if (log.Get(getSQLFormatStr(filter), shown, &rows) == 0) throw Unavailable{};
   std::vector<LogEntry> entries;
   for (const Json::Value& row : rows) {
     entries.push_back({number(row[names::kTimestamp].asString()), undoubled(row[names::kMsg])});
@@ -99,9 +113,10 @@ bool removeClient(const Client& client) {
   OAUTHDBClientInfo store(names::kClientInfoTable);
   // First of all it must not get in again.
   if (!takeRow(store, names::kClientId, client.identifier)) return false;
-  for (const Access& access : allAccess()) {
-    if (access.clientId == client.identifier) removeAccess(access);
-  }
+  OAUTHDBToken tokens(names::kTokenTable);
+  takeRow(tokens, names::kClientId, client.identifier);
+  OAUTHDBGrantCode codes(names::kGrantCodeTable);
+  takeRow(codes, names::kClientId, client.identifier);
   return true;
 }
 

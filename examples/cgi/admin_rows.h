@@ -13,8 +13,8 @@ namespace service {
 
 std::vector<Client> allClients();
 
-/// What lets an application act for a user: a pair of tokens, or a code that
-/// has not been redeemed yet.
+/// What lets an application act for a user: a pair of tokens that works or can
+/// be renewed, or a code that can be redeemed.
 struct Access {
   enum class Kind { kToken, kCode };
   Kind kind;
@@ -37,8 +37,9 @@ struct LogEntry {
 
 inline constexpr int kLogRows = 200;
 
-/// The newest kLogRows entries that contain `filter`, the newest first.
-std::vector<LogEntry> logEntries(const std::string& filter);
+/// A page of the entries that contain `filter`, the newest first. Page 1 is the
+/// newest; pages have kLogRows entries, and one more when another page follows.
+std::vector<LogEntry> logEntries(const std::string& filter, int page);
 
 struct Fill {
   const char* what;

@@ -53,8 +53,8 @@ Answer redirectAnswer(const Request& request, const std::string& address);
 /// to work on. Otherwise throws Unavailable.
 bool hadNoRow(const KELDOAUTHSERVER::OAUTHDBBasic& store);
 
-/// Deletes the row whose `column` has this unique value. True for the one caller
-/// who deleted it, false when it is not there (any more). Never delete by `id`
+/// Deletes what has this value in `column`. True when there was a row: with a
+/// unique column, for the one caller who deleted it. Never delete by `id`
 /// what was read a moment ago: SQLite gives the id of the last row, once it is
 /// deleted, to the next one, and of two requests with one code the slower would
 /// delete somebody else's.

@@ -69,6 +69,20 @@ class Applications(unittest.TestCase):
         self.assertEqual(submit("enable", client=client.id).location, "/admin?done=enabled")
         self.assertEqual(whoami(pair["access_token"]).status, 200)
 
+    def test_one_with_many_tokens_is_removed_in_one_go(self):
+        client = register()
+        client.tokens()
+        with sqlite3.connect(service.DATABASE) as file:
+            file.executemany(
+                "INSERT INTO oauth_token(username, client_id, scope, refresh_token, access_token,"
+                " expired_time, flow_type, state, ip) SELECT username, client_id, scope, ?, ?,"
+                " expired_time, flow_type, state, ip FROM oauth_token ORDER BY id DESC LIMIT 1",
+                [(f"{i:064}", f"{i:064x}z") for i in range(2000)])
+        submit("remove", client=client.id)
+        with sqlite3.connect(service.DATABASE) as file:
+            left = file.execute("SELECT count(*) FROM oauth_token WHERE access_token LIKE '0000%'")
+            self.assertEqual(left.fetchone(), (0,))
+
     def test_removed_one_leaves_no_token_behind(self):
         client = register()
         access = client.tokens()["access_token"]
@@ -106,7 +120,41 @@ class Access(unittest.TestCase):
         self.assertIn("o&#39;neil", show("?view=access").text)
 
 
+    def test_only_what_still_lets_in_is_shown(self):
+        client = register(client_name="Fading")
+        client.tokens("o'neil")
+        client.log_in("o'neil")
+        client.post("token", grant_type="client_credentials")
+        with sqlite3.connect(service.DATABASE) as file:
+            for table in ("oauth_token", "oauth_grantCode"):
+                file.execute(f"UPDATE {table} SET expired_time=CAST(unixepoch()-60 AS text)")
+        users = show("?view=access").text
+        self.assertIn(">o&#39;neil</a>", users)
+        self.assertNotIn("Fading (itself)", users)
+        shown = show("?view=access&user=o%27neil").text
+        self.assertIn("Can be renewed", shown)
+        self.assertNotIn("not redeemed yet", shown)
+
+
 class AuditLog(unittest.TestCase):
+    def test_older_entries_are_pages_away(self):
+        with sqlite3.connect(service.DATABASE) as file:
+            file.execute("DELETE FROM oauth_log")
+            file.executemany("INSERT INTO oauth_log(msg, timestamp) VALUES(?, ?)",
+                             [(f"Entry {i} of ''many''", 1_700_000_000 + i) for i in range(450)])
+        seen, address = [], "?view=log&filter=of+%27many"
+        while address:
+            page = show(address).text
+            seen += re.findall(r"Entry (\d+) of", page)
+            older = re.search(r'href="/admin([^"]+)"[^>]*>Older', page)
+            address = older and html.unescape(older[1])
+        self.assertEqual(seen, [str(i) for i in reversed(range(450))])
+        self.assertIn("Newer", page)
+
+    def test_page_beyond_the_log_is_empty(self):
+        for number in ("0", "-1", "99", "9" * 30, "x"):
+            self.assertEqual(show("?view=log&page=" + number).status, 200, number)
+
     def test_filter_finds_quotes_and_shows_them_undoubled(self):
         register(client_name="Joe's app")
         register(client_name="Another")
