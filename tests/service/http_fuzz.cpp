@@ -38,7 +38,7 @@ void expectEncodings(const std::string& text) {
   const std::string markup = service::escape(text);
   expect(markup.find_first_of("<>\"'") == std::string::npos, "no markup", text);
   const auto isControl = [](char c) {
-    return c >= 0 && c < ' ' && c != '\t' && c != '\n' && c != '\r';
+    return static_cast<unsigned char>(c) < ' ' && c != '\t' && c != '\n' && c != '\r';
   };
   expect(std::none_of(markup.begin(), markup.end(), isControl), "no control character", text);
 }
