@@ -137,6 +137,8 @@ TEST_F(Usage, MistakesGoToStandardErrorWithAHint) {
       {{"token", "purge", "--grace"}, "keldoauth: token purge: --grace"},
       {{"code", "edit", "x", "--scope", "y"},
        "keldoauth: code edit: ID: 'x' is not a whole number\n"},
+      {{"code", "revoke", "1\033[2J"},
+       "keldoauth: code revoke: ID: '1\\x1b[2J' is not a whole number\n"},
   };
   for (const Case& mistake : cases) {
     const Outcome outcome = run(mistake.arguments);

@@ -75,7 +75,7 @@ std::string commandName(const CLI::App& app) {
 std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
   const bool isCommand = app.get_subcommands({}).empty();
   const std::vector<std::string> rest = app.remaining();
-  if (rest.empty()) return isCommand ? error.what() : "a command is missing";
+  if (rest.empty()) return isCommand ? printable(error.what()) : "a command is missing";
   return (isCommand ? "unexpected argument '" : "unknown command '") + printable(rest.front()) +
          "'";
 }
