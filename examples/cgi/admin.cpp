@@ -3,6 +3,7 @@
 
 #include "examples/cgi/admin_actions.h"
 #include "examples/cgi/admin_pages.h"
+#include "examples/cgi/admin_view.h"
 #include "examples/cgi/answer.h"
 #include "examples/cgi/csrf.h"
 #include "examples/cgi/html.h"

@@ -1,7 +1,5 @@
 #include "examples/cgi/admin_actions.h"
 
-#include <algorithm>
-
 #include "core/oauth_errors.h"
 #include "examples/cgi/admin_pages.h"
 #include "examples/cgi/admin_rows.h"
@@ -79,14 +77,14 @@ Answer changeClient(const Request& request, const Parameters& form, const std::s
 }
 
 Answer revoke(const Request& request, const Parameters& form) {
-  const std::string handle = form.value("access");
   const std::string user = form.value("user");
-  const std::vector<Access> all = allAccess();
-  const auto found = std::find_if(all.begin(), all.end(), [&](const Access& access) {
-    return access.user == user && access.handle() == handle;
-  });
-  const bool removed = found != all.end() && removeAccess(*found);
-  if (removed) note("Access revoked for " + user + " by " + request.user);
+  const std::string clientId = form.value("client");
+  const bool removed = removeAccess(user, clientId);
+  if (removed) {
+    const std::optional<Client> client = findClient(clientId);
+    note("Access revoked[" + (client ? client->name : clientId) + "] for " + user + " by " +
+         request.user);
+  }
   return done(request, std::string(removed ? "revoked" : "gone") +
                            "&view=access&user=" + percentEncode(user));
 }

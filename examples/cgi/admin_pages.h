@@ -9,9 +9,6 @@
 
 namespace service {
 
-/// What the forms' tokens are bound to.
-inline constexpr char kAdminSubject[] = "admin";
-
 /// The fields of the registration form, to be shown again with its fault.
 struct Draft {
   std::string name;
@@ -26,6 +23,7 @@ Answer applicationsPage(const std::string& user, const std::string& done, const 
 /// `shown` is whose access is shown; empty for the list of users.
 Answer accessPage(const std::string& user, const std::string& done, const std::string& shown);
 
+/// `page` counts from 1, the newest; any text will do.
 Answer logPage(const std::string& user, const std::string& filter, const std::string& page);
 Answer storagePage(const std::string& user);
 

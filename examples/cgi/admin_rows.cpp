@@ -1,9 +1,13 @@
 #include "examples/cgi/admin_rows.h"
 
+#include <algorithm>
 #include <ctime>
+#include <map>
+#include <utility>
 
 #include "examples/cgi/answer.h"
 #include "examples/cgi/encoding.h"
+#include "examples/cgi/scopes.h"
 #include "examples/cgi/tokens.h"
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_grantCode.h"
@@ -17,18 +21,23 @@ namespace {
 
 using namespace KELDOAUTHSERVER;
 
-Access accessOf(Access::Kind kind, const Json::Value& row) {
-  const bool isToken = kind == Access::Kind::kToken;
-  return {kind,
-          undoubled(row[isToken ? names::kAccessToken : names::kCode]),
-          undoubled(row[names::kUsername]),
-          undoubled(row[names::kClientId]),
-          undoubled(row[names::kScope]),
-          number(row[names::kExpiredTime].asString())};
-}
-
 bool isLive(const Json::Value& row) {
   return number(row[names::kExpiredTime].asString()) >= std::time(nullptr);
+}
+
+/// By user and application.
+using Found = std::map<std::pair<std::string, std::string>, Access>;
+
+void addTo(Found& found, const Json::Value& row, Access::State state) {
+  const std::string user = undoubled(row[names::kUsername]);
+  const std::string clientId = undoubled(row[names::kClientId]);
+  Access& access = found[{user, clientId}];
+  access.user = user;
+  access.clientId = clientId;
+  access.state = std::max(access.state, state);
+  access.scope = tidyScope(access.scope + " " + undoubled(row[names::kScope]));
+  access.expires = std::max(access.expires, number(row[names::kExpiredTime].asString()));
+  ++access.signIns;
 }
 
 long long rowCount(const char* table) {
@@ -41,10 +50,6 @@ long long rowCount(const char* table) {
 
 }  // namespace
 
-std::string Access::handle() const {
-  return base64Url(sha256(key));
-}
-
 std::vector<Client> allClients() {
   OAUTHDBClientInfo store(names::kClientInfoTable);
   Json::Value rows;
@@ -55,21 +60,24 @@ std::vector<Client> allClients() {
 }
 
 std::vector<Access> allAccess() {
-  std::vector<Access> all;
+  Found found;
   Json::Value rows;
   OAUTHDBToken tokens(names::kTokenTable);
   if (!tokens.Get(&rows)) throw Unavailable{};
   for (const Json::Value& row : rows) {
-    if (isLive(row) || tokenOf(row).isRefreshable()) {
-      all.push_back(accessOf(Access::Kind::kToken, row));
+    if (isLive(row)) {
+      addTo(found, row, Access::State::kInUse);
+    } else if (tokenOf(row).isRefreshable()) {
+      addTo(found, row, Access::State::kRenewable);
     }
   }
-
   OAUTHDBGrantCode codes(names::kGrantCodeTable);
   if (codes.Get(&rows) == 0) throw Unavailable{};
   for (const Json::Value& row : rows) {
-    if (isLive(row)) all.push_back(accessOf(Access::Kind::kCode, row));
+    if (isLive(row)) addTo(found, row, Access::State::kAllowed);
   }
+  std::vector<Access> all;
+  for (auto& [key, access] : found) all.push_back(std::move(access));
   return all;
 }
 
@@ -88,11 +96,11 @@ std::vector<LogEntry> logEntries(const std::string& filter, int page) {
 }
 
 std::vector<Fill> tableFill() {
-  return {
-      {"Applications", rowCount(names::kClientInfoTable), getTableRowMax(names::kClientInfoMax)},
-      {"Codes", rowCount(names::kGrantCodeTable), getTableRowMax(names::kGrantCodeMax)},
-      {"Tokens", rowCount(names::kTokenTable), getTableRowMax(names::kTokenMax)},
-      {"Audit log", rowCount(names::kLogTable), getTableRowMax(names::kLogMax)}};
+  return {{"Applications", rowCount(names::kClientInfoTable), getTableRowMax(names::kClientInfoMax),
+           true},
+          {"Codes", rowCount(names::kGrantCodeTable), getTableRowMax(names::kGrantCodeMax), true},
+          {"Tokens", rowCount(names::kTokenTable), getTableRowMax(names::kTokenMax), true},
+          {"Audit log", rowCount(names::kLogTable), getTableRowMax(names::kLogMax), false}};
 }
 
 bool setEnabled(long long id, bool enabled) {
@@ -100,13 +108,19 @@ bool setEnabled(long long id, bool enabled) {
   return (enabled ? store.Enable(id) : store.Disable(id)) != 0 || !hadNoRow(store);
 }
 
-bool removeAccess(const Access& access) {
-  if (access.kind == Access::Kind::kToken) {
-    OAUTHDBToken tokens(names::kTokenTable);
-    return takeRow(tokens, names::kAccessToken, access.key);
-  }
+bool removeAccess(const std::string& user, const std::string& clientId) {
+  OAUTHDBToken tokens(names::kTokenTable);
   OAUTHDBGrantCode codes(names::kGrantCodeTable);
-  return takeRow(codes, names::kCode, access.key);
+  bool removed = false;
+  // The codes first: whoever redeems one now makes a token that goes, too.
+  for (OAUTHDBBasic* store :
+       {static_cast<OAUTHDBBasic*>(&codes), static_cast<OAUTHDBBasic*>(&tokens)}) {
+    Json::Value request;
+    request[names::kCondition][names::kUsername] = getSQLFormatStr(user);
+    request[names::kCondition][names::kClientId] = clientId;
+    removed = store->DBDel(request) || !hadNoRow(*store) || removed;
+  }
+  return removed;
 }
 
 bool removeClient(const Client& client) {

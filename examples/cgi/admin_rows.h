@@ -13,21 +13,19 @@ namespace service {
 
 std::vector<Client> allClients();
 
-/// What lets an application act for a user: a pair of tokens that works or can
-/// be renewed, or a code that can be redeemed.
+/// What an application may do for a user, by all of their sign-ins together:
+/// codes that can be redeemed, pairs of tokens that work or can be renewed.
 struct Access {
-  enum class Kind { kToken, kCode };
-  Kind kind;
-  std::string key;  // the access token or the code itself: never shown
+  enum class State { kAllowed, kRenewable, kInUse };  // the best of them counts
   std::string user;
   std::string clientId;
+  State state = State::kAllowed;
   std::string scope;
-  long long expires;
-
-  /// What a form may name it by.
-  [[nodiscard]] std::string handle() const;
+  long long expires = 0;  // the last to expire
+  int signIns = 0;
 };
 
+/// By user and application.
 std::vector<Access> allAccess();
 
 struct LogEntry {
@@ -45,6 +43,7 @@ struct Fill {
   const char* what;
   long long rows;
   int limit;
+  bool refuses;  // new rows, when it is full
 };
 
 /// How full each table is.
@@ -52,7 +51,7 @@ std::vector<Fill> tableFill();
 
 /// False when there is no such row any more.
 bool setEnabled(long long id, bool enabled);
-bool removeAccess(const Access& access);
+bool removeAccess(const std::string& user, const std::string& clientId);
 
 /// The application with everything that lets it in.
 bool removeClient(const Client& client);

@@ -97,22 +97,38 @@ class Applications(unittest.TestCase):
 
 
 class Access(unittest.TestCase):
-    def test_revoked_access_is_gone(self):
-        access = register(client_name="Revoked").tokens("bob")["access_token"]
-        page = show("?view=access&user=bob")
-        self.assertIn("Revoked", page.text)
-        fields = Form(page.text[page.text.index('method="post"') - 6:]).fields
-        answer = submit("revoke", **{k: fields[k] for k in ("access", "user")})
+    def test_revoking_ends_every_sign_in_of_the_application(self):
+        client = register(client_name="Revoked", scope="profile files.read")
+        pairs = [client.tokens("bob"), client.tokens("bob", scope="profile files.read")]
+        code, verifier = client.log_in("bob")
+        page = show("?view=access&user=bob").text
+        self.assertEqual(page.count("<h3>Revoked</h3>"), 1)
+        self.assertIn("<dt>Sign-ins</dt><dd>3</dd>", page)
+        self.assertIn("<li>files.read</li>", page)
+        fields = Form(page[page.index('method="post"') - 6:]).fields
+        answer = submit("revoke", **{k: fields[k] for k in ("client", "user")})
         self.assertEqual(answer.location, "/admin?done=revoked&view=access&user=bob")
-        self.assertEqual(whoami(access).status, 401)
+        for pair in pairs:
+            self.assertEqual(whoami(pair["access_token"]).status, 401)
+            self.assertEqual(client.refresh(pair["refresh_token"]).status, 400)
+        self.assertEqual(client.redeem(code, verifier).status, 400)
+        self.assertIn("Access revoked[Revoked] for bob by admin", show("?view=log").text)
 
-    def test_access_of_another_user_is_not_touched(self):
-        access = register().tokens("alice")["access_token"]
-        page = show("?view=access&user=alice").text
-        for handle in re.findall(r'name="access" value="([^"]+)"', page):
-            answer = submit("revoke", access=handle, user="bob")
-            self.assertIn("done=gone", answer.location)
-        self.assertEqual(whoami(access).status, 200)
+    def test_access_of_another_user_or_application_is_not_touched(self):
+        client = register()
+        kept = [client.tokens("alice"), register().tokens("bob")]
+        client.tokens("bob")
+        self.assertIn("done=revoked", submit("revoke", client=client.id, user="bob").location)
+        self.assertIn("done=gone", submit("revoke", client=client.id, user="bob").location)
+        self.assertIn("done=gone", submit("revoke", client="", user="alice").location)
+        for pair in kept:
+            self.assertEqual(whoami(pair["access_token"]).status, 200)
+
+    def test_access_of_a_user_with_a_quote_is_revoked(self):
+        client = register()
+        access = client.tokens("o'neil")["access_token"]
+        self.assertIn("done=revoked", submit("revoke", client=client.id, user="o'neil").location)
+        self.assertEqual(whoami(access).status, 401)
 
     def test_user_with_a_quote_is_found(self):
         register(client_name="Quoted").tokens("o'neil")
@@ -129,11 +145,11 @@ class Access(unittest.TestCase):
             for table in ("oauth_token", "oauth_grantCode"):
                 file.execute(f"UPDATE {table} SET expired_time=CAST(unixepoch()-60 AS text)")
         users = show("?view=access").text
-        self.assertIn(">o&#39;neil</a>", users)
-        self.assertNotIn("Fading (itself)", users)
+        self.assertIn("<bdi>o&#39;neil</bdi>", users)
+        self.assertNotIn("Fading", users)
         shown = show("?view=access&user=o%27neil").text
         self.assertIn("Can be renewed", shown)
-        self.assertNotIn("not redeemed yet", shown)
+        self.assertNotIn("not signed in yet", shown)
 
 
 class AuditLog(unittest.TestCase):

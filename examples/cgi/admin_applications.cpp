@@ -1,0 +1,110 @@
+#include "examples/cgi/admin_pages.h"
+
+#include "examples/cgi/admin_rows.h"
+#include "examples/cgi/admin_view.h"
+#include "examples/cgi/html.h"
+#include "examples/cgi/redirect.h"
+#include "examples/cgi/scopes.h"
+
+namespace service {
+namespace {
+
+std::string scopeChoices(const std::string& chosen) {
+  std::string choices;
+  for (const Scope& scope : kScopes) {
+    choices += fill(
+        isWithin(scope.name, chosen)
+            ? "<label><input type=\"checkbox\" name=\"scope.{}\" value=\"1\" checked> {}</label>\n"
+            : "<label><input type=\"checkbox\" name=\"scope.{}\" value=\"1\"> {}</label>\n",
+        {scope.name, scope.words});
+  }
+  return choices;
+}
+
+std::string registrationForm(const std::string& user, const Draft& draft) {
+  const std::string fault =
+      draft.fault.empty()
+          ? ""
+          : fill("<p class=\"fault\" role=\"alert\" id=\"fault\">{}</p>\n", {draft.fault});
+  return "<section class=\"card\" aria-labelledby=\"new\">\n"
+         "<h2 id=\"new\">Register an application</h2>\n" +
+         fault + formStart(user, "register") +
+         fill(
+             "<p class=\"field\"><label for=\"name\">Name</label>\n"
+             "<input id=\"name\" name=\"name\" value=\"{}\" required maxlength=\"64\" "
+             "autocomplete=\"off\"></p>\n"
+             "<p class=\"field\"><label for=\"redirect\">Redirect address</label>\n"
+             "<input id=\"redirect\" name=\"redirect\" type=\"url\" value=\"{}\" required "
+             "maxlength=\"1400\" placeholder=\"https://\" autocomplete=\"off\" "
+             "aria-describedby=\"redirect-hint\"></p>\n"
+             "<p class=\"hint\" id=\"redirect-hint\">Where users return to. https, or http for "
+             "127.0.0.1 and localhost.</p>\n",
+             {draft.name, draft.redirect}) +
+         "<fieldset><legend>It may ask to</legend>\n" + scopeChoices(draft.scope) +
+         "</fieldset>\n<div class=\"actions\"><button class=\"primary\">Register</button></div>\n"
+         "</form>\n</section>\n";
+}
+
+std::string shownAddresses(const Client& client) {
+  if (client.redirects == kNoRedirect) return "no redirect address";
+  return client.redirects;
+}
+
+std::string applicationActions(const std::string& user, const Client& client) {
+  const char* change = client.enabled ? "disable" : "enable";
+  const char* word = client.enabled ? "Disable" : "Enable";
+  return "<div class=\"actions\">\n" + formStart(user, change) +
+         fill(
+             "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
+             "<button aria-label=\"{} {}\">{}</button>\n</form>\n",
+             {client.identifier, word, client.name, word}) +
+         fill("<details><summary aria-label=\"Remove {}…\">Remove…</summary>\n", {client.name}) +
+         formStart(user, "remove") +
+         fill(
+             "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
+             "<p><bdi>{}</bdi> and all access that it has will be gone for good.</p>\n"
+             "<button class=\"danger\">Remove for good</button>\n</form>\n</details>\n</div>\n",
+             {client.identifier, client.name});
+}
+
+std::string applicationItem(const std::string& user, const Client& client) {
+  return fill("<li class=\"card\">\n<h3>{}</h3>\n", {client.name}) +
+         (client.enabled ? "<p class=\"badge on\">Enabled</p>\n"
+                         : "<p class=\"badge off\">Disabled</p>\n") +
+         fill("<dl><dt>Address</dt><dd>{}</dd>\n<dt>Identifier</dt><dd><code>{}</code></dd></dl>\n",
+              {shownAddresses(client), client.identifier}) +
+         scopeTags(client.scope) + applicationActions(user, client) + "</li>\n";
+}
+
+}  // namespace
+
+Answer applicationsPage(const std::string& user, const std::string& done, const Draft& draft) {
+  std::string items;
+  for (const Client& client : allClients()) items += applicationItem(user, client);
+  const std::string list = items.empty() ? "<p class=\"empty\">No application is registered.</p>\n"
+                                         : "<ul class=\"cards\">\n" + items + "</ul>\n";
+  const std::string registered =
+      "<section aria-labelledby=\"registered\">\n<h2 id=\"registered\">Registered</h2>\n"
+      "<p class=\"jump\"><a href=\"#new\">Register an application</a></p>\n" +
+      list + "</section>\n";
+  const std::string form = registrationForm(user, draft);
+  return view(kApplications, user,
+              notice(done) + "<div class=\"columns\">\n" +
+                  (draft.fault.empty() ? registered + form : form + registered) + "</div>\n",
+              draft.fault.empty() ? 200 : 400);
+}
+
+Answer secretPage(const std::string& user, const std::string& name, const std::string& identifier,
+                  const std::string& secret) {
+  return view(kApplications, user,
+              fill("<section class=\"card\" aria-labelledby=\"secret\">\n"
+                   "<h2 id=\"secret\">{} is registered</h2>\n"
+                   "<p class=\"notice\" role=\"status\">Copy the secret now: it is shown this once "
+                   "and never again.</p>\n"
+                   "<dl><dt>Identifier</dt><dd><code>{}</code></dd>\n"
+                   "<dt>Secret</dt><dd><code class=\"secret\">{}</code></dd></dl>\n"
+                   "<p><a class=\"button\" href=\"/admin\">Done</a></p>\n</section>\n",
+                   {name, identifier, secret}));
+}
+
+}  // namespace service

@@ -1,0 +1,59 @@
+#include "examples/cgi/admin_pages.h"
+
+#include <algorithm>
+
+#include "examples/cgi/admin_rows.h"
+#include "examples/cgi/admin_view.h"
+#include "examples/cgi/encoding.h"
+#include "examples/cgi/html.h"
+
+namespace service {
+namespace {
+
+/// No log is so long that it had more pages.
+int pageNumber(const std::string& text) {
+  return static_cast<int>(std::clamp(number(text), 1LL, 1000LL));
+}
+
+std::string logTurn(const std::string& filter, int page, const char* word) {
+  return fill("<a class=\"button\" href=\"/admin?view=log&amp;filter={}&amp;page={}\">{}</a>\n",
+              {percentEncode(filter), std::to_string(page), word});
+}
+
+std::string logTurns(const std::string& filter, int page, bool more) {
+  if (page == 1 && !more) return {};
+  return "<nav class=\"actions\" aria-label=\"Pages of the log\">\n" +
+         (page > 1 ? logTurn(filter, page - 1, "Newer") : "") +
+         (more ? logTurn(filter, page + 1, "Older") : "") + "</nav>\n";
+}
+
+}  // namespace
+
+Answer logPage(const std::string& user, const std::string& filter, const std::string& number) {
+  const int page = pageNumber(number);
+  std::vector<LogEntry> entries = logEntries(filter, page);
+  const bool more = entries.size() > kLogRows;
+  if (more) entries.pop_back();
+  std::string rows;
+  for (const LogEntry& entry : entries) {
+    rows += "<tr><td>" + timeText(entry.time) + fill("</td><td>{}</td></tr>\n", {entry.text});
+  }
+  return view(kLog, user,
+              fill("<form method=\"get\" action=\"/admin\" class=\"search\" role=\"search\">\n"
+                   "<input type=\"hidden\" name=\"view\" value=\"log\">\n"
+                   "<label for=\"filter\">Contains</label>\n"
+                   "<input id=\"filter\" name=\"filter\" value=\"{}\" autocomplete=\"off\" "
+                   "aria-describedby=\"filter-hint\">\n"
+                   "<button>Filter</button>\n</form>\n"
+                   "<p class=\"hint\" id=\"filter-hint\">% stands for any text, _ for any "
+                   "character.</p>\n",
+                   {filter}) +
+                  (rows.empty() ? "<p class=\"empty\">No entry.</p>\n"
+                                : "<div class=\"card\"><table>\n<thead><tr><th "
+                                  "scope=\"col\">Time</th><th scope=\"col\">Entry</th></tr></thead>"
+                                  "\n<tbody>\n" +
+                                      rows + "</tbody></table></div>\n") +
+                  logTurns(filter, page, more));
+}
+
+}  // namespace service
