@@ -22,6 +22,15 @@ std::string nameOf(const std::map<std::string, std::string>& names, const std::s
   return found == names.end() ? "An application that was removed" : found->second;
 }
 
+/// Markup in the order in which people look for names.
+using ByName = std::multimap<std::string, std::string>;
+
+std::string joined(const ByName& items) {
+  std::string all;
+  for (const auto& [name, item] : items) all += item;
+  return all;
+}
+
 std::string userItem(const std::string& user, int applications) {
   return fill(
       "<li><a href=\"/admin?view=access&amp;user={}\"><bdi>{}</bdi></a> "
@@ -34,25 +43,26 @@ std::string userItem(const std::string& user, int applications) {
 std::string userItems(const std::vector<Access>& all,
                       const std::map<std::string, std::string>& names) {
   std::map<std::string, int> people;
-  std::string applications;
+  ByName byName;
   for (const Access& access : all) {
     if (access.user != access.clientId) {
       ++people[access.user];
     } else {
-      applications +=
-          fill("<li><a href=\"/admin?view=access&amp;user={}\"><bdi>{}</bdi></a></li>\n",
-               {access.user, nameOf(names, access.clientId)});
+      const std::string name = nameOf(names, access.clientId);
+      byName.emplace(name,
+                     fill("<li><a href=\"/admin?view=access&amp;user={}\"><bdi>{}</bdi></a></li>\n",
+                          {access.user, name}));
     }
   }
   std::string items;
   for (const auto& [name, count] : people) items += userItem(name, count);
   const std::string users = items.empty() ? "<p class=\"empty\">Nobody has given any access.</p>\n"
                                           : "<ul class=\"users\">\n" + items + "</ul>\n";
-  if (applications.empty()) return users;
+  if (byName.empty()) return users;
   return users +
          "<h2 class=\"spaced\">Applications that act for themselves</h2>\n"
          "<ul class=\"users\">\n" +
-         applications + "</ul>\n";
+         joined(byName) + "</ul>\n";
 }
 
 const char* badgeOf(Access::State state) {
@@ -83,10 +93,13 @@ std::string accessItem(const std::string& user, const Access& access, const std:
 std::string accessOfUser(const std::string& user, const std::string& shown,
                          const std::vector<Access>& all,
                          const std::map<std::string, std::string>& names) {
-  std::string items;
+  ByName byName;
   for (const Access& access : all) {
-    if (access.user == shown) items += accessItem(user, access, nameOf(names, access.clientId));
+    if (access.user != shown) continue;
+    const std::string name = nameOf(names, access.clientId);
+    byName.emplace(name, accessItem(user, access, name));
   }
+  const std::string items = joined(byName);
   const std::string heading = fill("<h2 class=\"spaced\">Access for {}</h2>\n",
                                    {names.count(shown) > 0 ? nameOf(names, shown) : shown});
   if (items.empty()) return heading + "<p class=\"empty\">No application has access.</p>\n";
