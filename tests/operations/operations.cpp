@@ -109,6 +109,14 @@ Outcome Operations::dieAt(int nth, Death death, const Arguments& arguments) {
   return runProgram(victim(arguments));
 }
 
+Outcome Operations::meanwhile(int nth, const Arguments& other, const Arguments& arguments) {
+  std::string line = "exec env -u KELDOAUTH_DIE_AT -u KELDCORE_KEY_FILE";
+  for (const std::string& word : cli::commandLine(KELDOAUTH_CLI, other)) line += " '" + word + "'";
+  const Variable at("KELDOAUTH_DIE_AT", std::to_string(nth));
+  const Variable action("KELDOAUTH_MEANWHILE", line);
+  return runProgram(victim(arguments));
+}
+
 Outcome Operations::hurry(const Arguments& arguments) {
   const Variable hurried("KELDOAUTH_HURRY", "1");
   return runProgram(victim(arguments));

@@ -46,6 +46,8 @@ class Operations : public cli::CliTest {
   static Outcome dieAt(int nth, Death death, const Arguments& arguments);
   /// The same without an end; waiting for locks takes no time.
   static Outcome hurry(const Arguments& arguments);
+  /// Runs a command to its end, and `other` before its n-th step.
+  static Outcome meanwhile(int nth, const Arguments& other, const Arguments& arguments);
   /// The steps of a command that runs to its end.
   static std::vector<std::string> stepsOf(const Arguments& arguments);
 

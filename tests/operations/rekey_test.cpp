@@ -179,6 +179,24 @@ TEST_F(Rekey, KnowsItsNewKeyOnTheDiskBeforeItCommits) {
   EXPECT_NE(std::find(made, written, std::string("sync ") + kStateDir), written);
 }
 
+/// The service was not stopped: it encrypts with the old key still.
+TEST_F(Rekey, KeepsBothKeysWhenAValueCameInAfterTheCommit) {
+  const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
+  putBack(kStateDir, before_);
+  const auto commit = std::find(steps.rbegin(), steps.rend(), std::string("unlink ") + kJournal);
+  const Outcome outcome =
+      meanwhile(static_cast<int>(steps.rend() - commit) + 1,
+                {"client", "add", "--redirect-uri", "app:/", "--scope", "x", "--name", "late"},
+                {"rekey", "--yes"});
+  expectRefused(outcome, cli::kUnavailable,
+                "the store has values that the new key does not decrypt\n"
+                "hint: both keys are still there; stop the service and run the command again\n");
+  EXPECT_EQ(readFile(kKey), before_["keldcore.key"]);
+  EXPECT_TRUE(fs::exists(kNextKey));
+  EXPECT_THAT(rekey().out, HasSubstr("Encrypted 2 values"));
+  EXPECT_THAT(clearWith(kKey), Not(Contains("")));
+}
+
 // Refusals --------------------------------------------------------------------------
 
 TEST_F(Rekey, OfAValueThatNeitherKeyDecryptsChangesNothing) {

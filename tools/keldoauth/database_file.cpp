@@ -108,7 +108,7 @@ void DatabaseFile::copyTo(DatabaseFile& target) {
   if (backup == nullptr) throw target.failure();
   const int copied = sqlite3_backup_step(backup, -1);
   const int finished = sqlite3_backup_finish(backup);
-  // A lock that did not go away is no error to the latter.
+  // By its contract the latter passes over a lock that did not go away.
   if (finished != SQLITE_OK) throw target.failure();
   if (copied != SQLITE_DONE) throw target.failure(copied);
 }
