@@ -79,9 +79,24 @@ void replaceStore(DatabaseFile& copy) {
   store.requireStore();
 }
 
-void warnOfOtherKey() {
-  std::cerr << "keldoauth: restore: the platform's key is not the one of this copy\n"
-               "hint: put back the key that belongs to it; until then no client is found\n";
+/// Whether the key is that of the values restored; null when that cannot be
+/// known because the cipher does not work.
+Json::Value keyFits() try {
+  if (isAllReadable()) return true;
+  encrypted("probe");
+  return false;
+} catch (const Failure&) {
+  return {};
+}
+
+void warnOfKey(const Json::Value& fits) {
+  std::cerr << "keldoauth: restore: "
+            << (fits.isNull() ? "the platform's cipher does not work for this user\n"
+                                "hint: the system log says why; 'keldoauth status', run by the "
+                                "service's user, says whether its key fits\n"
+                              : "the platform's key is not the one of this copy\n"
+                                "hint: put back the key that belongs to it; until then no client "
+                                "is found\n");
 }
 
 Answer restore(const Arguments& arguments) {
@@ -100,11 +115,12 @@ Answer restore(const Arguments& arguments) {
   replaceStore(copy);
 
   Answer answer{describe(path)};
-  const bool isReadable = isAllReadable();
-  answer.document["key_fits"] = isReadable;
-  if (isReadable) return answer;
-  warnOfOtherKey();
-  answer.exit = kUnhealthy;
+  const Json::Value fits = keyFits();
+  answer.document["key_fits"] = fits;
+  if (fits != Json::Value(true)) {
+    warnOfKey(fits);
+    answer.exit = kUnhealthy;
+  }
   return answer;
 }
 
