@@ -16,8 +16,6 @@ namespace {
 
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxName = 64;
-
 /// Back to a page that can be reloaded without doing it again.
 Answer done(const Request& request, const std::string& word) {
   return redirectAnswer(request, "/admin?done=" + word);
@@ -34,9 +32,8 @@ std::string chosenScope(const Parameters& form) {
 }
 
 std::string faultOf(const Draft& draft) {
-  if (draft.name.empty()) return "The application needs a name.";
-  if (draft.name.size() > kMaxName) return "The name is too long: 64 bytes at most.";
-  if (!isUtf8(draft.name)) return "The name cannot be read.";
+  const std::string fault = faultOfName(draft.name);
+  if (!fault.empty()) return fault;
   if (draft.redirect.size() > kMaxRedirect) return "The redirect address is too long.";
   if (!isRedirectAddress(draft.redirect)) {
     return "The redirect address must start with https://, or with http:// for 127.0.0.1 and "

@@ -1,5 +1,7 @@
 #include "examples/cgi/clients.h"
 
+#include <algorithm>
+
 #include "examples/cgi/answer.h"
 #include "examples/cgi/encoding.h"
 #include "stores/oauth_clientInfo.h"
@@ -11,6 +13,7 @@ namespace {
 using namespace KELDOAUTHSERVER;
 
 constexpr std::size_t kIdentifierBytes = 64;
+constexpr std::size_t kMaxName = 64;
 
 struct Credentials {
   std::string identifier;
@@ -65,6 +68,16 @@ std::string undoubled(const Json::Value& text) {
     single.erase(at++, 1);
   }
   return single;
+}
+
+std::string faultOfName(const std::string& name) {
+  const auto isControl = [](unsigned char byte) { return byte < ' ' || byte == 0x7f; };
+  if (name.size() > kMaxName) return "The name is too long: 64 bytes at most.";
+  if (name.find_first_not_of(' ') == std::string::npos) return "The application needs a name.";
+  if (!isUtf8(name) || std::any_of(name.begin(), name.end(), isControl)) {
+    return "The name has characters that cannot be shown.";
+  }
+  return {};
 }
 
 Client clientOf(const Json::Value& row) {

@@ -25,6 +25,10 @@ struct Client {
 /// Text of a row as it was given: the stores keep single quotes doubled.
 std::string undoubled(const Json::Value& text);
 
+/// Why an application cannot have this name, which people will decide by; empty
+/// when it can.
+std::string faultOfName(const std::string& name);
+
 Client clientOf(const Json::Value& row);
 
 /// Throws Unavailable when the store cannot say.

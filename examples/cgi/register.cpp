@@ -9,6 +9,7 @@
 
 #include "core/oauth_errors.h"
 #include "examples/cgi/answer.h"
+#include "examples/cgi/clients.h"
 #include "examples/cgi/code_state.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/redirect.h"
@@ -22,7 +23,6 @@ namespace {
 using namespace service;
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxName = 64;
 constexpr std::size_t kMaxRedirects = 2048;
 constexpr char kDefaultScope[] = "profile";
 constexpr char kDefaultMethod[] = "client_secret_basic";
@@ -121,9 +121,9 @@ std::string readScope(const Json::Value& metadata) {
 
 std::string readName(const Json::Value& metadata) {
   std::string name = text(metadata, "client_name", "Unnamed application");
-  if (name.empty() || name.size() > kMaxName) refuse("client_name must be 1 to 64 bytes long");
-  // The reader of JSON lets any bytes through, its writer, too.
-  if (!isUtf8(name)) refuse("client_name must be UTF-8");
+  // JSON's reader lets any bytes through, and its writer lets them out again.
+  const std::string fault = faultOfName(name);
+  if (!fault.empty()) refuse("client_name: " + fault);
   return name;
 }
 

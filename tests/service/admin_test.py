@@ -59,6 +59,12 @@ class Applications(unittest.TestCase):
             self.assertIn('role="alert"', answer.text)
             self.assertIn('value="My &lt;app&gt;"', answer.text)
 
+    def test_name_that_nobody_could_see_is_refused(self):
+        for name in ("  ", "a\nb", "x" * 65):
+            answer = submit("register", name=name, redirect=service.CALLBACK,
+                            **{"scope.profile": "1"})
+            self.assertEqual(answer.status, 400, name)
+
     def test_disabled_one_gets_nothing_until_enabled(self):
         client = register()
         pair = client.tokens()

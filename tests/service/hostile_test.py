@@ -311,8 +311,8 @@ class RegistrationRequest(unittest.TestCase):
                        {"response_types": ["token"]}, {"token_endpoint_auth_method": "none"}):
             self.assertError({"redirect_uris": [CALLBACK], **change}, "invalid_client_metadata")
 
-    def test_name_that_is_no_text_is_refused(self):
-        for name in (b"a\xff", b"\xc3", b"\xed\xa0\x80", b"\xc0\xaf"):
+    def test_name_that_cannot_be_shown_is_refused(self):
+        for name in (b"  ", b"a\\nb", b"\\u007f", b"a\xff", b"\xc3", b"\xed\xa0\x80", b"\xc0\xaf"):
             self.assertError(b'{"redirect_uris":["https://a.example/"],"client_name":"' + name +
                              b'"}', "invalid_client_metadata")
 
