@@ -45,7 +45,7 @@ std::string_view hostOf(std::string_view authority) {
 
 bool isHost(std::string_view host) {
   constexpr std::string_view kName =
-      "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789-.";
+      "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789-._";
   constexpr std::string_view kLiteral = "[]:.0123456789abcdefABCDEF";
   if (host.empty()) return false;
   const std::string_view allowed = host.front() == '[' ? kLiteral : kName;

@@ -108,13 +108,15 @@ std::string readRedirects(const Json::Value& metadata) {
     if (address.asString().size() > kMaxRedirect) refuseRedirect("An address is too long");
     stored += (stored.empty() ? "" : " ") + withoutScheme(address.asString());
   }
-  if (stored.empty() && usesRedirects(metadata)) refuseRedirect("redirect_uris is missing");
+  if (!usesRedirects(metadata)) return kNoRedirect;
+  if (stored.empty()) refuseRedirect("redirect_uris is missing");
   if (stored.size() > kMaxRedirects) refuseRedirect("redirect_uris is too long");
-  return stored.empty() ? kNoRedirect : stored;
+  return stored;
 }
 
 std::string readScope(const Json::Value& metadata) {
-  std::string scope = knownScopes(text(metadata, "scope", kDefaultScope));
+  const std::string asked = text(metadata, "scope", "");
+  std::string scope = knownScopes(asked.empty() ? kDefaultScope : asked);
   if (scope.empty()) refuse("scope names nothing that this server knows");
   return scope;
 }
@@ -168,7 +170,7 @@ Answer handle(const Request& request) {
     answer["grant_types"].append("authorization_code");
     answer["grant_types"].append("refresh_token");
   }
-  // The registry has no column for it, so what is open to one is open to all.
+  // The registry has no column for it, so this one is open to all.
   answer["grant_types"].append("client_credentials");
   return jsonAnswer(201, answer);
 }

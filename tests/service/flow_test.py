@@ -60,6 +60,23 @@ class Registration(unittest.TestCase):
         client.redirect = "https://(none)"
         self.assertEqual(client.ask("x" * 43).status, 400)
 
+    def test_client_that_asks_for_its_own_flow_has_no_other(self):
+        answer = service.register_raw({"redirect_uris": [CALLBACK],
+                                       "grant_types": ["client_credentials"]})
+        self.assertEqual(answer.json["grant_types"], ["client_credentials"])
+        self.assertNotIn("redirect_uris", answer.json)
+        client = Client(answer.json["client_id"], answer.json["client_secret"])
+        self.assertEqual(client.ask("x" * 43).status, 400)
+        self.assertEqual(client.post("token", grant_type="client_credentials").status, 200)
+
+    def test_empty_scope_is_the_default_one(self):
+        answer = service.register_raw({"redirect_uris": [CALLBACK], "scope": ""})
+        self.assertEqual((answer.status, answer.json.get("scope")), (201, "profile"))
+
+    def test_host_may_have_an_underscore(self):
+        client = register(redirect_uris=["https://my_app.lan:8443/cb"])
+        self.assertEqual(client.redeem(*client.log_in()).status, 200)
+
 
 class CodeFlow(unittest.TestCase):
     @classmethod
