@@ -56,8 +56,8 @@ std::string userItems(const std::vector<Access>& all,
   }
   std::string items;
   for (const auto& [name, count] : people) items += userItem(name, count);
-  const std::string users = items.empty() ? "<p class=\"empty\">Nobody has given any access.</p>\n"
-                                          : "<ul class=\"users\">\n" + items + "</ul>\n";
+  std::string users = items.empty() ? "<p class=\"empty\">Nobody has given any access.</p>\n"
+                                    : "<ul class=\"users\">\n" + items + "</ul>\n";
   if (byName.empty()) return users;
   return users +
          "<h2 class=\"spaced\">Applications that act for themselves</h2>\n"

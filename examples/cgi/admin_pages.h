@@ -23,8 +23,8 @@ Answer applicationsPage(const std::string& user, const std::string& done, const 
 /// `shown` is whose access is shown; empty for the list of users.
 Answer accessPage(const std::string& user, const std::string& done, const std::string& shown);
 
-/// `page` counts from 1, the newest; any text will do.
-Answer logPage(const std::string& user, const std::string& filter, const std::string& page);
+/// The page with this `number`: 1 is the newest; any text will do.
+Answer logPage(const std::string& user, const std::string& filter, const std::string& number);
 Answer storagePage(const std::string& user);
 
 /// The only time that a secret is shown.

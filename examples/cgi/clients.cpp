@@ -22,7 +22,7 @@ struct Credentials {
 
 [[noreturn]] void refuseClient(const std::string& why) {
   throw Refusal{oauthError(401, "invalid_client", why)
-                    .with("WWW-Authenticate", "Basic realm=\"oauth\", charset=\"UTF-8\"")};
+                    .with("WWW-Authenticate", R"(Basic realm="oauth", charset="UTF-8")")};
 }
 
 [[noreturn]] void refuseRequest(const std::string& why) {
@@ -53,7 +53,7 @@ Credentials readCredentials(const Request& request, const Parameters& form) {
   if (request.authorization.empty()) return {identifier, secret};
 
   if (!secret.empty()) refuseRequest("More than one way of client authentication");
-  const Credentials credentials = readBasic(request.authorization);
+  Credentials credentials = readBasic(request.authorization);
   if (!identifier.empty() && identifier != credentials.identifier) {
     refuseRequest("client_id is not the one in the Authorization header");
   }
