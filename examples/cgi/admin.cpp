@@ -38,8 +38,9 @@ Answer handle(const Request& request) {
   if (given->isDoubled("form_token") ||
       !isFormToken(given->value("form_token"), request.user, kAdminSubject)) {
     return messagePage(403, "This form is too old",
-                       "Or it does not come from this box. Nothing was changed; open the page "
-                       "again and repeat what you did.");
+                       "Or it does not come from this box. Nothing was changed; go back and "
+                       "repeat what you did.",
+                       "/admin");
   }
   return act(request, *given);
 }

@@ -90,14 +90,13 @@ Answer pageLeadingAway(const std::string& title, const std::string& main) {
   return pageUnder(kPolicy, 200, title, main);
 }
 
-Answer messagePage(int status, const std::string& title, const std::string& text) {
+Answer messagePage(int status, const std::string& title, const std::string& text,
+                   const std::string& back) {
+  const std::string link =
+      back.empty() ? "" : fill("<p><a class=\"button\" href=\"{}\">Back</a></p>\n", {back});
   return page(status, title,
-              fill(R"(<main class="card message">
-<h1>{}</h1>
-<p>{}</p>
-</main>
-)",
-                   {title, text}));
+              fill("<main class=\"card message\">\n<h1>{}</h1>\n<p>{}</p>\n", {title, text}) +
+                  link + "</main>\n");
 }
 
 Answer unavailablePage() {

@@ -28,8 +28,9 @@ Answer page(int status, const std::string& title, const std::string& main);
 /// where the application sends the user next is its own affair.
 Answer pageLeadingAway(const std::string& title, const std::string& main);
 
-/// A page that says one thing.
-Answer messagePage(int status, const std::string& title, const std::string& text);
+/// A page that says one thing, with a link to `back` if there is a way back.
+Answer messagePage(int status, const std::string& title, const std::string& text,
+                   const std::string& back = "");
 
 /// For `serve`.
 Answer unavailablePage();

@@ -207,7 +207,9 @@ class Forgery(unittest.TestCase):
         consent = Form(client.ask("x" * 43, "admin").text).fields["form_token"]
         late = "1" + genuine[10:] if genuine[10] == "." else "1." + genuine.split(".")[1]
         for token in ("", "x", genuine[:-1], "9" + genuine, consent, late):
-            self.assertEqual(submit("disable", token, client=client.id).status, 403, token)
+            answer = submit("disable", token, client=client.id)
+            self.assertEqual(answer.status, 403, token)
+            self.assertIn('href="/admin">Back</a>', answer.text)
         self.assertEqual(client.ask("x" * 43).status, 200)
 
     def test_query_does_not_change_anything(self):
