@@ -179,13 +179,21 @@ class Crowds : public Operations {
     for (const auto& failures : progress_->failures) EXPECT_EQ(failures, 0);
   }
 
-  /// Starts a command and kills it after up to so many milliseconds.
-  void killSoon(const Arguments& arguments, int milliseconds) {
+  /// Runs a command to its end, and learns how long it takes in this crowd.
+  void timeIt(const Arguments& arguments) {
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_THAT(run(arguments), ExitsWith(cli::kOk));
+    takes_ = std::chrono::duration_cast<std::chrono::microseconds>(
+        std::chrono::steady_clock::now() - start);
+  }
+
+  /// Starts a command and kills it at some moment of the time that it takes.
+  void killSoon(const Arguments& arguments) {
     const int command = load::startProcess([&] {
       setpgid(0, 0);
       run(arguments);
     });
-    std::uniform_int_distribution<int> moment(0, milliseconds * 1000);
+    std::uniform_int_distribution<long long> moment(0, takes_.count());
     std::this_thread::sleep_for(std::chrono::microseconds(moment(random_)));
     kill(-command, SIGKILL);
     kill(command, SIGKILL);
@@ -194,13 +202,14 @@ class Crowds : public Operations {
     if (WIFSIGNALED(status)) ++kills_;
   }
 
+  std::chrono::microseconds takes_{};
   int kills_ = 0;
   std::mt19937 random_{support::isLongForm() ? std::random_device()() : 1U};
   load::Shared<Progress> progress_;
 };
 
 TEST_F(Crowds, BackupHasAllThatWasAcknowledgedBeforeItBegan) {
-  const int rounds = size(12, 300);
+  const int rounds = size(8, 300);
   whileTheyWrite([&] {
     for (int round = 0; round < rounds && !HasFailure(); ++round) {
       const Serials least = copyOf(progress_->done);
@@ -219,9 +228,11 @@ TEST_F(Crowds, BackupHasAllThatWasAcknowledgedBeforeItBegan) {
 TEST_F(Crowds, KilledBackupsDisturbNobodyAndLeaveNoHalfCopy) {
   const int rounds = size(30, 1000);
   whileTheyWrite([&] {
+    timeIt({"backup", kCopy});
+    putBack(kCopies, {});
     for (int round = 0; round < rounds && !HasFailure(); ++round) {
       const Serials least = copyOf(progress_->done);
-      killSoon({"backup", kCopy}, 40);
+      killSoon({"backup", kCopy});
       expectPrivate(kCopies);
       if (fs::exists(kCopy)) {
         expectPrefixes(contentOf(kCopy), least, copyOf(progress_->begun));
@@ -239,8 +250,9 @@ TEST_F(Crowds, KilledRestoresLeaveASoundStore) {
   const int rounds = size(30, 1000);
   backUp();
   whileTheyWrite([&] {
+    timeIt({"restore", "--yes", kCopy});
     for (int round = 0; round < rounds && !HasFailure(); ++round) {
-      killSoon({"restore", "--yes", kCopy}, 40);
+      killSoon({"restore", "--yes", kCopy});
       expectNextProgramReady();
       contentOf();
       expectPrivate(kStateDir);
@@ -252,7 +264,7 @@ TEST_F(Crowds, KilledRestoresLeaveASoundStore) {
 }
 
 TEST_F(Crowds, RestoreTakesWhatWasThereAndNothingThatComes) {
-  const int rounds = size(6, 100);
+  const int rounds = size(4, 100);
   backUp();
   Serials gone{};
   Serials kept{};

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <ctime>
 #include <filesystem>
 
 #include "stores/oauth_clientInfo.h"
@@ -47,12 +48,19 @@ int collectRow(void* rows, int count, char** values, char** columns) {
   return 0;
 }
 
+/// In short even steps, to get a turn between busy writers.
+int waitForLock(void* /*unused*/, int waits) {
+  constexpr int kMost = 30000;
+  constexpr timespec kStep{0, 1000000};
+  nanosleep(&kStep, nullptr);
+  return waits < kMost ? 1 : 0;
+}
+
 class Connection {
  public:
   explicit Connection(const std::string& path) {
-    constexpr int kPatienceMilliseconds = 30000;
     EXPECT_EQ(sqlite3_open_v2(path.c_str(), &db_, SQLITE_OPEN_READWRITE, nullptr), SQLITE_OK);
-    sqlite3_busy_timeout(db_, kPatienceMilliseconds);
+    sqlite3_busy_handler(db_, waitForLock, nullptr);
   }
   ~Connection() { sqlite3_close(db_); }
   Connection(const Connection&) = delete;
@@ -109,6 +117,12 @@ Outcome Operations::dieAt(int nth, Death death, const Arguments& arguments) {
   return runProgram(victim(arguments));
 }
 
+std::vector<Operations::Death> Operations::deathsAt(int step) {
+  const bool isEmulated = *KELDOAUTH_EMULATOR != '\0';
+  if (!isEmulated) return {Death::kBeforeTheStep, Death::kWithinTheStep};
+  return {step % 2 == 0 ? Death::kBeforeTheStep : Death::kWithinTheStep};
+}
+
 Outcome Operations::meanwhile(int nth, const Arguments& other, const Arguments& arguments) {
   std::string line = "exec env -u KELDOAUTH_DIE_AT -u KELDCORE_KEY_FILE";
   for (const std::string& word : cli::commandLine(KELDOAUTH_CLI, other)) line += " '" + word + "'";
@@ -132,6 +146,7 @@ std::vector<std::string> Operations::stepsOf(const Arguments& arguments) {
 
 Content Operations::contentOf(const std::string& path) {
   const Connection connection(path);
+  connection.rows("BEGIN");  // all as of one moment
   const std::vector<support::Row> verdict = connection.rows("PRAGMA integrity_check");
   EXPECT_EQ(verdict, (std::vector<support::Row>{{{"integrity_check", "ok"}}}));
   Content content;
@@ -143,6 +158,11 @@ Content Operations::contentOf(const std::string& path) {
 
 void Operations::execute(const std::string& path, const std::string& sql) {
   Connection(path).rows(sql);
+}
+
+std::string Operations::valueIn(const std::string& path, const std::string& sql) {
+  const std::vector<support::Row> rows = Connection(path).rows(sql);
+  return rows.empty() ? "" : rows.front().begin()->second;
 }
 
 Content Operations::crashWhileWriting() {

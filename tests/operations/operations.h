@@ -53,12 +53,14 @@ class Operations : public cli::CliTest {
 
   /// Runs a command once for each of its steps and lets it die there; calls
   /// `prepare` before and `check` after each. Returns the number of steps.
+  /// Where programs are emulated, and slow to start, it dies once per step.
   template <typename Prepare, typename Check>
   static int dieAtEachStep(const Arguments& arguments, Prepare prepare, Check check);
 
   /// Rolls back what a crash left. Expects that the file is sound.
   static Content contentOf(const std::string& path = kDatabase);
   static void execute(const std::string& path, const std::string& sql);
+  static std::string valueIn(const std::string& path, const std::string& sql);
 
   /// A program of the service dies while it writes a row: leaves a database that
   /// nobody may read without its journal. Returns what is to survive.
@@ -74,13 +76,15 @@ class Operations : public cli::CliTest {
   static void expectNextProgramReady();
 
  private:
+  static std::vector<Death> deathsAt(int step);
+
   mode_t umask_ = 0;
 };
 
 template <typename Prepare, typename Check>
 int Operations::dieAtEachStep(const Arguments& arguments, Prepare prepare, Check check) {
   for (int nth = 1; !HasFailure(); ++nth) {
-    for (const Death death : {Death::kBeforeTheStep, Death::kWithinTheStep}) {
+    for (const Death death : deathsAt(nth)) {
       SCOPED_TRACE("step " + std::to_string(nth) +
                    (death == Death::kWithinTheStep ? ", torn" : ""));
       prepare();
