@@ -69,23 +69,21 @@ const char* faultOfCopy(int extendedCode) {
 
 }  // namespace
 
-DatabaseFile::DatabaseFile(const std::string& path, Use use) : path_(path), use_(use) {
-  const int flags = use == Use::kRead ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE;
-  if (sqlite3_open_v2(path.c_str(), &db_, flags, nullptr) == SQLITE_OK) {
-    sqlite3_busy_handler(db_, waitForLock, nullptr);
-    return;
-  }
-  const Failure refusal = failure();
-  sqlite3_close(db_);
-  throw refusal;
+void DatabaseFile::CloseConnection::operator()(sqlite3* db) const {
+  sqlite3_close(db);
 }
 
-DatabaseFile::~DatabaseFile() {
-  sqlite3_close(db_);
+DatabaseFile::DatabaseFile(const std::string& path, Use use) : path_(path), use_(use) {
+  const int flags = use == Use::kRead ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE;
+  sqlite3* raw = nullptr;
+  const int result = sqlite3_open_v2(path.c_str(), &raw, flags, nullptr);
+  db_.reset(raw);  // a failed open may hand out a handle, too
+  if (result != SQLITE_OK) throw failure();
+  sqlite3_busy_handler(raw, waitForLock, nullptr);
 }
 
 void DatabaseFile::holdStill() {
-  if (sqlite3_exec(db_, "BEGIN", nullptr, nullptr, nullptr) != SQLITE_OK) throw failure();
+  if (sqlite3_exec(db_.get(), "BEGIN", nullptr, nullptr, nullptr) != SQLITE_OK) throw failure();
 }
 
 void DatabaseFile::requireStore() {
@@ -95,16 +93,16 @@ void DatabaseFile::requireStore() {
   for (const Table& table : kTables) {
     const std::string sql = std::string("SELECT ") + table.columns + " FROM " + table.name;
     sqlite3_stmt* raw = nullptr;
-    const int result = sqlite3_prepare_v2(db_, sql.c_str(), -1, &raw, nullptr);
+    const int result = sqlite3_prepare_v2(db_.get(), sql.c_str(), -1, &raw, nullptr);
     sqlite3_finalize(raw);
     if (result == SQLITE_OK) continue;
     if (result != SQLITE_ERROR) throw failure();
-    throw Failure(kRefused, printable(path_) + " is no store: " + sqlite3_errmsg(db_));
+    throw Failure(kRefused, printable(path_) + " is no store: " + sqlite3_errmsg(db_.get()));
   }
 }
 
 void DatabaseFile::copyTo(DatabaseFile& target) {
-  sqlite3_backup* const backup = sqlite3_backup_init(target.db_, "main", db_, "main");
+  sqlite3_backup* const backup = sqlite3_backup_init(target.db_.get(), "main", db_.get(), "main");
   if (backup == nullptr) throw target.failure();
   const int copied = sqlite3_backup_step(backup, -1);
   const int finished = sqlite3_backup_finish(backup);
@@ -120,7 +118,7 @@ void DatabaseFile::leaveWal() {
 /// The first column of the first row.
 std::string DatabaseFile::text(const std::string& sql) {
   sqlite3_stmt* raw = nullptr;
-  if (sqlite3_prepare_v2(db_, sql.c_str(), -1, &raw, nullptr) != SQLITE_OK) throw failure();
+  if (sqlite3_prepare_v2(db_.get(), sql.c_str(), -1, &raw, nullptr) != SQLITE_OK) throw failure();
   const Statement statement(raw);
   if (sqlite3_step(raw) != SQLITE_ROW) throw failure();
   const unsigned char* const column = sqlite3_column_text(raw, 0);
@@ -129,14 +127,14 @@ std::string DatabaseFile::text(const std::string& sql) {
 
 Failure DatabaseFile::failure() const {
   const char* const fault =
-      use_ == Use::kRead ? faultOfCopy(sqlite3_extended_errcode(db_)) : nullptr;
-  if (fault == nullptr) return failure(sqlite3_errcode(db_));
+      use_ == Use::kRead ? faultOfCopy(sqlite3_extended_errcode(db_.get())) : nullptr;
+  if (fault == nullptr) return failure(sqlite3_errcode(db_.get()));
   return {kRefused, printable(path_) + fault, "'keldoauth backup' makes copies that are whole"};
 }
 
 Failure DatabaseFile::failure(int code) const {
   const char* const reason =
-      code == sqlite3_errcode(db_) ? sqlite3_errmsg(db_) : sqlite3_errstr(code);
+      code == sqlite3_errcode(db_.get()) ? sqlite3_errmsg(db_.get()) : sqlite3_errstr(code);
   return libraryFailure(code, printable(path_) + ": " + reason);
 }
 

@@ -4,6 +4,7 @@
 #ifndef KELDOAUTH_TOOLS_DATABASE_FILE_H
 #define KELDOAUTH_TOOLS_DATABASE_FILE_H
 
+#include <memory>
 #include <string>
 
 #include "tools/keldoauth/failure.h"
@@ -21,7 +22,6 @@ class DatabaseFile {
   /// Opens an existing file; statements wait up to 30 seconds for locks.
   /// Throws Failure.
   DatabaseFile(const std::string& path, Use use);
-  ~DatabaseFile();
   DatabaseFile(const DatabaseFile&) = delete;
   DatabaseFile& operator=(const DatabaseFile&) = delete;
 
@@ -40,13 +40,17 @@ class DatabaseFile {
   void leaveWal();
 
  private:
+  struct CloseConnection {
+    void operator()(sqlite3* db) const;
+  };
+
   std::string text(const std::string& sql);
   [[nodiscard]] Failure failure() const;
   [[nodiscard]] Failure failure(int code) const;
 
   std::string path_;
   Use use_;
-  sqlite3* db_ = nullptr;
+  std::unique_ptr<sqlite3, CloseConnection> db_;
 };
 
 }  // namespace tool
