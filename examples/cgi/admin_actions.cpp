@@ -32,7 +32,7 @@ std::string chosenScope(const Parameters& form) {
 }
 
 std::string faultOf(const Draft& draft) {
-  const std::string fault = faultOfName(draft.name);
+  std::string fault = faultOfName(draft.name);
   if (!fault.empty()) return fault;
   if (draft.redirect.size() > kMaxRedirect) return "The redirect address is too long.";
   if (!isRedirectAddress(draft.redirect)) {

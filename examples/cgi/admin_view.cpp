@@ -64,7 +64,7 @@ std::string scopeTags(const std::string& scope) {
   for (const std::string& name : scopeNames(scope)) {
     tags += fill("<li>{}</li>", {name});
   }
-  return "<ul class=\"tags\" aria-label=\"Scopes\">" + tags + "</ul>\n";
+  return R"(<ul class="tags" aria-label="Scopes">)" + tags + "</ul>\n";
 }
 
 std::string formStart(const std::string& user, const char* action) {
