@@ -80,7 +80,7 @@ std::string accessItem(const std::string& user, const Access& access, const std:
   const bool expired = access.expires < std::time(nullptr);
   return fill("<li class=\"card\">\n<h3>{}</h3>\n", {name}) + badgeOf(access.state) +
          fill("<dl><dt>{}</dt><dd>", {expired ? "Expired" : "Expires"}) + timeText(access.expires) +
-         fill("</dd>\n<dt>Sign-ins</dt><dd>{}</dd></dl>\n", {std::to_string(access.signIns)}) +
+         fill("</dd>\n<dt>Grants</dt><dd>{}</dd></dl>\n", {std::to_string(access.grants)}) +
          scopeTags(access.scope) + "<div class=\"actions\">\n" + formStart(user, "revoke") +
          fill(
              "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"

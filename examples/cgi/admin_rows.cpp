@@ -37,7 +37,7 @@ void addTo(Found& found, const Json::Value& row, Access::State state) {
   access.state = std::max(access.state, state);
   access.scope = tidyScope(access.scope + " " + undoubled(row[names::kScope]));
   access.expires = std::max(access.expires, number(row[names::kExpiredTime].asString()));
-  ++access.signIns;
+  ++access.grants;
 }
 
 long long rowCount(const char* table) {

@@ -13,7 +13,7 @@ namespace service {
 
 std::vector<Client> allClients();
 
-/// What an application may do for a user, by all of their sign-ins together:
+/// What an application may do for a user, by all of their grants together:
 /// codes that can be redeemed, pairs of tokens that work or can be renewed.
 struct Access {
   enum class State { kAllowed, kRenewable, kInUse };  // the best of them counts
@@ -22,7 +22,7 @@ struct Access {
   State state = State::kAllowed;
   std::string scope;
   long long expires = 0;  // the last to expire
-  int signIns = 0;
+  int grants = 0;
 };
 
 /// By user and application.

@@ -103,13 +103,13 @@ class Applications(unittest.TestCase):
 
 
 class Access(unittest.TestCase):
-    def test_revoking_ends_every_sign_in_of_the_application(self):
+    def test_revoking_ends_every_grant_to_the_application(self):
         client = register(client_name="Revoked", scope="profile files.read")
         pairs = [client.tokens("bob"), client.tokens("bob", scope="profile files.read")]
         code, verifier = client.log_in("bob")
         page = show("?view=access&user=bob").text
         self.assertEqual(page.count("<h3>Revoked</h3>"), 1)
-        self.assertIn("<dt>Sign-ins</dt><dd>3</dd>", page)
+        self.assertIn("<dt>Grants</dt><dd>3</dd>", page)
         self.assertIn("<li>files.read</li>", page)
         fields = Form(page[page.index('method="post"') - 6:]).fields
         answer = submit("revoke", **{k: fields[k] for k in ("client", "user")})
