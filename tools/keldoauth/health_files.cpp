@@ -84,8 +84,9 @@ void checkFolder(const Inspected& folder, Problems& problems) {
     return;
   }
   if (faccessat(AT_FDCWD, folder.path.c_str(), W_OK | X_OK, AT_EACCESS) != 0) {
+    const int error = errno;  // looking the name up has its own
     problems.add("folder",
-                 "cannot be written by user " + userName(geteuid()) + ": " + std::strerror(errno),
+                 "cannot be written by user " + userName(geteuid()) + ": " + std::strerror(error),
                  "the database writes its journal there; without it nothing can be changed");
   }
   if (folder.allowsOthers(S_IWGRP | S_IWOTH)) {
