@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <fstream>
 
 #include "tests/tools/cli.h"
 
@@ -266,6 +267,13 @@ TEST_F(Status, ACipherThatFails) {
   addClient();
   ::chmod("/var/packages/Corvane/target/etc/keldcore.key", 0644);
   EXPECT_THAT(problems(), Contains("cipher: cannot encrypt (-4)"));
+}
+
+TEST_F(Status, AnInterruptedChangeOfTheKey) {
+  const std::string waiting = "/var/packages/Corvane/target/etc/keldcore.key.next";
+  std::ofstream(waiting) << "key";
+  EXPECT_THAT(problems(),
+              ElementsAre("key: a change of it was interrupted: " + waiting + " waits"));
 }
 
 TEST_F(Status, AMissingFolder) {

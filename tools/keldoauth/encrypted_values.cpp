@@ -1,6 +1,7 @@
 #include "tools/keldoauth/encrypted_values.h"
 
 #include <algorithm>
+#include <cstdlib>
 
 #include "tools/keldoauth/failure.h"
 #include "tools/keldoauth/stores.h"
@@ -9,6 +10,8 @@ using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
+
+constexpr char kKeyVariable[] = "KELDCORE_KEY_FILE";
 
 /// The library's own conversion, one value at a time.
 bool convert(int (*conversion)(Json::Value&), std::string& text) {
@@ -51,6 +54,16 @@ bool decrypt(EncryptedValue& value) {
 std::string encrypted(std::string text) {
   if (convert(OAUTHDBBasic::ParamEncrypt, text)) return text;
   throw Failure(kUnavailable, "the cipher refuses to encrypt", "the system log says why");
+}
+
+KeyFiles keyFiles() {
+  const char* chosen = secure_getenv(kKeyVariable);
+  const std::string current = chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE;
+  return {current, current + ".next"};
+}
+
+void useKey(const std::string& file) {
+  setenv(kKeyVariable, file.c_str(), 1);
 }
 
 bool isAllReadable() {

@@ -33,6 +33,17 @@ bool decrypt(EncryptedValue& value);
 /// Throws Failure.
 std::string encrypted(std::string text);
 
+/// Where the stand-in cipher has its key, and where a new one waits while
+/// `keldoauth rekey` is at work, or after that was interrupted.
+struct KeyFiles {
+  std::string current;
+  std::string next;
+};
+KeyFiles keyFiles();
+
+/// From now on the stand-in cipher of this process takes that key.
+void useKey(const std::string& file);
+
 /// Whether the cipher's key is that of every value in the database. Throws
 /// Failure.
 bool isAllReadable();

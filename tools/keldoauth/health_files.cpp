@@ -13,6 +13,7 @@
 #include <string>
 #include <utility>
 
+#include "tools/keldoauth/encrypted_values.h"
 #include "tools/keldoauth/health.h"
 #include "utils/oauth_names.h"
 
@@ -109,6 +110,14 @@ void checkSettings(const Inspected& settings, Problems& problems) {
   }
 }
 
+/// Parts of the store may be encrypted with either key.
+void checkWaitingKey(const Inspected& key, Problems& problems) {
+  if (key.exists()) {
+    problems.add("key", "a change of it was interrupted: " + key.path + " waits",
+                 "keep both keys and run 'keldoauth rekey' again");
+  }
+}
+
 }  // namespace
 
 Json::Value inspectFiles(Problems& problems) {
@@ -118,6 +127,7 @@ Json::Value inspectFiles(Problems& problems) {
   checkFolder(folder, problems);
   checkDatabase(database, problems);
   checkSettings(settings, problems);
+  checkWaitingKey(Inspected(keyFiles().next), problems);
 
   Json::Value files;
   files["folder"] = folder.document();

@@ -11,7 +11,6 @@
 #include <unistd.h>
 
 #include <cstdio>
-#include <cstdlib>
 #include <filesystem>
 #include <ostream>
 #include <utility>
@@ -32,26 +31,9 @@ using namespace KELDOAUTHSERVER;
 namespace tool {
 namespace {
 
-constexpr char kKeyVariable[] = "KELDCORE_KEY_FILE";
-
-struct Keys {
-  std::string current;
-  std::string next;
-};
-
-Keys keyFiles() {
-  const char* chosen = secure_getenv(kKeyVariable);
-  const std::string current = chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE;
-  return {current, current + ".next"};
-}
-
-void use(const std::string& keyFile) {
-  setenv(kKeyVariable, keyFile.c_str(), 1);
-}
-
 // Keys ------------------------------------------------------------------------------
 
-void requireKeyFile(const Keys& keys) {
+void requireKeyFile(const KeyFiles& keys) {
   if (std::filesystem::exists(keys.current)) return;
   throw Failure(kRefused, "no key file " + printable(keys.current),
                 "only the stand-in cipher has one; it is made when it is first needed");
@@ -64,11 +46,11 @@ class NextKey {
  public:
   /// A platform library that keeps its key elsewhere gives the same ciphertext
   /// whatever the variable says.
-  explicit NextKey(const Keys& keys)
+  explicit NextKey(const KeyFiles& keys)
       : file_(keys.next), isMineToRemove_(!std::filesystem::exists(file_)) {
-    use(keys.current);
+    useKey(keys.current);
     const std::string before = encrypted("probe");
-    use(keys.next);
+    useKey(keys.next);
     if (encrypted("probe") == before) {
       throw Failure(kRefused, "the platform's cipher does not take its key from a file");
     }
@@ -92,7 +74,7 @@ class NextKey {
 
 /// The old key goes here. A commit survives a power cut only when the folder
 /// knows that its journal is gone.
-void replaceKey(const Keys& keys) {
+void replaceKey(const KeyFiles& keys) {
   syncFolderOf(names::kDatabaseFile);
   if (std::rename(keys.next.c_str(), keys.current.c_str()) != 0) throw systemFailure(keys.current);
   syncFolderOf(keys.current);
@@ -102,14 +84,14 @@ void replaceKey(const Keys& keys) {
 
 /// Those that the current key decrypts, with their clear text. Throws for a
 /// value that neither key does.
-std::vector<EncryptedValue> valuesToConvert(OAUTHDBBasic& store, const Keys& keys) {
+std::vector<EncryptedValue> valuesToConvert(OAUTHDBBasic& store, const KeyFiles& keys) {
   std::vector<EncryptedValue> todo;
   std::vector<EncryptedValue> others;
-  use(keys.current);
+  useKey(keys.current);
   for (EncryptedValue& value : encryptedValues(store)) {
     (decrypt(value) ? todo : others).push_back(std::move(value));
   }
-  use(keys.next);
+  useKey(keys.next);
   for (EncryptedValue& value : others) {
     if (decrypt(value)) continue;
     throw Failure(kRefused,
@@ -136,7 +118,7 @@ void requireAllReadable(OAUTHDBBasic& store) {
   }
 }
 
-std::size_t convertStore(const Keys& keys, NextKey& next) {
+std::size_t convertStore(const KeyFiles& keys, NextKey& next) {
   std::size_t converted = 0;
   OAUTHDBBasic store;
   requireReady(store);
@@ -161,7 +143,7 @@ void verifyStore() {
 }
 
 Answer rekey(const Arguments& arguments) {
-  const Keys keys = keyFiles();
+  const KeyFiles keys = keyFiles();
   requireKeyFile(keys);
   confirm(arguments,
           "Encrypt every identifier and secret with a new key? "
