@@ -11,6 +11,7 @@
 #include "core/clauses.h"
 #include "core/connection.h"
 #include "core/oauth_errors.h"
+#include "core/rows.h"
 #include "core/schema.h"
 #include "core/secrets.h"
 #include "utils/decimal.h"
@@ -41,10 +42,6 @@ int runRowCallback(void* arg, int count, char** values, char** columns) {
     call.thrown = std::current_exception();
     return SQLITE_ABORT;
   }
-}
-
-const char* textOf(const char* value) {
-  return value != nullptr ? value : "";
 }
 
 void dumpRow(int line, int count, char** values, char** columns) {
@@ -207,8 +204,7 @@ int OAUTHDBBasic::TabGetCallback(void* arg, int count, char** values, char** col
   traceEntry(kCoreTrace, kSource, __LINE__, __func__);
   dumpRow(__LINE__, count, values, columns);
 
-  Json::Value row(Json::objectValue);
-  for (int i = 0; i < count; ++i) row[columns[i]] = textOf(values[i]);
+  Json::Value row = rowDocument(count, values, columns);
   if (!decryptSecrets(kSource, row)) {
     syslog(LOG_ERR, "%s:%d Decrypt data failed", kSource, __LINE__);
   }

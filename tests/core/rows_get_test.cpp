@@ -27,6 +27,18 @@ TEST_F(GetTest, RowsMapEveryColumnToAClearText) {
   EXPECT_EQ(rows[0], expected);
 }
 
+TEST_F(GetTest, ColumnThatNoStoreHasComesUnderItsName) {
+  sql("ALTER TABLE oauth_clientInfo ADD COLUMN zebra text DEFAULT 'striped'");
+  sql("ALTER TABLE oauth_clientInfo ADD COLUMN identity text DEFAULT 'short of none'");
+  request["condition"]["client_id"] = "a";
+  EXPECT_TRUE(clients->DBGet(request, &rows));
+  Json::Value expected = client("a");
+  expected["id"] = "2";
+  expected["zebra"] = "striped";
+  expected["identity"] = "short of none";
+  EXPECT_EQ(rows[0], expected);
+}
+
 TEST_F(GetTest, EveryMemberOfTheConditionMustHold) {
   request["condition"]["client_id"] = "a";
   request["condition"]["enable"] = "0";

@@ -1,0 +1,20 @@
+// Rows as SQLite hands them to a callback.
+
+#ifndef KELDOAUTH_CORE_ROWS_H
+#define KELDOAUTH_CORE_ROWS_H
+
+#include <json/value.h>
+
+namespace KELDOAUTHSERVER {
+
+/// The text of a column; a NULL is the empty text.
+inline const char* textOf(const char* value) {
+  return value != nullptr ? value : "";
+}
+
+/// The row as an object of texts.
+Json::Value rowDocument(int count, char** values, char** columns);
+
+}  // namespace KELDOAUTHSERVER
+
+#endif  // KELDOAUTH_CORE_ROWS_H
