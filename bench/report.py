@@ -116,7 +116,7 @@ def write_growth(path, media):
         table.writerow(["operation", "medium", "rows", "library", "bare"])
         for medium, times in media.items():
             for name in sorted({key for key, _ in times}, key=sort_key):
-                match = re.match(r"(B[2-5])[^/,]*/(\d+)$", name)
+                match = re.match(r"(B[2-5][^/,]*)/(\d+)$", name)
                 if match:
                     table.writerow([match[1], medium, match[2],
                                     statistics.median(times[(name, "library")]),
