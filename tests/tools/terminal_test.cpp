@@ -237,6 +237,12 @@ TEST_F(Terminal, AFolder) {
   EXPECT_THAT(outcome.err, HasSubstr("cannot read /tmp: Is a directory\n"));
 }
 
+TEST_F(Terminal, NameOfAMissingFileIsShownWithoutControlCharacters) {
+  const Outcome outcome = run({"token", "refresh", "--refresh-token-file", "/tmp/\033[2J"});
+  EXPECT_THAT(outcome, ExitsWith(kUsage));
+  EXPECT_THAT(outcome.err, HasSubstr("cannot read /tmp/\\x1b[2J: No such file or directory\n"));
+}
+
 TEST_F(Terminal, AFileThatHoldsMoreThanOneLine) {
   const std::string secret = support::id64('s');
   const std::string withNul = secret.substr(0, 63) + std::string(1, '\0');
