@@ -138,6 +138,7 @@ class BrokenFileTest : public Scene {
       -1,
       -5,
       SQLITE_ERROR,
+      SQLITE_READONLY,  // the file says that only a later SQLite may write it
       SQLITE_CORRUPT,
       SQLITE_IOERR,
       SQLITE_NOTADB,
