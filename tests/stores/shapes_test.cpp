@@ -25,11 +25,17 @@ struct WriterCase {
   const char* name;
   std::function<Outcome(Json::Value& out)> run;
 };
+void PrintTo(const WriterCase& writer, std::ostream* out) {
+  *out << writer.name;
+}
 
 struct ShapeCase {
   const char* name;
   Json::Value document;
 };
+void PrintTo(const ShapeCase& shape, std::ostream* out) {
+  *out << shape.name;
+}
 
 Json::Value arrayOfOne() {
   Json::Value document(Json::arrayValue);
