@@ -103,7 +103,7 @@ Answer restore(const Arguments& arguments) {
   const std::string& path = *arguments.file;
   requireReadableFile(path);
   if (isSameFile(path, names::kDatabaseFile)) {
-    throw Failure(kRefused, printable(path) + " is the database itself");
+    throw Failure(kRefused, path + " is the database itself");
   }
   DatabaseFile copy(path, DatabaseFile::Use::kRead);
   copy.holdStill();

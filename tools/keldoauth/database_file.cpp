@@ -6,7 +6,6 @@
 #include <ctime>
 #include <memory>
 
-#include "tools/keldoauth/text.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
@@ -88,7 +87,7 @@ void DatabaseFile::holdStill() {
 
 void DatabaseFile::requireStore() {
   if (text("PRAGMA integrity_check(1)") != "ok") {
-    throw Failure(kRefused, printable(path_) + " is damaged");
+    throw Failure(kRefused, path_ + " is damaged");
   }
   for (const Table& table : kTables) {
     const std::string sql = std::string("SELECT ") + table.columns + " FROM " + table.name;
@@ -97,7 +96,7 @@ void DatabaseFile::requireStore() {
     sqlite3_finalize(raw);
     if (result == SQLITE_OK) continue;
     if (result != SQLITE_ERROR) throw failure();
-    throw Failure(kRefused, printable(path_) + " is no store: " + sqlite3_errmsg(db_.get()));
+    throw Failure(kRefused, path_ + " is no store: " + sqlite3_errmsg(db_.get()));
   }
 }
 
@@ -129,13 +128,13 @@ Failure DatabaseFile::failure() const {
   const char* const fault =
       use_ == Use::kRead ? faultOfCopy(sqlite3_extended_errcode(db_.get())) : nullptr;
   if (fault == nullptr) return failure(sqlite3_errcode(db_.get()));
-  return {kRefused, printable(path_) + fault, "'keldoauth backup' makes copies that are whole"};
+  return {kRefused, path_ + fault, "'keldoauth backup' makes copies that are whole"};
 }
 
 Failure DatabaseFile::failure(int code) const {
   const char* const reason =
       code == sqlite3_errcode(db_.get()) ? sqlite3_errmsg(db_.get()) : sqlite3_errstr(code);
-  return libraryFailure(code, printable(path_) + ": " + reason);
+  return libraryFailure(code, path_ + ": " + reason);
 }
 
 }  // namespace tool

@@ -6,6 +6,7 @@
 
 #include "core/oauth_db_basic.h"
 #include "core/oauth_errors.h"
+#include "tools/keldoauth/text.h"
 
 using namespace KELDOAUTHSERVER;
 
@@ -54,7 +55,10 @@ const char* adviceFor(int code) {
 
 Failure::Failure(ExitCode exitCode, const std::string& message, std::string advice,
                  std::optional<int> libraryCode)
-    : std::runtime_error(message), exit(exitCode), code(libraryCode), hint(std::move(advice)) {}
+    : std::runtime_error(printable(message)),
+      exit(exitCode),
+      code(libraryCode),
+      hint(std::move(advice)) {}
 
 std::string Failure::text() const {
   return what() + (code ? " (" + std::to_string(*code) + ")" : "");

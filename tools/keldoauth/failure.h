@@ -27,6 +27,7 @@ enum ExitCode : int {
   kNotWritten = 8,    // the answer could not be written to standard output
 };
 
+/// The message may name what a user typed: it is kept in its printable form.
 class Failure : public std::runtime_error {
  public:
   Failure(ExitCode exitCode, const std::string& message, std::string advice = {},

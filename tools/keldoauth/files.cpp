@@ -11,7 +11,6 @@
 #include <cstring>
 #include <filesystem>
 
-#include "tools/keldoauth/text.h"
 #include "utils/oauth_names.h"
 
 namespace tool {
@@ -25,7 +24,7 @@ int openFolderOf(const std::string& path) {
 }
 
 Failure taken(const std::string& path) {
-  return {kRefused, printable(path) + " is there already", "a copy never replaces a file"};
+  return {kRefused, path + " is there already", "a copy never replaces a file"};
 }
 
 /// Media that know no links do know how to rename, and the other way round.
@@ -38,7 +37,7 @@ bool moveToFreeName(const std::string& from, const std::string& to) {
 }  // namespace
 
 Failure systemFailure(const std::string& path) {
-  return {kUnavailable, printable(path) + ": " + std::strerror(errno)};
+  return {kUnavailable, path + ": " + std::strerror(errno)};
 }
 
 void requireReadableFile(const std::string& path) {
@@ -47,7 +46,7 @@ void requireReadableFile(const std::string& path) {
   struct stat status {};
   const bool isRegular = fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
   close(descriptor);
-  if (!isRegular) throw Failure(kRefused, printable(path) + " is not a regular file");
+  if (!isRegular) throw Failure(kRefused, path + " is not a regular file");
 }
 
 bool isSameFile(const std::string& one, const std::string& other) {

@@ -12,7 +12,6 @@
 
 #include "tools/keldoauth/command.h"
 #include "tools/keldoauth/output.h"
-#include "tools/keldoauth/text.h"
 
 namespace tool {
 namespace {
@@ -75,9 +74,8 @@ std::string commandName(const CLI::App& app) {
 std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
   const bool isCommand = app.get_subcommands({}).empty();
   const std::vector<std::string> rest = app.remaining();
-  if (rest.empty()) return isCommand ? printable(error.what()) : "a command is missing";
-  return (isCommand ? "unexpected argument '" : "unknown command '") + printable(rest.front()) +
-         "'";
+  if (rest.empty()) return isCommand ? error.what() : "a command is missing";
+  return (isCommand ? "unexpected argument '" : "unknown command '") + rest.front() + "'";
 }
 
 // Answers ---------------------------------------------------------------------------

@@ -35,7 +35,7 @@ namespace {
 
 void requireKeyFile(const KeyFiles& keys) {
   if (std::filesystem::exists(keys.current)) return;
-  throw Failure(kRefused, "no key file " + printable(keys.current),
+  throw Failure(kRefused, "no key file " + keys.current,
                 "only the stand-in cipher has one; it is made when it is first needed");
 }
 

@@ -11,7 +11,6 @@
 #include <iostream>
 
 #include "tools/keldoauth/failure.h"
-#include "tools/keldoauth/text.h"
 
 namespace tool {
 namespace {
@@ -79,7 +78,7 @@ void stripLineEnd(std::string& text) {
 }
 
 [[noreturn]] void failUnreadable(const std::string& path) {
-  throw Failure(kUsage, "cannot read " + printable(path) + ": " + std::strerror(errno));
+  throw Failure(kUsage, "cannot read " + path + ": " + std::strerror(errno));
 }
 
 bool readFrom(const Input& input, const std::string& what, std::string& text) {
