@@ -10,8 +10,8 @@
 #include <string>
 #include <vector>
 
-#include "tools/keldoauth/command.h"
-#include "tools/keldoauth/output.h"
+#include "tools/keldoauth/commands/command.h"
+#include "tools/keldoauth/console/output.h"
 
 namespace tool {
 namespace {

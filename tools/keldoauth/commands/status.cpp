@@ -1,0 +1,167 @@
+// keldoauth status: the state of the service's storage on one page.
+
+#include <ostream>
+#include <string>
+#include <vector>
+
+#include "tools/keldoauth/commands/command.h"
+#include "tools/keldoauth/console/clock.h"
+#include "tools/keldoauth/console/output.h"
+#include "tools/keldoauth/console/text.h"
+#include "tools/keldoauth/health/health.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+
+using namespace KELDOAUTHSERVER;
+
+namespace tool {
+namespace {
+
+struct LogClass {
+  int bit;
+  const char* name;
+};
+constexpr LogClass kLogClasses[] = {
+    {1, "store operations"}, {2, "rows read"}, {4, "checked arguments"}, {8, "SQL statements"}};
+constexpr int kNoClass = ~15;
+constexpr int kClassesWithSecrets = 2 | 4 | 8;
+
+Json::Value inspectLifetimes() {
+  Json::Value lifetimes;
+  for (const char* key : {names::kGrantCodeExpired, names::kTokenExpired}) {
+    lifetimes[key] = getExpiredPeriod(key);
+  }
+  return lifetimes;
+}
+
+Answer status(const Arguments& /*arguments*/) {
+  Problems problems;
+  Answer answer;
+  Json::Value& document = answer.document;
+  document["version"] = KELDOAUTH_VERSION;
+  document["files"] = inspectFiles(problems);
+  inspectSettings(problems);
+  document["database"] = inspectDatabase(document["files"], problems);
+  document["lifetimes"] = inspectLifetimes();
+  document["diagnostics"] = inspectDiagnostics(problems);
+  document["problems"] = problems.list();
+  if (!problems.list().empty()) answer.exit = kUnhealthy;
+  return answer;
+}
+
+// For people --------------------------------------------------------------------------
+
+std::string ownerText(const Json::Value& file) {
+  if (!file["error"].isNull()) return file["error"].asString();
+  if (!file["exists"].asBool()) return "absent";
+  return file["owner"].asString() + ":" + file["group"].asString();
+}
+
+std::string limitText(const Json::Value& table) {
+  return table["limit"].asString() + " (" + table["limit_key"].asString() + ")";
+}
+
+constexpr Columns kFileColumns{
+    {"FILE", "path"},
+    {"OWNER", "owner", Width::kFixed, ownerText},
+    {"MODE", "mode"},
+    {"BYTES", "size"},
+};
+
+constexpr Columns kTableColumns{
+    {"TABLE", "name"},
+    {"ROWS", "rows"},
+    {"EXPIRED", "expired"},
+    {"LIMIT", "limit", Width::kFixed, limitText},
+};
+
+Json::Value inOrder(const Json::Value& files) {
+  Json::Value list(Json::arrayValue);
+  for (const char* name : {"folder", "database", "settings", "debug_flag"}) {
+    list.append(files[name]);
+  }
+  return list;
+}
+
+void printDiagnostics(const Json::Value& diagnostics, std::ostream& out) {
+  out << "Diagnostics  " << (diagnostics["debug_flag"].asBool() ? "on" : "off") << ", log level "
+      << diagnostics["log_level"].asString();
+  std::string separator = ": ";
+  for (const Json::Value& name : diagnostics["log_classes"]) {
+    out << separator << name.asString();
+    separator = ", ";
+  }
+  out << '\n';
+}
+
+void printProblems(const Json::Value& problems, std::ostream& out) {
+  if (problems.empty()) {
+    out << "\nNothing is wrong.\n";
+    return;
+  }
+  out << "\nWrong:\n";
+  for (const Json::Value& problem : problems) {
+    out << "  " << problem["subject"].asString() << ": " << printable(problem["message"].asString())
+        << '\n';
+    const std::string hint = problem["hint"].asString();
+    if (!hint.empty()) out << "      " << hint << '\n';
+  }
+}
+
+void printStatus(const Json::Value& document, std::ostream& out) {
+  const Json::Value& database = document["database"];
+  printTable(out, inOrder(document["files"]), kFileColumns);
+  out << '\n';
+  if (database["ready"].asBool()) {
+    printTable(out, database["tables"], kTableColumns);
+  } else {
+    out << "Database     " << cellText(database["message"]) << '\n';
+  }
+  const Json::Value& lifetimes = document["lifetimes"];
+  out << "\nLifetimes    codes " << duration(numberIn(lifetimes[names::kGrantCodeExpired]))
+      << ", access tokens " << duration(numberIn(lifetimes[names::kTokenExpired])) << '\n';
+  printDiagnostics(document["diagnostics"], out);
+  printProblems(document["problems"], out);
+}
+
+}  // namespace
+
+void Problems::add(const std::string& subject, const std::string& message,
+                   const std::string& hint) {
+  Json::Value problem;
+  problem["subject"] = subject;
+  problem["message"] = message;
+  problem["hint"] = hint;
+  list_.append(problem);
+}
+
+Json::Value inspectDiagnostics(Problems& problems) {
+  const int level = getLogLevel();
+  Json::Value document;
+  document["debug_flag"] = isDebugEnabled();
+  document["log_level"] = level;
+  document["log_classes"] = Json::arrayValue;
+  for (const LogClass& logClass : kLogClasses) {
+    if ((level & logClass.bit) != 0) document["log_classes"].append(logClass.name);
+  }
+  if (level > 0 && (level & kNoClass) != 0) {
+    problems.add("settings", "log_level: " + std::to_string(level) + " has bits without a meaning",
+                 "1, 2, 4 and 8 are the classes");
+  }
+  if (isDebugEnabled() && (level & kClassesWithSecrets) != 0) {
+    problems.add("diagnostics", "secrets and tokens are written to the system log",
+                 "remove " + std::string(names::kDebugFlagFile) + " and restart the programs");
+  }
+  return document;
+}
+
+const Command& statusCommand() {
+  static const Command command{"status",
+                               "Show files, tables, limits and what is wrong",
+                               {option::kJson},
+                               status,
+                               printStatus};
+  return command;
+}
+
+}  // namespace tool

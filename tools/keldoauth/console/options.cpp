@@ -1,0 +1,51 @@
+#include "tools/keldoauth/console/options.h"
+
+#include <CLI/CLI.hpp>
+#include <charconv>
+#include <system_error>
+
+namespace tool {
+namespace {
+
+/// Decimal digits and nothing else: no sign, no base prefix, no blanks.
+long long parseNumber(const std::string& text, const Option& option) {
+  long long number = 0;
+  const char* const end = text.data() + text.size();
+  const auto [stop, error] = std::from_chars(text.data(), end, number);
+  if (error != std::errc() || stop != end || number < 0) {
+    throw CLI::ValidationError(option.name, "'" + text + "' is not a whole number");
+  }
+  if (number > option.highest) {
+    throw CLI::ValidationError(option.name, text + " is above " + std::to_string(option.highest));
+  }
+  return number;
+}
+
+struct Declaration {
+  const Option& option;
+  CLI::App& app;
+  Arguments& arguments;
+
+  CLI::Option* operator()(bool Arguments::*member) const {
+    return app.add_flag(option.name, arguments.*member, option.help);
+  }
+  CLI::Option* operator()(Arguments::Text Arguments::*member) const {
+    return app.add_option(option.name, arguments.*member, option.help);
+  }
+  CLI::Option* operator()(Arguments::Number Arguments::*member) const {
+    const auto take = [this_ = *this, member](const std::string& text) {
+      this_.arguments.*member = parseNumber(text, this_.option);
+    };
+    return app.add_option_function<std::string>(option.name, take, option.help);
+  }
+};
+
+}  // namespace
+
+void declare(const Option& option, CLI::App& app, Arguments& arguments) {
+  CLI::Option* const declared = std::visit(Declaration{option, app, arguments}, option.target);
+  declared->required(option.isRequired);
+  declared->option_text(std::string(option.placeholder) + (option.isRequired ? " (required)" : ""));
+}
+
+}  // namespace tool
