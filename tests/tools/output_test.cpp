@@ -23,7 +23,8 @@ class Output : public CliTest {
   }
 
   static bool isPlainAscii(const std::string& text) {
-    return std::all_of(text.begin(), text.end(), [](signed char c) { return c >= ' '; });
+    return std::all_of(text.begin(), text.end(),
+                       [](signed char c) { return c >= ' ' && c != '\x7f'; });
   }
 };
 
@@ -80,6 +81,16 @@ INSTANTIATE_TEST_SUITE_P(
 TEST_F(Output, JsonKeepsControlCharacters) {
   addClient("a\x1b\n\"\\");
   EXPECT_EQ(json({"client", "list"})["clients"][0]["display_name"], "a\x1b\n\"\\");
+}
+
+TEST_F(Output, JsonKeepsDelete) {
+  addClient("a\x7f\xc2\x85");
+  EXPECT_EQ(json({"client", "list"})["clients"][0]["display_name"], "a\x7f\xc2\x85");
+}
+
+TEST_F(Output, JsonOfAMistakeHasNoControlCharacter) {
+  const Outcome outcome = run({"client", "show", "a\x7f\xc2\x9b\x1b", "--json"});
+  EXPECT_TRUE(isPlainAscii(lines(outcome.out).at(0))) << outcome.out;
 }
 
 TEST_F(Output, JsonKeepsUtf8) {

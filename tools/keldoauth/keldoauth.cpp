@@ -12,6 +12,7 @@
 
 #include "tools/keldoauth/commands/command.h"
 #include "tools/keldoauth/console/output.h"
+#include "tools/keldoauth/console/text.h"
 
 namespace tool {
 namespace {
@@ -159,6 +160,6 @@ int main(int argc, char** argv) try {
   std::cerr << "keldoauth: cannot write to standard output\n";
   return tool::kNotWritten;
 } catch (const std::exception& error) {
-  std::fprintf(stderr, "keldoauth: %s\n", error.what());
+  std::fprintf(stderr, "keldoauth: %s\n", tool::printable(error.what()).c_str());
   return tool::kUnavailable;
 }

@@ -104,7 +104,7 @@ void printProblems(const Json::Value& problems, std::ostream& out) {
     out << "  " << problem["subject"].asString() << ": " << printable(problem["message"].asString())
         << '\n';
     const std::string hint = problem["hint"].asString();
-    if (!hint.empty()) out << "      " << hint << '\n';
+    if (!hint.empty()) out << "      " << printable(hint) << '\n';
   }
 }
 

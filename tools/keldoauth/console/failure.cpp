@@ -2,8 +2,6 @@
 
 #include <json/value.h>
 
-#include <utility>
-
 #include "core/oauth_db_basic.h"
 #include "core/oauth_errors.h"
 #include "tools/keldoauth/console/text.h"
@@ -53,12 +51,12 @@ const char* adviceFor(int code) {
 
 }  // namespace
 
-Failure::Failure(ExitCode exitCode, const std::string& message, std::string advice,
+Failure::Failure(ExitCode exitCode, const std::string& message, const std::string& advice,
                  std::optional<int> libraryCode)
     : std::runtime_error(printable(message)),
       exit(exitCode),
       code(libraryCode),
-      hint(std::move(advice)) {}
+      hint(printable(advice)) {}
 
 std::string Failure::text() const {
   return what() + (code ? " (" + std::to_string(*code) + ")" : "");

@@ -27,10 +27,11 @@ enum ExitCode : int {
   kNotWritten = 8,    // the answer could not be written to standard output
 };
 
-/// The message may name what a user typed: it is kept in its printable form.
+/// Message and hint may name what a user typed, or a file: both are kept in
+/// their printable form.
 class Failure : public std::runtime_error {
  public:
-  Failure(ExitCode exitCode, const std::string& message, std::string advice = {},
+  Failure(ExitCode exitCode, const std::string& message, const std::string& advice = {},
           std::optional<int> libraryCode = {});
 
   /// The message with the library's code: "Bad parameters (-2)".

@@ -42,7 +42,7 @@ void printList(std::ostream& out, const Json::Value& document, const char* plura
 /// One line per column of a single row, nothing cut.
 void printDetails(std::ostream& out, const Json::Value& row, const Columns& columns);
 
-/// The document on one line of pure ASCII.
+/// The document on one line of ASCII without control characters.
 void printJson(std::ostream& out, const Json::Value& document);
 
 /// "1 client", "3 clients".
