@@ -18,8 +18,9 @@ endif()
 
 # Headers keep their folders: they are included as "stores/oauth_token.h".
 set(public_headers
-  utils/oauth_names.h utils/oauth_utils.h
+  utils/oauth_bounds.h utils/oauth_names.h utils/oauth_utils.h
   core/oauth_db_basic.h core/oauth_errors.h
+  core/transaction.h
   stores/oauth_clientInfo.h stores/oauth_grantCode.h stores/oauth_log.h stores/oauth_token.h)
 foreach(header IN LISTS public_headers)
   cmake_path(GET header PARENT_PATH folder)

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "core/log_lines.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
 
@@ -18,13 +19,19 @@ void appendDoubled(std::string& sql, const char* text, const char* end) {
   }
 }
 
+/// A value without a text form becomes a token that SQLite refuses wherever it
+/// stands: a statement must not run with half of what it was asked.
 void appendLiteral(std::string& sql, const Json::Value& value) {
+  if (!hasText(value)) {
+    sql += kRefusedClause;
+    return;
+  }
   sql += '\'';
   const char* text = nullptr;
   const char* end = nullptr;
   if (value.getString(&text, &end)) {
     appendDoubled(sql, text, end);
-  } else if (hasText(value)) {
+  } else {
     sql += value.asString();  // a number, a boolean or null: no quotes in it
   }
   sql += '\'';
@@ -50,31 +57,32 @@ bool hasText(const Json::Value& value) {
 }
 
 std::string insertClause(const char* source, const Json::Value& row) {
-  traceEntry(kCoreTrace, source, __LINE__, "GetInsertParam");
+  traceEntry(kCoreTrace, source, line::kInsertParamEntry, "GetInsertParam");
+  if (!isRequest(row)) return kRefusedClause;
+
   std::string columns;
   std::string values;
-  if (row.isObject()) {
-    for (auto member = row.begin(); member != row.end(); ++member) {
-      if (!columns.empty()) {
-        columns += ", ";
-        values += ", ";
-      }
-      const std::string column = member.name();
-      columns += column;
-      if (member->isNull()) {
-        values += nullValue(column);
-      } else {
-        appendLiteral(values, *member);
-      }
+  for (auto member = row.begin(); member != row.end(); ++member) {
+    if (!columns.empty()) {
+      columns += ", ";
+      values += ", ";
+    }
+    const std::string column = member.name();
+    columns += column;
+    if (member->isNull()) {
+      values += nullValue(column);
+    } else {
+      appendLiteral(values, *member);
     }
   }
   return " (" + columns + ") VALUES(" + values + ")";
 }
 
 std::string joinPairs(const char* source, const Json::Value& pairs, const std::string& separator) {
-  traceEntry(kCoreTrace, source, __LINE__, "ConcateParam");
+  traceEntry(kCoreTrace, source, line::kConcateParamEntry, "ConcateParam");
+  if (!pairs.empty() && !pairs.isObject()) return kRefusedClause;
+
   std::string clause;
-  if (!pairs.isObject()) return clause;
 
   for (auto pair = pairs.begin(); pair != pairs.end(); ++pair) {
     if (!clause.empty()) clause += separator;
@@ -86,14 +94,14 @@ std::string joinPairs(const char* source, const Json::Value& pairs, const std::s
 }
 
 std::string conditionClause(const char* source, const Json::Value& condition) {
-  traceEntry(kCoreTrace, source, __LINE__, "GetConditionParam");
+  traceEntry(kCoreTrace, source, line::kConditionParamEntry, "GetConditionParam");
   if (condition.empty()) return {};
   return " WHERE " + joinPairs(source, condition, " and ");
 }
 
 std::string updateClause(const char* source, const Json::Value& request) {
-  traceEntry(kCoreTrace, source, __LINE__, "GetUpdateParam");
-  if (!isRequest(request)) return " SET ";
+  traceEntry(kCoreTrace, source, line::kUpdateParamEntry, "GetUpdateParam");
+  if (!isRequest(request)) return kRefusedClause;
   std::string clause = " SET " + joinPairs(source, request[names::kModified], ", ");
   clause += conditionClause(source, request[names::kCondition]);
   return clause;

@@ -12,6 +12,10 @@
 
 namespace KELDOAUTHSERVER {
 
+/// A token that is none of SQL's, and short enough to need no memory: SQLite
+/// refuses every statement in which it stands outside a literal.
+inline constexpr char kRefusedClause[] = "\\";
+
 /// True for null and for an object: what a request can be.
 bool isRequest(const Json::Value& doc);
 

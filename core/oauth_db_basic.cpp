@@ -3,6 +3,8 @@
 #include <sqlite3.h>
 #include <syslog.h>
 
+#include <algorithm>
+#include <array>
 #include <cstdint>
 #include <exception>
 #include <string>
@@ -10,6 +12,7 @@
 
 #include "core/clauses.h"
 #include "core/connection.h"
+#include "core/log_lines.h"
 #include "core/oauth_errors.h"
 #include "core/rows.h"
 #include "core/schema.h"
@@ -44,27 +47,92 @@ int runRowCallback(void* arg, int count, char** values, char** columns) {
   }
 }
 
-void dumpRow(int line, int count, char** values, char** columns) {
+void dumpRow(int number, int count, char** values, char** columns) {
   if (!isTraced(kRowDump)) return;
-  for (int i = 0; i < count; ++i) {
-    syslog(LOG_ERR, "%s:%d ##### [%d][%s = %s]", kSource, line, i, columns[i], textOf(values[i]));
+  const int readable = readableColumns(count, values, columns);
+  for (int i = 0; i < readable; ++i) {
+    syslog(LOG_ERR, "%s:%d ##### [%d][%s = %s]", kSource, number, i, textOf(columns[i]),
+           textOf(values[i]));
   }
 }
 
-void logUnexpected(const char* source, int line, const char* what) {
-  syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", source, line, what);
+// What the public callbacks do. These throw: within a statement an exception has
+// to end it.
+
+int appendCount(void* arg, int count, char** values, char** /*columns*/) {
+  traceEntry(kCoreTrace, kSource, line::kTabCountEntry, "TabCountCallback");
+  if (count < 1 || values == nullptr) return 0;
+  static_cast<Json::Value*>(arg)->append(textOf(values[0]));
+  return 0;
+}
+
+int noteTable(void* arg, int count, char** values, char** columns) {
+  traceEntry(kCoreTrace, kSource, line::kIsTabExistEntry, "IsTabExistCallback");
+  dumpRow(line::kIsTabExistDump, count, values, columns);
+  (*static_cast<Json::Value*>(arg))[names::kExist] = true;
+  return 0;
+}
+
+int appendRow(void* arg, int count, char** values, char** columns) {
+  traceEntry(kCoreTrace, kSource, line::kTabGetEntry, "TabGetCallback");
+  dumpRow(line::kTabGetDump, count, values, columns);
+
+  Json::Value row = rowDocument(count, values, columns);
+  if (!decryptSecrets(kSource, row)) {
+    syslog(LOG_ERR, "%s:%d Decrypt data failed", kSource, line::kDecryptDataFailed);
+  }
+  static_cast<Json::Value*>(arg)->append(std::move(row));
+  return 0;
+}
+
+void logUnexpected(const char* source, int number, const char* what) {
+  syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", source, number, what);
 }
 
 /// The end of a static operation that has no object to keep an error.
-int failWithoutObject(int line) noexcept {
+int failWithoutObject(int number) noexcept {
   try {
     throw;
   } catch (const std::exception& thrown) {
-    logUnexpected(kSource, line, thrown.what());
+    logUnexpected(kSource, number, thrown.what());
   } catch (...) {
-    logUnexpected(kSource, line, "unknown");
+    logUnexpected(kSource, number, "unknown");
   }
   return 0;
+}
+
+/// A public callback, and what stands behind it.
+struct OwnCallback {
+  OAUTHDBBasic::RowCallback callback;
+  OAUTHDBBasic::RowCallback body;
+  Json::ValueType fills;  // the document that it adds to, when that is not null
+  int threwLine;
+};
+
+constexpr std::array<OwnCallback, 3> kOwnCallbacks{{
+    {OAUTHDBBasic::TabCountCallback, appendCount, Json::arrayValue, line::kTabCountThrew},
+    {OAUTHDBBasic::IsTabExistCallback, noteTable, Json::objectValue, line::kIsTabExistThrew},
+    {OAUTHDBBasic::TabGetCallback, appendRow, Json::arrayValue, line::kTabGetThrew},
+}};
+
+bool canFill(const OwnCallback& own, const void* arg) {
+  const auto* const doc = static_cast<const Json::Value*>(arg);
+  return doc != nullptr && (doc->isNull() || doc->type() == own.fills);
+}
+
+/// Null for a callback of the caller's own.
+const OwnCallback* findOwn(OAUTHDBBasic::RowCallback callback) {
+  const auto* const found =
+      std::find_if(kOwnCallbacks.begin(), kOwnCallbacks.end(),
+                   [callback](const OwnCallback& own) { return own.callback == callback; });
+  return found != kOwnCallbacks.end() ? found : nullptr;
+}
+
+/// A public callback as somebody calls it by himself.
+int runAlone(const OwnCallback& own, void* arg, int count, char** values, char** columns) try {
+  return canFill(own, arg) ? own.body(arg, count, values, columns) : 0;
+} catch (...) {
+  return failWithoutObject(own.threwLine);
 }
 
 }  // namespace
@@ -76,12 +144,18 @@ OAUTHDBBasic::OAUTHDBBasic() : errCode_(errors::kNone.code) {
   DBInit();
 }
 
+OAUTHDBBasic::OAUTHDBBasic(const std::string& tableName, OAUTHDBBasic& store)
+    : errCode_(errors::kNone.code), db_(store.db_), lender_(&store) {
+  DBInit();
+  SetTabName(tableName);
+}
+
 OAUTHDBBasic::~OAUTHDBBasic() {
-  if (db_ == nullptr) return;
+  if (db_ == nullptr || lender_ != nullptr) return;
 
   const int result = closeConnection(kSource, db_);
   if (result != SQLITE_OK) {
-    syslog(LOG_ERR, "%s:%d Close DB failed!![%d]", kSource, __LINE__, result);
+    syslog(LOG_ERR, "%s:%d Close DB failed!![%d]", kSource, line::kCloseFailed, result);
   }
 }
 
@@ -91,9 +165,13 @@ void OAUTHDBBasic::Open() try {
 
   errCode_ = result;
   errMsg_ = errors::kOpenFailed;
-  syslog(LOG_ERR, "%s:%d Open DB failed!![%d]", kSource, __LINE__, result);
+  syslog(LOG_ERR, "%s:%d Open DB failed!![%d]", kSource, line::kOpenFailed, result);
 } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
+  FailUnexpectedly(kSource, line::kOpenThrew);
+}
+
+bool OAUTHDBBasic::IsLent() const {
+  return lender_ != nullptr;
 }
 
 // The last error --------------------------------------------------------------
@@ -111,7 +189,7 @@ std::string OAUTHDBBasic::GetErrMsg() const try { return errMsg_; } catch (const
 }
 
 void OAUTHDBBasic::SetErrMsg(const std::string& msg) try { errMsg_ = msg; } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
+  FailUnexpectedly(kSource, line::kSetErrMsgThrew);
 }
 
 bool OAUTHDBBasic::Fail(const OAUTHError& error) {
@@ -148,15 +226,15 @@ std::string OAUTHDBBasic::GetTabName() const try {
 
 void OAUTHDBBasic::SetTabName(const std::string& name) try { tabName_ = name; } catch (...) {
   ready_ = 0;
-  FailUnexpectedly(kSource, __LINE__);
+  FailUnexpectedly(kSource, line::kSetTabNameThrew);
 }
 
 // Running statements ----------------------------------------------------------
 
 int OAUTHDBBasic::DBCmd(const std::string& sql, RowCallback callback, Json::Value* arg) {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kDBCmdEntry, __func__);
   if (db_ == nullptr || ready_ == 0) {
-    syslog(LOG_ERR, "%s:%d DB is not ready!!", kSource, __LINE__);
+    syslog(LOG_ERR, "%s:%d DB is not ready!!", kSource, line::kNotReady);
     return 0;
   }
   return DBCmdRun(sql, callback, arg);
@@ -165,14 +243,17 @@ int OAUTHDBBasic::DBCmd(const std::string& sql, RowCallback callback, Json::Valu
 int OAUTHDBBasic::DBCmdRun(const std::string& sql, RowCallback callback, Json::Value* arg) try {
   return Run(sql, callback, arg);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kDBCmdRunThrew);
 }
 
 int OAUTHDBBasic::Run(const std::string& sql, RowCallback callback, Json::Value* arg) {
   if (isTraced(kCoreTrace)) {
-    syslog(LOG_ERR, "%s:%d ==> %s[%s]", kSource, __LINE__, "DBCmdRun", sql.c_str());
+    syslog(LOG_ERR, "%s:%d ==> %s[%s]", kSource, line::kDBCmdRunEntry, "DBCmdRun", sql.c_str());
   }
-  RowCall call{callback, arg, nullptr};
+  const OwnCallback* const own = findOwn(callback);
+  if (own != nullptr && !canFill(*own, arg)) return Fail(errors::kBadParameters);
+
+  RowCall call{own != nullptr ? own->body : callback, arg, nullptr};
   char* text = nullptr;
   const int result =
       sqlite3_exec(db_, sql.c_str(), callback != nullptr ? runRowCallback : nullptr, &call, &text);
@@ -183,79 +264,67 @@ int OAUTHDBBasic::Run(const std::string& sql, RowCallback callback, Json::Value*
   // SQLite has no text where it had no connection or no memory for one.
   errCode_ = result;
   errMsg_ = reason != nullptr ? reason.get() : sqlite3_errstr(result);
-  syslog(LOG_ERR, "%s:%d Run Command failed!![%s][%d]", kSource, __LINE__, errMsg_.c_str(), result);
+  syslog(LOG_ERR, "%s:%d Run Command failed!![%s][%d]", kSource, line::kRunCommandFailed,
+         errMsg_.c_str(), result);
   return 0;
 }
 
-int OAUTHDBBasic::TabCountCallback(void* arg, int /*count*/, char** values, char** /*columns*/) {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
-  static_cast<Json::Value*>(arg)->append(textOf(values[0]));
-  return 0;
+int OAUTHDBBasic::TabCountCallback(void* arg, int count, char** values, char** columns) {
+  return runAlone(kOwnCallbacks[0], arg, count, values, columns);
 }
 
 int OAUTHDBBasic::IsTabExistCallback(void* arg, int count, char** values, char** columns) {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
-  dumpRow(__LINE__, count, values, columns);
-  (*static_cast<Json::Value*>(arg))[names::kExist] = true;
-  return 0;
+  return runAlone(kOwnCallbacks[1], arg, count, values, columns);
 }
 
 int OAUTHDBBasic::TabGetCallback(void* arg, int count, char** values, char** columns) {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
-  dumpRow(__LINE__, count, values, columns);
-
-  Json::Value row = rowDocument(count, values, columns);
-  if (!decryptSecrets(kSource, row)) {
-    syslog(LOG_ERR, "%s:%d Decrypt data failed", kSource, __LINE__);
-  }
-  static_cast<Json::Value*>(arg)->append(std::move(row));
-  return 0;
+  return runAlone(kOwnCallbacks[2], arg, count, values, columns);
 }
 
 // Schema ----------------------------------------------------------------------
 
 int OAUTHDBBasic::DBInit() try {
-  ready_ = 0;
-  if (db_ == nullptr) return ready_;
+  ready_ = lender_ != nullptr ? lender_->ready_ : 0;
+  if (lender_ != nullptr || db_ == nullptr) return ready_;
 
   if (isTraced(kCoreTrace)) {
-    syslog(LOG_ERR, "%s:%d ==> %s[init meta table]", kSource, __LINE__, __func__);
+    syslog(LOG_ERR, "%s:%d ==> %s[init meta table]", kSource, line::kInitMetaEntry, __func__);
   }
   if (FindTable(names::kMetaTable) == 0) {
     if (CreateDBTab(schema::kCreateMeta) == 0) {
-      syslog(LOG_ERR, "%s:%d Create Table failed!![meta]", kSource, __LINE__);
+      syslog(LOG_ERR, "%s:%d Create Table failed!![meta]", kSource, line::kCreateMetaFailed);
       return ready_;
     }
     InsertMetaRows();
   }
   for (const schema::Step& step : schema::kSteps) {
     if (isTraced(step.mask)) {
-      syslog(LOG_ERR, step.trace, kSource, __LINE__, __func__);
+      syslog(LOG_ERR, step.trace, kSource, step.entryLine, __func__);
     }
     if (CreateDBTab(step.statement) == 0) {
-      syslog(LOG_ERR, "%s:%d Create Table failed!![%s]", kSource, __LINE__, step.table);
+      syslog(LOG_ERR, "%s:%d Create Table failed!![%s]", kSource, step.failedLine, step.table);
       return ready_;
     }
   }
   ready_ = 1;
   return ready_;
 } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
+  FailUnexpectedly(kSource, line::kDBInitThrew);
   return ready_;
 }
 
 void OAUTHDBBasic::AddMetaData() try { InsertMetaRows(); } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
+  FailUnexpectedly(kSource, line::kAddMetaDataThrew);
 }
 
 void OAUTHDBBasic::InsertMetaRows() {
-  traceEntry(kCoreTrace, kSource, __LINE__, "AddMetaData");
+  traceEntry(kCoreTrace, kSource, line::kAddMetaDataEntry, "AddMetaData");
   for (const char* table : schema::kVersionedTables) {
     const std::string sql = std::string("INSERT INTO ") + names::kMetaTable +
                             "(tab_name, version) VALUES('" + table + "', " + schema::kVersion +
                             ");";
     if (Run(sql, nullptr, nullptr) == 0) {
-      syslog(LOG_ERR, "%s:%d Add Meta failed", kSource, __LINE__);
+      syslog(LOG_ERR, "%s:%d Add Meta failed", kSource, line::kAddMetaFailed);
     }
   }
 }
@@ -263,17 +332,17 @@ void OAUTHDBBasic::InsertMetaRows() {
 int OAUTHDBBasic::CreateDBTab(const std::string& statement) try {
   if (DBCmdRun(statement, nullptr, nullptr) == 0) return Fail(errors::kCreateTableFailed);
   if (isTraced(kCoreTrace)) {
-    syslog(LOG_ERR, "%s:%d Create tab success", kSource, __LINE__);
+    syslog(LOG_ERR, "%s:%d Create tab success", kSource, line::kCreateTabSuccess);
   }
   return 1;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kCreateDBTabThrew);
 }
 
 int OAUTHDBBasic::IsDBTabExist(const std::string& name) try {
   return FindTable(name);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kIsDBTabExistThrew);
 }
 
 int OAUTHDBBasic::FindTable(const std::string& name) {
@@ -283,105 +352,107 @@ int OAUTHDBBasic::FindTable(const std::string& name) {
   if (Run(sql, IsTabExistCallback, &found) == 0 || !found[names::kExist].asBool()) return 0;
 
   if (isTraced(kCoreTrace)) {
-    syslog(LOG_ERR, "%s:%d Tab[%s] is exist", kSource, __LINE__, name.c_str());
+    syslog(LOG_ERR, "%s:%d Tab[%s] is exist", kSource, line::kTabIsExist, name.c_str());
   }
   return 1;
 }
 
 int OAUTHDBBasic::DBGetRowCount(Json::Value& result) try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kRowCountEntry, __func__);
   result = Json::Value(Json::arrayValue);
   const int status = DBCmd("SELECT COUNT(*) FROM " + tabName_ + ";", TabCountCallback, &result);
   if (status == 0) {
-    syslog(LOG_ERR, "%s:%d Get Row Count failed[%s]", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Get Row Count failed[%s]", kSource, line::kRowCountFailed,
+           tabName_.c_str());
   }
   return status;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kRowCountThrew);
 }
 
 int OAUTHDBBasic::DBCheckRowMax(unsigned long max) try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kCheckRowMaxEntry, __func__);
   Json::Value counts;
   if (DBGetRowCount(counts) == 0) {
-    syslog(LOG_ERR, "%s:%d Check Row Max failed[%s]", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Check Row Max failed[%s]", kSource, line::kCheckRowMaxFailed,
+           tabName_.c_str());
     return 0;
   }
   const unsigned long count = static_cast<std::uint32_t>(decimalValue(counts[0U]));
   if (isTraced(kStoreTrace)) {
-    syslog(LOG_ERR, "%s:%d Table Row Count[%lu]", kSource, __LINE__, count);
+    syslog(LOG_ERR, "%s:%d Table Row Count[%lu]", kSource, line::kTableRowCount, count);
   }
   return count < max ? 1 : 0;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kCheckRowMaxThrew);
 }
 
 int OAUTHDBBasic::DBDrop() try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kDropEntry, __func__);
   const int status = DBCmdRun("DROP TABLE IF EXISTS " + tabName_ + ";", nullptr, nullptr);
   if (status == 0 && isTraced(kStoreTrace)) {
-    syslog(LOG_ERR, "%s:%d Drop [%s] failed", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Drop [%s] failed", kSource, line::kDropFailed, tabName_.c_str());
   }
   return status;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kDropThrew);
 }
 
 // Request documents to SQL ----------------------------------------------------
 //
-// What is returned in place of a clause is short enough to need no memory, and
-// SQLite refuses the statement that it would stand in.
+// What is returned in place of a clause needs no memory, and SQLite refuses the
+// statement that it would stand in.
 
 std::string OAUTHDBBasic::GetInsertParam(const Json::Value& row) try {
   return insertClause(kSource, row);
 } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
-  return {};
+  FailUnexpectedly(kSource, line::kInsertParamThrew);
+  return kRefusedClause;
 }
 
 std::string OAUTHDBBasic::ConcateParam(const Json::Value& pairs, const std::string& separator) try {
   return joinPairs(kSource, pairs, separator);
 } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
-  return {};
+  FailUnexpectedly(kSource, line::kConcateParamThrew);
+  return kRefusedClause;
 }
 
 std::string OAUTHDBBasic::GetConditionParam(const Json::Value& condition) try {
   return conditionClause(kSource, condition);
 } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
-  return " WHERE ";
+  FailUnexpectedly(kSource, line::kConditionParamThrew);
+  return kRefusedClause;
 }
 
 std::string OAUTHDBBasic::GetUpdateParam(const Json::Value& request) try {
   return updateClause(kSource, request);
 } catch (...) {
-  FailUnexpectedly(kSource, __LINE__);
-  return " SET ";
+  FailUnexpectedly(kSource, line::kUpdateParamThrew);
+  return kRefusedClause;
 }
 
 // Rows ------------------------------------------------------------------------
 
 bool OAUTHDBBasic::DBAdd(Json::Value& row) try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kAddEntry, __func__);
   if (!isPairs(row)) return Fail(errors::kBadParameters);
   if (!encryptSecrets(kSource, row)) return Fail(errors::kEncryptFailed);
 
   if (DBCmd("INSERT INTO " + tabName_ + insertClause(kSource, row) + ";", nullptr, nullptr) == 0) {
-    syslog(LOG_ERR, "%s:%d Add failed[%s]", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Add failed[%s]", kSource, line::kAddFailed, tabName_.c_str());
     return false;
   }
   if (isTraced(kStoreTrace)) {
-    syslog(LOG_ERR, "%s:%d [%s] Add success, changed[%d]", kSource, __LINE__, tabName_.c_str(),
-           sqlite3_changes(db_));
+    syslog(LOG_ERR, "%s:%d [%s] Add success, changed[%d]", kSource, line::kAddSuccess,
+           tabName_.c_str(), sqlite3_changes(db_));
   }
   return true;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kAddThrew);
 }
 
 bool OAUTHDBBasic::DBGet(Json::Value& request, Json::Value* result) try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kGetEntry, __func__);
   const Json::Value& asked = request;
   if (result == nullptr || !isRequest(asked) || !isPairs(asked[names::kCondition]) ||
       !hasText(asked[names::kConditionLike]) || !hasText(asked[names::kOption])) {
@@ -396,19 +467,19 @@ bool OAUTHDBBasic::DBGet(Json::Value& request, Json::Value* result) try {
   sql += " " + asked[names::kOption].asString() + ";";
 
   if (DBCmd(sql, TabGetCallback, result) == 0) {
-    syslog(LOG_ERR, "%s:%d Get failed[%s]", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Get failed[%s]", kSource, line::kGetFailed, tabName_.c_str());
     return false;
   }
   if (isTraced(kStoreTrace)) {
-    syslog(LOG_ERR, "%s:%d ClientInfo Get Done", kSource, __LINE__);
+    syslog(LOG_ERR, "%s:%d ClientInfo Get Done", kSource, line::kGetDone);
   }
   return true;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kGetThrew);
 }
 
 bool OAUTHDBBasic::DBEdit(Json::Value& request) try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kEditEntry, __func__);
   const Json::Value& asked = request;
   if (!isRequest(asked) || !isPairs(asked[names::kCondition]) ||
       !isPairs(asked[names::kModified])) {
@@ -419,19 +490,20 @@ bool OAUTHDBBasic::DBEdit(Json::Value& request) try {
 
   int changed = 0;
   if (!RunChange("UPDATE " + tabName_ + updateClause(kSource, request) + ";", changed)) {
-    syslog(LOG_ERR, "%s:%d Edit failed[%s]", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Edit failed[%s]", kSource, line::kEditFailed, tabName_.c_str());
     return false;
   }
   if (isTraced(kStoreTrace)) {
-    syslog(LOG_ERR, "%s:%d ClientInfo Edit success, changed[%d]", kSource, __LINE__, changed);
+    syslog(LOG_ERR, "%s:%d ClientInfo Edit success, changed[%d]", kSource, line::kEditSuccess,
+           changed);
   }
   return true;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kEditThrew);
 }
 
 bool OAUTHDBBasic::DBDel(Json::Value& request) try {
-  traceEntry(kCoreTrace, kSource, __LINE__, __func__);
+  traceEntry(kCoreTrace, kSource, line::kDelEntry, __func__);
   const Json::Value& asked = request;
   if (!isRequest(asked) || !isPairs(asked[names::kCondition])) return Fail(errors::kBadParameters);
   if (!encryptSecrets(kSource, request[names::kCondition])) return Fail(errors::kEncryptFailed);
@@ -439,15 +511,16 @@ bool OAUTHDBBasic::DBDel(Json::Value& request) try {
   int changed = 0;
   const std::string clause = conditionClause(kSource, asked[names::kCondition]);
   if (!RunChange("DELETE FROM " + tabName_ + clause + ";", changed)) {
-    syslog(LOG_ERR, "%s:%d Delete failed[%s]", kSource, __LINE__, tabName_.c_str());
+    syslog(LOG_ERR, "%s:%d Delete failed[%s]", kSource, line::kDelFailed, tabName_.c_str());
     return false;
   }
   if (isTraced(kStoreTrace)) {
-    syslog(LOG_ERR, "%s:%d ClientInfo Delete success, changed[%d]", kSource, __LINE__, changed);
+    syslog(LOG_ERR, "%s:%d ClientInfo Delete success, changed[%d]", kSource, line::kDelSuccess,
+           changed);
   }
   return true;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, line::kDelThrew);
 }
 
 /// True when the statement ran and changed at least one row.
@@ -466,13 +539,13 @@ bool OAUTHDBBasic::InTransaction() const {
 int OAUTHDBBasic::ParamEncrypt(Json::Value& doc) try {
   return encryptSecrets(kSource, doc) ? 1 : 0;
 } catch (...) {
-  return failWithoutObject(__LINE__);
+  return failWithoutObject(line::kParamEncryptThrew);
 }
 
 int OAUTHDBBasic::ParamDecrypt(Json::Value& doc) try {
   return decryptSecrets(kSource, doc) ? 1 : 0;
 } catch (...) {
-  return failWithoutObject(__LINE__);
+  return failWithoutObject(line::kParamDecryptThrew);
 }
 
 }  // namespace KELDOAUTHSERVER

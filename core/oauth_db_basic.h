@@ -8,8 +8,9 @@
 // - An operation returns non-zero or true on success. A success leaves the code
 //   and the message on the object as they were, and so do a few failures; each
 //   says so.
-// - An object belongs to one thread at a time. Constructing and destroying
-//   switches the ids of the whole process: one thread at a time there, too.
+// - An object belongs to one thread at a time, and so do all objects on one
+//   connection. Constructing and destroying switches the ids of the whole
+//   process: one thread at a time there, too.
 
 #ifndef KELDOAUTH_CORE_OAUTH_DB_BASIC_H
 #define KELDOAUTH_CORE_OAUTH_DB_BASIC_H
@@ -38,7 +39,7 @@ class OAUTHDBBasic {
   /// object is not ready and refuses every later operation; there is no reopen.
   OAUTHDBBasic();
 
-  /// Closes the connection, again with raised privileges.
+  /// Closes the connection, again with raised privileges, unless it is lent.
   ~OAUTHDBBasic();
 
   OAUTHDBBasic(const OAUTHDBBasic&) = delete;
@@ -71,6 +72,11 @@ class OAUTHDBBasic {
   /// The same without the check for readiness: start-up runs through it.
   int DBCmdRun(const std::string& sql, RowCallback callback, Json::Value* arg);
 
+  // The library's own callbacks. `arg` is a Json::Value, an array (an object
+  // for the second) or null; DBCmd refuses another one, or none, before the
+  // statement: 0, -2 "Bad parameters". Called by hand they always return 0, and
+  // add nothing to such an `arg`.
+
   /// Appends the first column as text to the array behind `arg`.
   static int TabCountCallback(void* arg, int count, char** values, char** columns);
   /// Sets the member "exist" of the object behind `arg` to true.
@@ -83,7 +89,9 @@ class OAUTHDBBasic {
   // Schema ------------------------------------------------------------------
 
   /// Creates what is missing and marks the object ready; returns the ready
-  /// flag. Does nothing without a connection. The constructor calls it.
+  /// flag, which is cleared first. Does nothing without a connection. On a lent
+  /// connection it takes over whether the lending object is ready, no more. The
+  /// constructors call it.
   int DBInit();
 
   /// Inserts the three rows of the meta table. A row that fails is logged and
@@ -168,6 +176,15 @@ class OAUTHDBBasic {
   static int ParamDecrypt(Json::Value& doc);
 
  protected:
+  /// For the stores' second constructors: an object on the connection of
+  /// `store`, as if it were one with it. Opens and creates nothing, switches no
+  /// privilege and closes nothing; it is ready if `store` is at this moment,
+  /// and has an error state of its own. `store` must outlive it.
+  OAUTHDBBasic(const std::string& tableName, OAUTHDBBasic& store);
+
+  /// True on the connection of another object.
+  bool IsLent() const;
+
   /// Records `error` and returns false, for the stores' one-line refusals.
   bool Fail(const OAUTHError& error);
 
@@ -197,6 +214,7 @@ class OAUTHDBBasic {
   std::string errMsg_;
   std::string tabName_;
   sqlite3* db_ = nullptr;
+  OAUTHDBBasic* lender_ = nullptr;  // whose connection this is; null for one's own
 };
 
 }  // namespace KELDOAUTHSERVER

@@ -17,6 +17,10 @@ namespace errors {
 /// Nothing has failed since the object was constructed.
 inline constexpr OAUTHError kNone{255, ""};
 
+/// SQLite's "database is locked": another process held the lock for the whole
+/// wait. The one of SQLite's codes for which trying again is the answer.
+inline constexpr int kBusy = 5;
+
 /// The constructor could not open the database. The code kept is SQLite's.
 inline constexpr char kOpenFailed[] = "Open DB failed!!";
 

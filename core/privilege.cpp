@@ -7,6 +7,8 @@
 #include <cerrno>
 #include <cstring>
 
+#include "core/log_lines.h"
+
 namespace KELDOAUTHSERVER {
 namespace {
 
@@ -23,13 +25,13 @@ bool switchEffective(const char* source, const char* name, SetIds set, id_t id) 
   if (set(kUnchanged, id, kUnchanged) != 0) {
     std::array<char, 1024> text{};
     const char* reason = strerror_r(errno, text.data(), text.size());
-    syslog(kFailurePriority, "%s:%d ERROR: set%s(%d, %d, %d) [%s]", source, __LINE__, name, -1,
-           static_cast<int>(id), -1, reason);
+    syslog(kFailurePriority, "%s:%d ERROR: set%s(%d, %d, %d) [%s]", source, line::kSetIdsFailed,
+           name, -1, static_cast<int>(id), -1, reason);
     return false;
   }
   if (id == kRoot) {
-    syslog(kSuccessPriority, "%s:%d WARNING: set%s(%d, %d, %d)", source, __LINE__, name, -1,
-           static_cast<int>(id), -1);
+    syslog(kSuccessPriority, "%s:%d WARNING: set%s(%d, %d, %d)", source, line::kSetIdsDone, name,
+           -1, static_cast<int>(id), -1);
   }
   return true;
 }
@@ -51,7 +53,7 @@ RaisedPrivilege::RaisedPrivilege(const char* source)
     return;
   }
   errno = 1;
-  syslog(kFailurePriority, "%s:%d ERROR: ENTERCriticalSection", source_, __LINE__);
+  syslog(kFailurePriority, "%s:%d ERROR: ENTERCriticalSection", source_, line::kEnterFailed);
 }
 
 RaisedPrivilege::~RaisedPrivilege() {
@@ -60,7 +62,7 @@ RaisedPrivilege::~RaisedPrivilege() {
     return;
   }
   errno = 1;
-  syslog(kFailurePriority, "%s:%d ERROR: LEAVECriticalSection", source_, __LINE__);
+  syslog(kFailurePriority, "%s:%d ERROR: LEAVECriticalSection", source_, line::kLeaveFailed);
 }
 
 /// Group first; when that is refused, the user stays as it is.

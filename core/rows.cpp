@@ -38,9 +38,11 @@ const char* lastingName(std::string_view column) {
 /// in the listing of a full table, megabytes of them.
 Json::Value rowDocument(int count, char** values, char** columns) {
   Json::Value row(Json::objectValue);
-  for (int i = 0; i < count; ++i) {
-    const char* const lasting = lastingName(columns[i]);
-    Json::Value& member = lasting != nullptr ? row[Json::StaticString(lasting)] : row[columns[i]];
+  const int readable = readableColumns(count, values, columns);
+  for (int i = 0; i < readable; ++i) {
+    const char* const column = textOf(columns[i]);
+    const char* const lasting = lastingName(column);
+    Json::Value& member = lasting != nullptr ? row[Json::StaticString(lasting)] : row[column];
     member = textOf(values[i]);
   }
   return row;

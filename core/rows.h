@@ -7,9 +7,15 @@
 
 namespace KELDOAUTHSERVER {
 
-/// The text of a column; a NULL is the empty text.
+/// The text of a column, or its name; a NULL is the empty text.
 inline const char* textOf(const char* value) {
   return value != nullptr ? value : "";
+}
+
+/// How many columns can be read; none where the callback was called by hand and
+/// without them.
+inline int readableColumns(int count, char** values, char** columns) {
+  return values != nullptr && columns != nullptr ? count : 0;
 }
 
 /// The row as an object of texts.

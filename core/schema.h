@@ -7,6 +7,7 @@
 
 #include <array>
 
+#include "core/log_lines.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
 
@@ -39,15 +40,21 @@ inline constexpr char kCreateLog[] =
 struct Step {
   const char* table;
   const char* statement;
-  const char* trace;  // format of the entry line: source, line, function
+  const char* trace;  // format of the entry line: source, number, function
   LogMask mask;       // of that line; it really differs between the steps
+  int entryLine;
+  int failedLine;
 };
 
 inline constexpr std::array<Step, 4> kSteps{{
-    {names::kClientInfoTable, kCreateClientInfo, "%s:%d ==> %s[init client table]", kCoreTrace},
-    {names::kTokenTable, kCreateToken, "%s:%d ==> %s[init token table]", kStoreTrace},
-    {names::kGrantCodeTable, kCreateGrantCode, "%s:%d ==> %s[init grantCode table]", kStoreTrace},
-    {names::kLogTable, kCreateLog, "%s:%d ==> %s[init log table]", kStoreTrace},
+    {names::kClientInfoTable, kCreateClientInfo, "%s:%d ==> %s[init client table]", kCoreTrace,
+     line::kInitClientEntry, line::kCreateClientFailed},
+    {names::kTokenTable, kCreateToken, "%s:%d ==> %s[init token table]", kStoreTrace,
+     line::kInitTokenEntry, line::kCreateTokenFailed},
+    {names::kGrantCodeTable, kCreateGrantCode, "%s:%d ==> %s[init grantCode table]", kStoreTrace,
+     line::kInitGrantCodeEntry, line::kCreateGrantCodeFailed},
+    {names::kLogTable, kCreateLog, "%s:%d ==> %s[init log table]", kStoreTrace, line::kInitLogEntry,
+     line::kCreateLogFailed},
 }};
 
 /// The tables that get a row in the meta table when it is created, each with

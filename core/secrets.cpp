@@ -5,6 +5,7 @@
 #include <cstring>
 #include <string>
 
+#include "core/log_lines.h"
 #include "platform/keldcore.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
@@ -25,40 +26,54 @@ bool convertText(PlatformCipher cipher, const std::string& in, std::string& out)
 
 bool EncryptText(const char* source, const std::string& in, std::string& out) {
   if (convertText(KCORECryptSzEncrypt, in, out)) return true;
-  syslog(LOG_ERR, "%s:%d Data Encrypt failed", source, __LINE__);
+  syslog(LOG_ERR, "%s:%d Data Encrypt failed", source, line::kEncryptFailed);
   return false;
 }
 
 bool DecryptText(const char* source, const std::string& in, std::string& out) {
   if (convertText(KCORECryptSzDecrypt, in, out)) return true;
-  syslog(LOG_ERR, "%s:%d Data Decrypt failed", source, __LINE__);
+  syslog(LOG_ERR, "%s:%d Data Decrypt failed", source, line::kDecryptFailed);
   return false;
 }
 
-using Conversion = bool (*)(const char*, const std::string&, std::string&);
+/// A column to convert, with its trace.
+struct Secret {
+  const char* column;
+  const char* trace;  // format of the line: source, number, operation
+  int encryptLine;
+  int decryptLine;
+};
 
-bool convertMember(const char* source, Conversion convert, Json::Value& value) {
-  std::string text;
-  if (!convert(source, value.asString(), text)) return false;
-  value = text;
-  return true;
-}
+/// In the order in which they are converted.
+constexpr std::array<Secret, 2> kSecrets{{
+    {names::kClientId, "%s:%d ==> %s[client_id]", line::kEncryptClientIdEntry,
+     line::kDecryptClientIdEntry},
+    {names::kClientSecret, "%s:%d ==> %s[client_secret]", line::kEncryptClientSecretEntry,
+     line::kDecryptClientSecretEntry},
+}};
 
-bool convertSecrets(const char* source, Conversion convert, const char* operation,
-                    Json::Value& doc) {
+/// One of the two directions.
+struct Conversion {
+  const char* operation;
+  bool (*convert)(const char* source, const std::string& in, std::string& out);
+  int Secret::*line;
+};
+
+constexpr Conversion kEncryption{"ParamEncrypt", EncryptText, &Secret::encryptLine};
+constexpr Conversion kDecryption{"ParamDecrypt", DecryptText, &Secret::decryptLine};
+
+bool convertSecrets(const char* source, const Conversion& conversion, Json::Value& doc) {
   if (!doc.isObject()) return true;
 
-  if (doc.isMember(names::kClientId)) {
+  for (const Secret& secret : kSecrets) {
+    if (!doc.isMember(secret.column)) continue;
     if (isTraced(kStoreTrace)) {
-      syslog(LOG_ERR, "%s:%d ==> %s[client_id]", source, __LINE__, operation);
+      syslog(LOG_ERR, secret.trace, source, secret.*conversion.line, conversion.operation);
     }
-    if (!convertMember(source, convert, doc[names::kClientId])) return false;
-  }
-  if (doc.isMember(names::kClientSecret)) {
-    if (isTraced(kStoreTrace)) {
-      syslog(LOG_ERR, "%s:%d ==> %s[client_secret]", source, __LINE__, operation);
-    }
-    if (!convertMember(source, convert, doc[names::kClientSecret])) return false;
+    Json::Value& value = doc[secret.column];
+    std::string text;
+    if (!conversion.convert(source, value.asString(), text)) return false;
+    value = text;
   }
   return true;
 }
@@ -66,11 +81,11 @@ bool convertSecrets(const char* source, Conversion convert, const char* operatio
 }  // namespace
 
 bool encryptSecrets(const char* source, Json::Value& doc) {
-  return convertSecrets(source, EncryptText, "ParamEncrypt", doc);
+  return convertSecrets(source, kEncryption, doc);
 }
 
 bool decryptSecrets(const char* source, Json::Value& doc) {
-  return convertSecrets(source, DecryptText, "ParamDecrypt", doc);
+  return convertSecrets(source, kDecryption, doc);
 }
 
 }  // namespace KELDOAUTHSERVER

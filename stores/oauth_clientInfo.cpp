@@ -3,6 +3,7 @@
 #include <syslog.h>
 
 #include <exception>
+#include <optional>
 
 #include "core/oauth_errors.h"
 #include "stores/oauth_log.h"
@@ -32,6 +33,20 @@ enum Line : int {
   kGetByClientIdBadLine = 180,
   kGetByIdLine = 192,
   kGetAllLine = 202,
+
+  // "Unexpected failure"
+  kAuditThrew = 901,
+  kAddThrew = 902,
+  kAddGeneratedThrew = 903,
+  kAddWithSecretThrew = 904,
+  kEditThrew = 905,
+  kEnableThrew = 906,
+  kDisableThrew = 907,
+  kDelThrew = 908,
+  kGetByClientIdThrew = 909,
+  kGetIndexThrew = 910,
+  kGetByIdThrew = 911,
+  kGetAllThrew = 912,
 };
 
 constexpr char kEnabled[] = "1";
@@ -53,7 +68,7 @@ void writeAuditEntry(OAUTHDBLog& log, const std::string& displayName) {
   try {
     log.Add("Application registed[" + displayName + "]");
   } catch (const std::exception& thrown) {
-    syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", kSource, __LINE__, thrown.what());
+    syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", kSource, kAuditThrew, thrown.what());
   }
 }
 
@@ -69,6 +84,9 @@ OAUTHDBClientInfo::OAUTHDBClientInfo(const std::string& tableName) {
   SetTabName(tableName);
 }
 
+OAUTHDBClientInfo::OAUTHDBClientInfo(const std::string& tableName, OAUTHDBBasic& store)
+    : OAUTHDBBasic(tableName, store) {}
+
 // Registration ----------------------------------------------------------------
 
 int OAUTHDBClientInfo::Add(const std::string& client_id, const std::string& client_secret,
@@ -76,20 +94,19 @@ int OAUTHDBClientInfo::Add(const std::string& client_id, const std::string& clie
                            const std::string& display_name, const std::string& enable,
                            Json::Value& out) try {
   traceEntry(kStoreTrace, kSource, kAddLine, "Add");
-  OAUTHDBLog log(names::kLogTable);
+  std::optional<OAUTHDBLog> log;
+  IsLent() ? log.emplace(names::kLogTable, *this) : log.emplace(names::kLogTable);
   const std::string address = withoutScheme(redirect_uri);
 
   if (DBCheckRowMax(static_cast<unsigned long>(getTableRowMax(names::kClientInfoMax))) == 0) {
-    Fail(errors::kClientInfoFull);
     syslog(LOG_ERR, "%s:%d ClientInfo Table is full", kSource, kAddFullLine);
-    return 0;
+    return Fail(errors::kClientInfoFull);
   }
   if (!fits(client_id, bounds::kIdentifier) || !fits(client_secret, bounds::kIdentifier) ||
       !fits(address, bounds::kRedirectUri) || !fits(scope, bounds::kScope) ||
       !fits(display_name, bounds::kDisplayName) || (enable != kEnabled && enable != kDisabled)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kAddBadLine);
-    return 0;
+    return Fail(errors::kBadParameters);
   }
 
   Json::Value row;
@@ -105,10 +122,10 @@ int OAUTHDBClientInfo::Add(const std::string& client_id, const std::string& clie
   out[names::kClientSecret] = client_secret;
 
   if (!DBAdd(row)) return 0;
-  writeAuditEntry(log, display_name);
+  writeAuditEntry(*log, display_name);
   return 1;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kAddThrew);
 }
 
 int OAUTHDBClientInfo::Add(const std::string& redirect_uri, const std::string& scope,
@@ -117,7 +134,7 @@ int OAUTHDBClientInfo::Add(const std::string& redirect_uri, const std::string& s
   const std::string client_secret = getRandomStr(kIdentifierLength);
   return Add(client_id, client_secret, redirect_uri, scope, display_name, kEnabled, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kAddGeneratedThrew);
 }
 
 int OAUTHDBClientInfo::Add(const std::string& client_secret, const std::string& redirect_uri,
@@ -126,7 +143,7 @@ int OAUTHDBClientInfo::Add(const std::string& client_secret, const std::string& 
   const std::string client_id = getRandomStr(kIdentifierLength);
   return Add(client_id, client_secret, redirect_uri, scope, display_name, kEnabled, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kAddWithSecretThrew);
 }
 
 // Changes ---------------------------------------------------------------------
@@ -136,9 +153,8 @@ int OAUTHDBClientInfo::Edit(long long id, const std::string& redirect_uri, const
   traceEntry(kStoreTrace, kSource, kEditLine, "Edit");
   if (!fits(redirect_uri, bounds::kRedirectUri) || !fits(scope, bounds::kScope) ||
       !fits(display_name, bounds::kDisplayName)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kEditBadLine);
-    return 0;
+    return Fail(errors::kBadParameters);
   }
   Json::Value request = requestById(id);
   Json::Value& modified = request[names::kModified];
@@ -147,7 +163,7 @@ int OAUTHDBClientInfo::Edit(long long id, const std::string& redirect_uri, const
   modified[names::kDisplayName] = quoteSql(display_name);
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kEditThrew);
 }
 
 int OAUTHDBClientInfo::Enable(long long id) try {
@@ -155,7 +171,7 @@ int OAUTHDBClientInfo::Enable(long long id) try {
   Json::Value request = requestEnable(id, kEnabled);
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kEnableThrew);
 }
 
 int OAUTHDBClientInfo::Disable(long long id) try {
@@ -163,7 +179,7 @@ int OAUTHDBClientInfo::Disable(long long id) try {
   Json::Value request = requestEnable(id, kDisabled);
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kDisableThrew);
 }
 
 int OAUTHDBClientInfo::Del(long long id) try {
@@ -171,7 +187,7 @@ int OAUTHDBClientInfo::Del(long long id) try {
   Json::Value request = requestById(id);
   return DBDel(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kDelThrew);
 }
 
 // Look-ups --------------------------------------------------------------------
@@ -179,14 +195,13 @@ int OAUTHDBClientInfo::Del(long long id) try {
 int OAUTHDBClientInfo::Get(const std::string& client_id, Json::Value* out) try {
   traceEntry(kStoreTrace, kSource, kGetByClientIdLine, "Get");
   if (!fits(client_id, bounds::kIdentifier)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kGetByClientIdBadLine);
-    return 0;
+    return Fail(errors::kBadParameters);
   }
   Json::Value request = requestBy(names::kClientId, quoteSql(client_id));
   return DBGet(request, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByClientIdThrew);
 }
 
 int OAUTHDBClientInfo::GetIndex(const std::string& client_id) try {
@@ -194,7 +209,7 @@ int OAUTHDBClientInfo::GetIndex(const std::string& client_id) try {
   Json::Value rows(Json::arrayValue);
   return Get(client_id, &rows) != 0 ? firstId(rows) : 0;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetIndexThrew);
 }
 
 int OAUTHDBClientInfo::Get(long long id, Json::Value* out) try {
@@ -202,7 +217,7 @@ int OAUTHDBClientInfo::Get(long long id, Json::Value* out) try {
   Json::Value request = requestById(id);
   return DBGet(request, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByIdThrew);
 }
 
 int OAUTHDBClientInfo::Get(Json::Value* out) try {
@@ -210,7 +225,7 @@ int OAUTHDBClientInfo::Get(Json::Value* out) try {
   Json::Value request;
   return DBGet(request, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetAllThrew);
 }
 
 }  // namespace KELDOAUTHSERVER

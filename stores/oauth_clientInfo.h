@@ -21,10 +21,19 @@ class OAUTHDBClientInfo : public OAUTHDBBasic {
   /// `tableName` is names::kClientInfoTable.
   explicit OAUTHDBClientInfo(const std::string& tableName);
 
+  /// On the connection of `store`, which must outlive this object: nothing is
+  /// opened, created or closed, and a transaction that is begun through one
+  /// holds for both. Ready when `store` is, at this moment; the error state is
+  /// this object's own.
+  OAUTHDBClientInfo(const std::string& tableName, OAUTHDBBasic& store);
+
   // Registration ------------------------------------------------------------
 
   /// Registers an application and writes the audit entry
-  /// "Application registed[<display_name>]". Lengths in bytes:
+  /// "Application registed[<display_name>]", on a connection of its own, or, if
+  /// this object works on another's, on that one and in its transaction. (So an
+  /// object that has a connection of its own and a transaction open registers
+  /// without an entry: the entry waits for the transaction's lock.) Lengths in bytes:
   ///   client_id      64, not yet registered
   ///   client_secret  64
   ///   redirect_uri   3 to 2048 after one leading "https://" or "http://" is

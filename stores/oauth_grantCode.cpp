@@ -33,6 +33,19 @@ enum Line : int {
   kGetByIdLine = 206,
   kGetAllLine = 216,
   kPurgeLine = 225,
+
+  // "Unexpected failure"
+  kAddThrew = 901,
+  kAddGeneratedThrew = 902,
+  kEditThrew = 903,
+  kEditWithExpiryThrew = 904,
+  kRevokeThrew = 905,
+  kDelThrew = 906,
+  kPurgeThrew = 907,
+  kGetByCodeThrew = 908,
+  kGetIndexThrew = 909,
+  kGetByIdThrew = 910,
+  kGetAllThrew = 911,
 };
 
 /// Issuing and editing leave the object's error as it was.
@@ -47,6 +60,9 @@ OAUTHDBGrantCode::OAUTHDBGrantCode(const std::string& tableName) {
   SetTabName(tableName);
 }
 
+OAUTHDBGrantCode::OAUTHDBGrantCode(const std::string& tableName, OAUTHDBBasic& store)
+    : OAUTHDBBasic(tableName, store) {}
+
 // Issuing ---------------------------------------------------------------------
 
 int OAUTHDBGrantCode::Add(const std::string& username, const std::string& client_id,
@@ -57,9 +73,8 @@ int OAUTHDBGrantCode::Add(const std::string& username, const std::string& client
   const int badAddress = addressError(ip);
 
   if (DBCheckRowMax(static_cast<unsigned long>(getTableRowMax(names::kGrantCodeMax))) == 0) {
-    Fail(errors::kGrantCodeFull);
     syslog(LOG_ERR, "%s:%d GrantCode Table is full", kSource, kAddFullLine);
-    return 0;
+    return Fail(errors::kGrantCodeFull);
   }
   if (!ip.empty() && badAddress != 0) {
     syslog(LOG_ERR, "%s:%d Bad IP address[%s]", kSource, kAddBadAddressLine,
@@ -85,7 +100,7 @@ int OAUTHDBGrantCode::Add(const std::string& username, const std::string& client
   out[names::kCode] = code;
   return DBAdd(row);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kAddThrew);
 }
 
 int OAUTHDBGrantCode::Add(const std::string& username, const std::string& client_id,
@@ -95,7 +110,7 @@ int OAUTHDBGrantCode::Add(const std::string& username, const std::string& client
   const std::string code = getRandomStr(kIdentifierLength);
   return Add(username, client_id, scope, code, std::to_string(expiry), state, ip, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kAddGeneratedThrew);
 }
 
 // Changes ---------------------------------------------------------------------
@@ -114,7 +129,7 @@ int OAUTHDBGrantCode::Edit(long long id, const std::string& username, const std:
   modified[names::kState] = state;
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kEditThrew);
 }
 
 int OAUTHDBGrantCode::Edit(long long id, const std::string& username, const std::string& client_id,
@@ -135,7 +150,7 @@ int OAUTHDBGrantCode::Edit(long long id, const std::string& username, const std:
   modified[names::kExpiredTime] = expired_time;
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kEditWithExpiryThrew);
 }
 
 int OAUTHDBGrantCode::Revoke(long long id) try {
@@ -144,7 +159,7 @@ int OAUTHDBGrantCode::Revoke(long long id) try {
   request[names::kModified][names::kExpiredTime] = std::to_string(currentTime());
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kRevokeThrew);
 }
 
 int OAUTHDBGrantCode::Del(long long id) try {
@@ -152,7 +167,7 @@ int OAUTHDBGrantCode::Del(long long id) try {
   Json::Value request = requestById(id);
   return DBDel(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kDelThrew);
 }
 
 int OAUTHDBGrantCode::Purge() try {
@@ -162,7 +177,7 @@ int OAUTHDBGrantCode::Purge() try {
   if (Get(&rows) == 0) return 1;
   return removeAll(*this, expiredIds(rows, now), [this](long long id) { return Del(id) != 0; });
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kPurgeThrew);
 }
 
 // Look-ups --------------------------------------------------------------------
@@ -176,7 +191,7 @@ int OAUTHDBGrantCode::Get(const std::string& code, Json::Value* out) try {
   Json::Value request = requestBy(names::kCode, code);
   return DBGet(request, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByCodeThrew);
 }
 
 int OAUTHDBGrantCode::GetIndex(const std::string& code) try {
@@ -184,7 +199,7 @@ int OAUTHDBGrantCode::GetIndex(const std::string& code) try {
   Json::Value rows(Json::arrayValue);
   return Get(code, &rows) != 0 ? firstId(rows) : 0;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetIndexThrew);
 }
 
 int OAUTHDBGrantCode::Get(long long id, Json::Value* out) try {
@@ -192,7 +207,7 @@ int OAUTHDBGrantCode::Get(long long id, Json::Value* out) try {
   Json::Value request = requestById(id);
   return DBGet(request, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByIdThrew);
 }
 
 int OAUTHDBGrantCode::Get(Json::Value* out) try {
@@ -200,7 +215,7 @@ int OAUTHDBGrantCode::Get(Json::Value* out) try {
   Json::Value request;
   return DBGet(request, out);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetAllThrew);
 }
 
 }  // namespace KELDOAUTHSERVER

@@ -33,6 +33,12 @@ class OAUTHDBGrantCode : public OAUTHDBBasic {
   /// `tableName` is names::kGrantCodeTable.
   explicit OAUTHDBGrantCode(const std::string& tableName);
 
+  /// On the connection of `store`, which must outlive this object: nothing is
+  /// opened, created or closed, and a transaction that is begun through one
+  /// holds for both. Ready when `store` is, at this moment; the error state is
+  /// this object's own.
+  OAUTHDBGrantCode(const std::string& tableName, OAUTHDBBasic& store);
+
   // Issuing -----------------------------------------------------------------
 
   /// Stores a code. Lengths in bytes:

@@ -20,6 +20,11 @@ enum Line : int {
   kRotateFailedLine = 32,
   kDelLine = 41,
   kGetLine = 51,
+
+  // "Unexpected failure"
+  kAddThrew = 901,
+  kGetThrew = 902,
+  kDelThrew = 903,
 };
 
 /// Keyed on the time stamp, so that one second is kept or trimmed as a whole.
@@ -48,6 +53,9 @@ OAUTHDBLog::OAUTHDBLog(const std::string& tableName) {
   SetTabName(tableName);
 }
 
+OAUTHDBLog::OAUTHDBLog(const std::string& tableName, OAUTHDBBasic& store)
+    : OAUTHDBBasic(tableName, store) {}
+
 int OAUTHDBLog::Add(const std::string& msg) try {
   traceEntry(kStoreTrace, kSource, kAddLine, "Add");
   Json::Value row;
@@ -58,7 +66,7 @@ int OAUTHDBLog::Add(const std::string& msg) try {
   rotate(*this);
   return added;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kAddThrew);
 }
 
 int OAUTHDBLog::Get(const std::string& filter, const std::string& option, Json::Value* rows) try {
@@ -69,7 +77,7 @@ int OAUTHDBLog::Get(const std::string& filter, const std::string& option, Json::
   if (!filter.empty()) request[names::kConditionLike] = likeSql(names::kMsg, filter);
   return DBGet(request, rows);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetThrew);
 }
 
 int OAUTHDBLog::Del() try {
@@ -78,7 +86,7 @@ int OAUTHDBLog::Del() try {
   request[names::kCondition] = Json::Value();
   return DBDel(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kDelThrew);
 }
 
 }  // namespace KELDOAUTHSERVER

@@ -15,6 +15,12 @@ class OAUTHDBLog : public OAUTHDBBasic {
   /// `tableName` is names::kLogTable.
   explicit OAUTHDBLog(const std::string& tableName);
 
+  /// On the connection of `store`, which must outlive this object: nothing is
+  /// opened, created or closed, and a transaction that is begun through one
+  /// holds for both. Ready when `store` is, at this moment; the error state is
+  /// this object's own.
+  OAUTHDBLog(const std::string& tableName, OAUTHDBBasic& store);
+
   /// Stores `msg`, of any length, with the current time, then deletes what lies
   /// beyond the newest rows that names::kLogMax allows. Non-zero when the row
   /// was stored; 0 with SQLite's code and text otherwise.

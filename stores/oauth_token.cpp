@@ -40,6 +40,20 @@ enum Line : int {
   kGetAllLine = 252,
   kPurgeLine = 261,
   kVerifyLine = 282,
+
+  // "Unexpected failure"
+  kIssueThrew = 901,
+  kStoreThrew = 902,
+  kEditThrew = 903,
+  kEditWithExpiryThrew = 904,
+  kDelThrew = 905,
+  kPurgeThrew = 906,
+  kGetByAccessThrew = 907,
+  kGetByRefreshThrew = 908,
+  kGetIndexThrew = 909,
+  kGetByIdThrew = 910,
+  kGetAllThrew = 911,
+  kVerifyThrew = 912,
 };
 
 void logBadParameters(Line line) {
@@ -51,6 +65,9 @@ void logBadParameters(Line line) {
 OAUTHDBToken::OAUTHDBToken(const std::string& tableName) {
   SetTabName(tableName);
 }
+
+OAUTHDBToken::OAUTHDBToken(const std::string& tableName, OAUTHDBBasic& store)
+    : OAUTHDBBasic(tableName, store) {}
 
 // Issuing ---------------------------------------------------------------------
 
@@ -64,7 +81,7 @@ int OAUTHDBToken::Add(const std::string& username, const std::string& client_id,
   return Add(username, client_id, scope, refresh_token, access_token, std::to_string(expiry),
              flow_type, state, ip, result);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kIssueThrew);
 }
 
 bool OAUTHDBToken::Add(const std::string& username, const std::string& client_id,
@@ -76,9 +93,8 @@ bool OAUTHDBToken::Add(const std::string& username, const std::string& client_id
   const int badAddress = addressError(ip);
 
   if (DBCheckRowMax(static_cast<unsigned long>(getTableRowMax(names::kTokenMax))) == 0) {
-    Fail(errors::kTokenFull);
     syslog(LOG_ERR, "%s:%d Token Table is full", kSource, kStoreFullLine);
-    return false;
+    return Fail(errors::kTokenFull);
   }
   if (!ip.empty() && badAddress != 0) {
     syslog(LOG_ERR, "%s:%d Bad IP address[%s]", kSource, kStoreBadAddressLine,
@@ -89,9 +105,8 @@ bool OAUTHDBToken::Add(const std::string& username, const std::string& client_id
       !fits(scope, bounds::kScope) || !fits(refresh_token, bounds::kIdentifier) ||
       !fits(access_token, bounds::kIdentifier) || !fits(expired_time, bounds::kExpiredTime) ||
       !fits(flow_type, bounds::kFlowType) || !fits(state, bounds::kState)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kStoreBadLine);
-    return false;
+    return Fail(errors::kBadParameters);
   }
 
   Json::Value row;
@@ -110,7 +125,7 @@ bool OAUTHDBToken::Add(const std::string& username, const std::string& client_id
   result[names::kAccessToken] = access_token;
   return DBAdd(row);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kStoreThrew);
 }
 
 // Changes ---------------------------------------------------------------------
@@ -122,9 +137,8 @@ bool OAUTHDBToken::Edit(long long id, const std::string& username, const std::st
   if (!fits(username, bounds::kUsername) || !fits(client_id, bounds::kIdentifier) ||
       !fits(scope, bounds::kScope) || !fits(flow_type, bounds::kFlowType) ||
       !fits(state, bounds::kState)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kEditBadLine);
-    return false;
+    return Fail(errors::kBadParameters);
   }
   Json::Value request = requestById(id);
   Json::Value& modified = request[names::kModified];
@@ -135,7 +149,7 @@ bool OAUTHDBToken::Edit(long long id, const std::string& username, const std::st
   modified[names::kFlowType] = flow_type;
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kEditThrew);
 }
 
 bool OAUTHDBToken::Edit(long long id, const std::string& username, const std::string& client_id,
@@ -145,9 +159,8 @@ bool OAUTHDBToken::Edit(long long id, const std::string& username, const std::st
   if (!fits(username, bounds::kUsername) || !fits(client_id, bounds::kIdentifier) ||
       !fits(scope, bounds::kScope) || !fits(expired_time, bounds::kExpiredTime) ||
       !fits(flow_type, bounds::kFlowType) || !fits(state, bounds::kState)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kEditWithExpiryBadLine);
-    return false;
+    return Fail(errors::kBadParameters);
   }
   Json::Value request = requestById(id);
   Json::Value& modified = request[names::kModified];
@@ -159,7 +172,7 @@ bool OAUTHDBToken::Edit(long long id, const std::string& username, const std::st
   modified[names::kExpiredTime] = expired_time;
   return DBEdit(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kEditWithExpiryThrew);
 }
 
 bool OAUTHDBToken::Del(long long id) try {
@@ -167,7 +180,7 @@ bool OAUTHDBToken::Del(long long id) try {
   Json::Value request = requestById(id);
   return DBDel(request);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kDelThrew);
 }
 
 bool OAUTHDBToken::Revoke(long long id) {
@@ -182,7 +195,7 @@ bool OAUTHDBToken::Purge() try {
   if (!Get(&rows)) return true;
   return removeAll(*this, expiredIds(rows, now), [this](long long id) { return Del(id); });
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kPurgeThrew);
 }
 
 // Look-ups --------------------------------------------------------------------
@@ -190,27 +203,25 @@ bool OAUTHDBToken::Purge() try {
 bool OAUTHDBToken::GetWithAccessToken(const std::string& access_token, Json::Value* rows) try {
   traceEntry(kStoreTrace, kSource, kGetByAccessLine, "GetWithAccessToken");
   if (!fits(access_token, bounds::kIdentifier)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kGetByAccessBadLine);
-    return false;
+    return Fail(errors::kBadParameters);
   }
   Json::Value request = requestBy(names::kAccessToken, quoteSql(access_token));
   return DBGet(request, rows);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByAccessThrew);
 }
 
 bool OAUTHDBToken::GetWithRefreshToken(const std::string& refresh_token, Json::Value* rows) try {
   traceEntry(kStoreTrace, kSource, kGetByRefreshLine, "GetWithRefreshToken");
   if (!fits(refresh_token, bounds::kIdentifier)) {
-    Fail(errors::kBadParameters);
     logBadParameters(kGetByRefreshBadLine);
-    return false;
+    return Fail(errors::kBadParameters);
   }
   Json::Value request = requestBy(names::kRefreshToken, quoteSql(refresh_token));
   return DBGet(request, rows);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByRefreshThrew);
 }
 
 int OAUTHDBToken::GetIndex(const std::string& access_token) try {
@@ -218,7 +229,7 @@ int OAUTHDBToken::GetIndex(const std::string& access_token) try {
   Json::Value rows(Json::arrayValue);
   return GetWithAccessToken(access_token, &rows) ? firstId(rows) : 0;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetIndexThrew);
 }
 
 bool OAUTHDBToken::Get(long long id, Json::Value* rows) try {
@@ -226,7 +237,7 @@ bool OAUTHDBToken::Get(long long id, Json::Value* rows) try {
   Json::Value request = requestById(id);
   return DBGet(request, rows);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetByIdThrew);
 }
 
 bool OAUTHDBToken::Get(Json::Value* rows) try {
@@ -234,7 +245,7 @@ bool OAUTHDBToken::Get(Json::Value* rows) try {
   Json::Value request;
   return DBGet(request, rows);
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kGetAllThrew);
 }
 
 // Verification ----------------------------------------------------------------
@@ -259,7 +270,7 @@ bool OAUTHDBToken::Verify(const std::string& access_token, Json::Value& result) 
   }
   return true;
 } catch (...) {
-  return FailUnexpectedly(kSource, __LINE__);
+  return FailUnexpectedly(kSource, kVerifyThrew);
 }
 
 }  // namespace KELDOAUTHSERVER

@@ -24,6 +24,12 @@ class OAUTHDBToken : public OAUTHDBBasic {
   /// `tableName` is names::kTokenTable.
   explicit OAUTHDBToken(const std::string& tableName);
 
+  /// On the connection of `store`, which must outlive this object: nothing is
+  /// opened, created or closed, and a transaction that is begun through one
+  /// holds for both. Ready when `store` is, at this moment; the error state is
+  /// this object's own.
+  OAUTHDBToken(const std::string& tableName, OAUTHDBBasic& store);
+
   // Issuing -----------------------------------------------------------------
 
   /// Issues a pair of generated tokens that expires names::kTokenExpired

@@ -7,6 +7,7 @@
 #include <cstring>
 #include <ctime>
 
+#include "core/oauth_errors.h"
 #include "utils/decimal.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
@@ -57,6 +58,17 @@ std::vector<long long> expiredIds(const Json::Value& rows, long long now) {
     if (decimalValue(row[names::kExpiredTime]) < now) ids.push_back(decimalValue(row[names::kId]));
   }
   return ids;
+}
+
+bool beginPurge(Transaction& transaction, OAUTHDBBasic& store) {
+  const int code = store.GetErrCode();
+  const std::string message = store.GetErrMsg();
+  if (transaction.Begin()) return true;
+  if (store.GetErrCode() == errors::kBusy) return false;
+
+  store.SetErrCode(code);
+  store.SetErrMsg(message);
+  return true;
 }
 
 int addressError(const std::string& ip) {

@@ -10,29 +10,10 @@
 #include <vector>
 
 #include "core/oauth_db_basic.h"
-#include "stores/transaction.h"
+#include "core/transaction.h"
+#include "utils/oauth_bounds.h"
 
 namespace KELDOAUTHSERVER {
-
-/// The bounds of an argument, in bytes, both included.
-struct Bounds {
-  int min;
-  int max;
-};
-
-namespace bounds {
-inline constexpr Bounds kIdentifier{64, 64};  // client identifiers, secrets, codes, tokens
-inline constexpr Bounds kUsername{1, 256};
-inline constexpr Bounds kRedirectUri{3, 2048};
-inline constexpr Bounds kScope{1, 2048};
-inline constexpr Bounds kState{1, 2048};
-inline constexpr Bounds kDisplayName{1, 64};
-inline constexpr Bounds kExpiredTime{1, 128};
-inline constexpr Bounds kFlowType{1, 32};
-}  // namespace bounds
-
-/// What getRandomStr is asked for.
-inline constexpr unsigned int kIdentifierLength = 64;
 
 /// checkStrLen with the bounds in one piece.
 bool fits(const std::string& text, const Bounds& bounds);
@@ -57,20 +38,28 @@ int addressError(const std::string& ip);
 /// The ids of the rows whose expiry lies before `now`, in the order of `rows`.
 std::vector<long long> expiredIds(const Json::Value& rows, long long now);
 
+/// Begins the transaction of a purge. False when another process held the lock
+/// for the whole wait, with that error on `store`: to try row by row would wait
+/// as long for each. Refused for another reason, the removals stand each for
+/// itself, and the error of `store` stays as it was.
+bool beginPurge(Transaction& transaction, OAUTHDBBasic& store);
+
 /// Calls `remove(id)` for each of `ids` in order. Several removals share one
-/// transaction of `store`; where it is refused they run one by one, and where
-/// it is lost nothing is removed. True unless a removal or the commit failed.
+/// transaction of `store`; where it is refused they run one by one (but see
+/// beginPurge), and where it is lost nothing is removed. True unless a removal
+/// or the commit failed.
 template <typename Remove>
 bool removeAll(OAUTHDBBasic& store, const std::vector<long long>& ids, Remove remove) {
   Transaction transaction(store);
-  if (ids.size() > 1) transaction.begin();
+  if (ids.size() > 1 && !beginPurge(transaction, store)) return false;
 
+  const bool together = transaction.IsOpen();
   bool done = true;
   for (const long long id : ids) {
-    if (transaction.isLost()) break;
+    if (transaction.IsLost()) break;
     if (!remove(id)) done = false;
   }
-  return transaction.commit() && done;
+  return (!together || transaction.Commit()) && done;
 }
 
 }  // namespace KELDOAUTHSERVER

@@ -27,6 +27,12 @@ namespace {
 
 constexpr char kSource[] = "oauth_utils";
 
+/// The numbers that this source's lines carry.
+enum Line : int {
+  kNoSqlTextLine = 101,
+  kCheckStrLenLine = 102,
+};
+
 constexpr int kDefaultPeriodSeconds = 600;
 constexpr int kDefaultRowMax = 1000;
 constexpr int kHighestRowMax = 10000;
@@ -105,7 +111,7 @@ int readSettingInt(const std::string& key) {
 // SQL text ------------------------------------------------------------------
 
 void logNoSqlFormat() {
-  syslog(LOG_ERR, "%s:%d Can't transfer to SQL format", kSource, __LINE__);
+  syslog(LOG_ERR, "%s:%d Can't transfer to SQL format", kSource, kNoSqlTextLine);
 }
 
 std::string copyFormatted(const SqliteText& text) {
@@ -232,7 +238,7 @@ std::string getSQLFormatLikeStr(const std::string& column, const std::string& va
 
 bool checkStrLen(const std::string& str, int min, int max, bool allowEmpty) {
   if (isTraced(kLengthCheck)) {
-    syslog(LOG_ERR, "%s:%d %s[%s]", kSource, __LINE__, __func__, str.c_str());
+    syslog(LOG_ERR, "%s:%d %s[%s]", kSource, kCheckStrLenLine, __func__, str.c_str());
   }
   const int length = static_cast<int>(str.size());
   if (allowEmpty && length == 0) return true;

@@ -39,6 +39,7 @@ struct Members {
   std::string errorMessage;
   std::string tableName;
   void* database;
+  void* lender;
 };
 
 // Classes -----------------------------------------------------------------------
@@ -126,8 +127,19 @@ TEST_F(MembersTest, TableNameIsTheFourth) {
   EXPECT_THAT(bytesOfStringAt(offsetof(Members, tableName)), HasSubstr("marker"));
 }
 
-TEST_F(MembersTest, ConnectionIsTheLast) {
+TEST_F(MembersTest, ConnectionIsTheFifth) {
   EXPECT_NE(memberAt<void*>(offsetof(Members, database)), nullptr);
+}
+
+TEST_F(MembersTest, OwnerOfALentConnectionIsTheLast) {
+  EXPECT_EQ(memberAt<void*>(offsetof(Members, lender)), nullptr);
+  void* const connection = memberAt<void*>(offsetof(Members, database));
+  OAUTHDBToken owner("oauth_token");
+  store_->~OAUTHDBToken();
+  store_ = new (memory_) OAUTHDBToken("oauth_token", owner);
+  EXPECT_EQ(memberAt<void*>(offsetof(Members, lender)), &owner);
+  EXPECT_NE(memberAt<void*>(offsetof(Members, database)), connection);
+  EXPECT_EQ(memberAt<int>(offsetof(Members, ready)), 1);
 }
 
 TEST_F(MembersTest, FailedOpenLeavesNeitherConnectionNorReadiness) {
@@ -141,10 +153,11 @@ TEST_F(MembersTest, FailedOpenLeavesNeitherConnectionNorReadiness) {
 
 // Headers -----------------------------------------------------------------------
 
-const char* const kPublicHeaders[] = {"core/oauth_db_basic.h",     "core/oauth_errors.h",
-                                      "stores/oauth_clientInfo.h", "stores/oauth_grantCode.h",
-                                      "stores/oauth_log.h",        "stores/oauth_token.h",
-                                      "utils/oauth_names.h",       "utils/oauth_utils.h"};
+const char* const kPublicHeaders[] = {"core/oauth_db_basic.h",    "core/oauth_errors.h",
+                                      "core/transaction.h",       "stores/oauth_clientInfo.h",
+                                      "stores/oauth_grantCode.h", "stores/oauth_log.h",
+                                      "stores/oauth_token.h",     "utils/oauth_bounds.h",
+                                      "utils/oauth_names.h",      "utils/oauth_utils.h"};
 
 class HeaderTest : public ::testing::TestWithParam<const char*> {
  protected:
