@@ -21,6 +21,8 @@
 #include <memory>
 #include <sstream>
 
+#include "core/oauth_db_basic.h"
+
 namespace cli {
 namespace {
 
@@ -198,6 +200,10 @@ Json::Value CliTest::json(Arguments arguments, const std::string& input, int exi
   EXPECT_TRUE(reader->parse(begin, begin + outcome.out.size(), &document, &errors))
       << errors << outcome.out;
   return document;
+}
+
+void CliTest::makeStore() {
+  const KELDOAUTHSERVER::OAUTHDBBasic store;
 }
 
 Json::Value CliTest::addClient(const std::string& name) {

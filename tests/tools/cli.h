@@ -74,6 +74,9 @@ class CliTest : public support::World {
   /// the exit status is `exit`.
   static Json::Value json(Arguments arguments, const std::string& input = {}, int exit = kOk);
 
+  /// An empty store, as the service's first use leaves it.
+  static void makeStore();
+
   /// Registers a client and returns the answer's "client".
   static Json::Value addClient(const std::string& name = "Photo Frame");
   /// Issues to client 1, which must exist; `more` are further arguments.

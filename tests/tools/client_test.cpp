@@ -151,6 +151,7 @@ TEST_F(ClientCommand, AddToAFullTable) {
 // list and show -----------------------------------------------------------------
 
 TEST_F(ClientCommand, ListOfNone) {
+  makeStore();
   EXPECT_EQ(run({"client", "list"}).out, "No clients.\n");
   EXPECT_EQ(json({"client", "list"})["clients"], Json::Value(Json::arrayValue));
 }
@@ -186,6 +187,7 @@ TEST_F(ClientCommand, ShowMasksTheSecret) {
 }
 
 TEST_F(ClientCommand, UnknownClientsAreNotFound) {
+  addClient();
   for (const std::string client : {"7", "9223372036854775807"}) {
     const Outcome outcome = run({"client", "show", client});
     EXPECT_THAT(outcome, ExitsWith(kNotFound));
@@ -204,6 +206,7 @@ TEST_F(ClientCommand, ADigitsOnlyIdentifierIsNoRowId) {
 }
 
 TEST_F(ClientCommand, OtherNamesOfClientsAreUsageErrors) {
+  makeStore();
   for (const std::string client :
        {"abc", "-1", "1x", "0x1", " 1", "9223372036854775808", "", "+1"}) {
     EXPECT_THAT(run({"client", "show", "--", client}), ExitsWith(kUsage)) << client;
@@ -248,6 +251,7 @@ TEST_F(ClientCommand, EditWithoutAChange) {
 }
 
 TEST_F(ClientCommand, EditOfAnUnknownClient) {
+  makeStore();
   EXPECT_THAT(run({"client", "edit", "1", "--name", "New"}), ExitsWith(kNotFound));
 }
 
@@ -275,6 +279,7 @@ TEST_F(ClientCommand, EnableTwiceIsFine) {
 }
 
 TEST_F(ClientCommand, SwitchingAnUnknownClient) {
+  makeStore();
   EXPECT_THAT(run({"client", "enable", "1"}), ExitsWith(kNotFound));
   EXPECT_THAT(run({"client", "disable", "1"}), ExitsWith(kNotFound));
 }
@@ -297,6 +302,7 @@ TEST_F(ClientCommand, RemoveLeavesCodesAndTokens) {
 }
 
 TEST_F(ClientCommand, RemoveOfAnUnknownClientDoesNotAsk) {
+  makeStore();
   const Outcome outcome = run({"client", "remove", "1"});
   EXPECT_THAT(outcome, ExitsWith(kNotFound));
   EXPECT_THAT(outcome.err, EndsWith("no such client 1\n"));

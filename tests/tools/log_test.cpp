@@ -58,6 +58,7 @@ TEST_F(LogCommand, AddNeedsAMessage) {
 }
 
 TEST_F(LogCommand, ListOfNone) {
+  makeStore();
   EXPECT_EQ(run({"log", "list"}).out, "No entries.\n");
 }
 
@@ -114,6 +115,7 @@ TEST_F(LogCommand, ClearDeletesAll) {
 }
 
 TEST_F(LogCommand, ClearOfAnEmptyLogDoesNotAsk) {
+  makeStore();
   const Outcome cleared = run({"log", "clear"});
   EXPECT_THAT(cleared, ExitsWith(kOk));
   EXPECT_EQ(cleared.out, "The log is empty.\n");

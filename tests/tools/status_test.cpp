@@ -5,7 +5,9 @@
 
 #include <filesystem>
 #include <fstream>
+#include <optional>
 
+#include "tests/faults/small_medium.h"
 #include "tests/tools/cli.h"
 
 namespace cli {
@@ -17,12 +19,27 @@ using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::MatchesRegex;
 using testing::Not;
+using testing::StartsWith;
 
 class Status : public CliTest {
  protected:
+  static constexpr char kKey[] = "/var/packages/Corvane/target/etc/keldcore.key";
+
   void SetUp() override {
     CliTest::SetUp();
     ::chmod(kStateDir, 0700);
+  }
+  void TearDown() override {
+    EXPECT_EQ(::chown(kStateDir, ::geteuid(), ::getegid()), 0);
+    CliTest::TearDown();
+  }
+
+  /// From byte `from` of a page, counted as SQLite does, to its end.
+  static void damage(int page, std::size_t from) {
+    std::string file = readFile(kDatabase);
+    const std::size_t start = 4096 * static_cast<std::size_t>(page - 1) + from;
+    file.replace(start, 4096 - from, 4096 - from, 'x');
+    writeFile(kDatabase, file);
   }
 
   /// "subject: message" of every problem.
@@ -237,15 +254,69 @@ TEST_F(Status, TablesNearTheirLimit) {
   EXPECT_THAT(problems(), ElementsAre("oauth_clientInfo: full (1 of 1 rows)"));
 }
 
-TEST_F(Status, ADamagedDatabase) {
+TEST_F(Status, ADatabaseThatIsNone) {
   writeFile(kDatabase, std::string(4096, 'x'));
   ::chmod(kDatabase, 0600);
   const Json::Value database = json({"status"}, "", kUnhealthy)["database"];
   EXPECT_EQ(database["ready"], Json::Value(false));
-  EXPECT_EQ(database["code"], Json::Value(-1));
-  EXPECT_EQ(database["message"], "Create table failed");
-  EXPECT_THAT(problems(), ElementsAre("database: not ready: Create table failed (-1)"));
-  EXPECT_THAT(run({"status"}).out, HasSubstr("\nDatabase     Create table failed\n"));
+  EXPECT_EQ(database["code"], Json::Value(26));
+  EXPECT_EQ(database["message"], "Create table failed: file is not a database");
+  EXPECT_THAT(problems(), ElementsAre("database: not ready: Create table failed: "
+                                      "file is not a database (26)"));
+  EXPECT_THAT(run({"status"}).out,
+              HasSubstr("\nDatabase     Create table failed: file is not a database\n"));
+}
+
+TEST_F(Status, AMalformedSchema) {
+  addClient();
+  damage(1, 100);
+  EXPECT_THAT(problems(), ElementsAre(MatchesRegex("database: not ready: .*malformed.* \\(11\\)")));
+}
+
+TEST_F(Status, AMalformedPageThatNoCountReads) {
+  addClient();
+  for (int row = 0; row < 40; ++row) issueCode();
+  const int page = std::stoi(sqlText(
+      "SELECT pageno FROM dbstat WHERE name='oauth_grantCode' AND pagetype='leaf' LIMIT 1"));
+  damage(page, 0);
+  const std::vector<std::string> found = problems();
+  EXPECT_THAT(found, Contains(HasSubstr("oauth_grantCode: cannot be read: database disk image is "
+                                        "malformed (11)")));
+  EXPECT_THAT(found, Contains(MatchesRegex("database: is malformed: [^\n]*")));
+}
+
+TEST_F(Status, ADamagedIndexThatNobodyReads) {
+  addClient();
+  for (int row = 0; row < 3; ++row) issueCode();
+  const int page = std::stoi(
+      sqlText("SELECT rootpage FROM sqlite_master WHERE tbl_name='oauth_token' AND type='index'"));
+  damage(page, 0);
+  EXPECT_THAT(problems(), Contains(MatchesRegex("database: is malformed: .*")));
+}
+
+TEST_F(Status, TriggersAndViews) {
+  addClient();
+  sql("CREATE VIEW peep AS SELECT * FROM oauth_token;"
+      "CREATE TRIGGER \"copy\x7f\" AFTER INSERT ON oauth_token BEGIN SELECT 1; END");
+  EXPECT_THAT(problems(),
+              ElementsAre("database: has a trigger copy\x7f", "database: has a view peep"));
+  EXPECT_THAT(run({"status"}).out, HasSubstr("database: has a trigger copy\\x7f\n"));
+}
+
+TEST_F(Status, AnotherProgramsDatabase) {
+  sql("CREATE TABLE recipes(name)");
+  ::chmod(kDatabase, 0600);
+  EXPECT_THAT(problems(), ElementsAre("database: has none of the store's tables: it is another "
+                                      "program's, or was emptied"));
+  EXPECT_EQ(json({"status"}, "", kUnhealthy)["database"]["message"],
+            "is empty; the first use creates its tables");
+}
+
+TEST_F(Status, ADatabaseThatIsJustBeingMade) {
+  writeFile(kDatabase, "");
+  ::chmod(kDatabase, 0600);
+  EXPECT_THAT(problems(kOk), IsEmpty());
+  EXPECT_EQ(readFile(kDatabase), "");
 }
 
 TEST_F(Status, ATableThatCannotBeRead) {
@@ -276,6 +347,57 @@ TEST_F(Status, AnInterruptedChangeOfTheKey) {
               ElementsAre("key: a change of it was interrupted: " + waiting + " waits"));
 }
 
+TEST_F(Status, AMissingKey) {
+  addClient();
+  std::filesystem::remove(kKey);
+  EXPECT_THAT(problems(), ElementsAre(std::string("key: ") + kKey + " is missing"));
+  EXPECT_FALSE(std::filesystem::exists(kKey));
+}
+
+TEST_F(Status, AMissingKeyOfAnEmptyStore) {
+  run({"log", "add", "entry"});
+  EXPECT_THAT(problems(kOk), IsEmpty());
+  EXPECT_FALSE(std::filesystem::exists(kKey));
+}
+
+TEST_F(Status, KeyFilesThatAreLeftOver) {
+  addClient();
+  std::ofstream(std::string(kKey) + ".a1B2c3") << "key";
+  std::ofstream(std::string(kKey) + ".next.\x7f") << "key";
+  EXPECT_THAT(problems(), ElementsAre(std::string("key: left over: ") + kKey + ".a1B2c3",
+                                      std::string("key: left over: ") + kKey + ".next.\x7f"));
+  EXPECT_THAT(run({"status"}).out, HasSubstr(".next.\\x7f\n"));
+}
+
+TEST_F(Status, AJournalOfAnotherUser) {
+  if (!canBecomeNobody()) GTEST_SKIP() << "no other user in this namespace";
+  const std::string journal = std::string(kDatabase) + "-journal";
+  addClient();
+  std::ofstream(journal) << "";
+  EXPECT_THAT(problems(kOk), IsEmpty());
+  std::ofstream(journal) << "";
+  ASSERT_EQ(::chown(journal.c_str(), kNobody, kNobody), 0);
+  EXPECT_THAT(problems(),
+              ElementsAre("journal: " + journal + " belongs to nobody, the folder to root"));
+}
+
+TEST_F(Status, AJournalOfTheFoldersOwnerBesideRootsDatabase) {
+  if (!canBecomeNobody()) GTEST_SKIP() << "no other user in this namespace";
+  const std::string journal = std::string(kDatabase) + "-journal";
+  addClient();
+  std::ofstream(journal) << "";
+  ASSERT_EQ(::chown(journal.c_str(), kNobody, kNobody), 0);
+  ASSERT_EQ(::chown(kStateDir, kNobody, kNobody), 0);
+  EXPECT_THAT(problems(kOk), IsEmpty());
+}
+
+TEST_F(Status, RoomOnTheDisk) {
+  addClient();
+  const Json::Value disk = json({"status"})["disk"];
+  EXPECT_GT(disk["needed"].asUInt64(), std::filesystem::file_size(kDatabase));
+  EXPECT_GT(disk["free"].asUInt64(), disk["needed"].asUInt64());
+}
+
 TEST_F(Status, AMissingFolder) {
   const HiddenFolder hidden;
   EXPECT_THAT(problems(), ElementsAre("folder: cannot be reached: No such file or directory"));
@@ -301,6 +423,56 @@ TEST_F(Status, AnotherUser) {
   EXPECT_THAT(status.out, HasSubstr("settings: cannot be read: Permission denied"));
   EXPECT_THAT(status.out, HasSubstr("database: not ready: Open DB failed!! (14)"));
   EXPECT_THAT(status.out, Not(HasSubstr("does not exist")));
+}
+
+// Disk ------------------------------------------------------------------------------
+
+/// A store with 200 expired tokens, on a small disk of its own.
+class StatusOfASmallDisk : public Status {
+ protected:
+  void SetUp() override {
+    Status::SetUp();
+    medium_.emplace(kStateDir);
+    ::chmod(kStateDir, 0700);
+    addClient();
+    issueToken({"--expires-in", "0"});
+    sql("WITH RECURSIVE n(i) AS (SELECT 2 UNION ALL SELECT i+1 FROM n WHERE i<200)"
+        "INSERT INTO oauth_token SELECT username, client_id, scope, refresh_token,"
+        " access_token || i, '5', flow_type, state, ip, i FROM oauth_token, n WHERE id=1");
+    expireIn("oauth_token", 1, -5);
+  }
+  void TearDown() override {
+    medium_.reset();
+    Status::TearDown();
+  }
+
+  /// Room for as much as status says.
+  int pagesNeeded() {
+    const auto needed = json({"status"})["disk"]["needed"].asUInt64();
+    return static_cast<int>((needed + 4095) / 4096);
+  }
+
+  std::optional<faults::SmallMedium> medium_;
+};
+
+TEST_F(StatusOfASmallDisk, WithRoomForAPurge) {
+  medium_->fill(pagesNeeded());
+  EXPECT_THAT(problems(kOk), IsEmpty());
+  EXPECT_THAT(run({"token", "purge", "--yes"}), ExitsWith(kOk));
+  EXPECT_EQ(rowCount("oauth_token"), "0");
+}
+
+TEST_F(StatusOfASmallDisk, WithoutRoomForAPurge) {
+  medium_->fill(pagesNeeded() - 1);
+  EXPECT_THAT(
+      problems(),
+      ElementsAre(MatchesRegex("disk: [0-9]+ bytes are free, and a purge may need [0-9]+")));
+}
+
+TEST_F(StatusOfASmallDisk, Full) {
+  medium_->fill(0);
+  EXPECT_THAT(problems(), Contains(StartsWith("disk: 0 bytes are free, ")));
+  EXPECT_THAT(run({"token", "purge", "--yes"}).err, HasSubstr(" (13)\nhint: the disk is full\n"));
 }
 
 }  // namespace

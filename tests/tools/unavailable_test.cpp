@@ -55,8 +55,8 @@ TEST_F(Unavailable, ADamagedDatabase) {
   const Outcome outcome = run({"client", "list"});
   EXPECT_THAT(outcome, ExitsWith(kUnavailable));
   EXPECT_EQ(outcome.err,
-            "keldoauth: client list: Create table failed (-1)\n"
-            "hint: the system log names the table and the cause\n");
+            "keldoauth: client list: Create table failed: file is not a database (26)\n"
+            "hint: the database file is damaged; put back a copy or move the file away\n");
 }
 
 TEST_F(Unavailable, ADamagedPage) {

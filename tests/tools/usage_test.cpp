@@ -155,6 +155,7 @@ TEST_F(Usage, MistakesDoNotTouchTheDatabase) {
 }
 
 TEST_F(Usage, AMistakeWithJsonIsADocument) {
+  makeStore();
   for (const Arguments& mistake :
        {Arguments{}, Arguments{"client"}, Arguments{"log", "add"}, Arguments{"code", "show"}}) {
     const Json::Value error = json(mistake, "", kUsage)["error"];
@@ -165,6 +166,7 @@ TEST_F(Usage, AMistakeWithJsonIsADocument) {
 }
 
 TEST_F(Usage, AFailureWithJsonIsADocumentAndALine) {
+  makeStore();
   const Outcome outcome = run({"client", "show", "3", "--json"});
   EXPECT_EQ(outcome.out,
             R"({"error":{"code":null,"exit":3,"hint":"","message":"no such client 3"}})"
@@ -173,6 +175,7 @@ TEST_F(Usage, AFailureWithJsonIsADocumentAndALine) {
 }
 
 TEST_F(Usage, ARefusalWithJsonHasTheLibrarysCode) {
+  makeStore();
   const Json::Value error = json({"token", "verify"}, "short", kRefused)["error"];
   EXPECT_EQ(error["code"], Json::Value(-2));
   EXPECT_EQ(error["exit"], Json::Value(kRefused));
@@ -181,6 +184,7 @@ TEST_F(Usage, ARefusalWithJsonHasTheLibrarysCode) {
 }
 
 TEST_F(Usage, AnAnswerThatCannotBeWritten) {
+  makeStore();
   const Outcome outcome = runInto("/dev/full", {"client", "list"});
   EXPECT_THAT(outcome, ExitsWith(kNotWritten));
   EXPECT_EQ(outcome.err, "keldoauth: cannot write to standard output\n");

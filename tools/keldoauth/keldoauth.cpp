@@ -13,6 +13,7 @@
 #include "tools/keldoauth/commands/command.h"
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/text.h"
+#include "tools/keldoauth/storage/presence.h"
 
 namespace tool {
 namespace {
@@ -101,10 +102,16 @@ ExitCode report(const std::string& command, const Failure& failure, bool asJson)
   return failure.exit;
 }
 
+void prepare(const Command& command) {
+  if (command.needs == Needs::kDatabase) requireDatabase();
+  if (command.newKey == NewKey::kNever) makeNoKey();
+}
+
 ExitCode run(const std::string& name, const Invocation& invocation) {
   const Command& command = *invocation.command;
   const bool asJson = invocation.arguments.json;
   try {
+    prepare(command);
     const Answer answer = command.run(invocation.arguments);
     if (asJson) {
       printJson(std::cout, answer.document);
@@ -113,7 +120,7 @@ ExitCode run(const std::string& name, const Invocation& invocation) {
     }
     return answer.exit;
   } catch (const Failure& failure) {
-    return report(name, failure, asJson);
+    return report(name, withCause(failure), asJson);
   } catch (const std::exception& error) {
     return report(name, Failure(kUnavailable, error.what()), asJson);
   }

@@ -144,7 +144,9 @@ const Command& restoreCommand() {
                                "Replace the database by a copy",
                                {required(option::kBackupFile), option::kYes, option::kJson},
                                restore,
-                               printRestored};
+                               printRestored,
+                               Needs::kNothing,
+                               NewKey::kAllowed};
   return command;
 }
 

@@ -24,6 +24,12 @@ struct Answer {
   ExitCode exit = kOk;
 };
 
+/// Whether a command has anything to do without a database.
+enum class Needs { kDatabase, kNothing };
+
+/// Whether a command may lead to a key for the stand-in cipher where none is.
+enum class NewKey { kNever, kAllowed };
+
 struct Command {
   const char* name;
   const char* summary;
@@ -31,6 +37,8 @@ struct Command {
   /// Throws Failure.
   Answer (*run)(const Arguments& arguments);
   void (*print)(const Json::Value& document, std::ostream& out);
+  Needs needs = Needs::kDatabase;
+  NewKey newKey = NewKey::kNever;
 };
 
 const std::vector<Command>& clientCommands();

@@ -88,7 +88,7 @@ const std::vector<Command>& logCommands() {
   using namespace option;
   static const std::vector<Command> commands{
       {"list", "List entries, oldest first", {kContains, kLast, kJson}, list, printEntries},
-      {"add", "Write an entry", {required(kMessage), kJson}, add, printAdded},
+      {"add", "Write an entry", {required(kMessage), kJson}, add, printAdded, Needs::kNothing},
       {"clear", "Delete all entries", {kYes, kJson}, clear, printCleared},
   };
   return commands;

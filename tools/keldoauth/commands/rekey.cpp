@@ -172,7 +172,9 @@ const Command& rekeyCommand() {
                                "Change the key of the stand-in cipher",
                                {option::kYes, option::kJson},
                                rekey,
-                               printRekeyed};
+                               printRekeyed,
+                               Needs::kDatabase,
+                               NewKey::kAllowed};
   return command;
 }
 

@@ -40,6 +40,8 @@ Answer status(const Arguments& /*arguments*/) {
   Json::Value& document = answer.document;
   document["version"] = KELDOAUTH_VERSION;
   document["files"] = inspectFiles(problems);
+  document["disk"] = inspectDisk(problems);
+  inspectKeyFiles(problems);
   inspectSettings(problems);
   document["database"] = inspectDatabase(document["files"], problems);
   document["lifetimes"] = inspectLifetimes();
@@ -156,11 +158,9 @@ Json::Value inspectDiagnostics(Problems& problems) {
 }
 
 const Command& statusCommand() {
-  static const Command command{"status",
-                               "Show files, tables, limits and what is wrong",
-                               {option::kJson},
-                               status,
-                               printStatus};
+  static const Command command{"status",        "Show files, tables, limits and what is wrong",
+                               {option::kJson}, status,
+                               printStatus,     Needs::kNothing};
   return command;
 }
 

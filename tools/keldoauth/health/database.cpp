@@ -1,14 +1,12 @@
-// The database as the library sees it: does it open, does the cipher work, how
-// full are its tables.
+// The database as the library sees it: does it open, how full are its tables.
 
 #include <string>
 
 #include "core/oauth_db_basic.h"
 #include "core/oauth_errors.h"
 #include "tools/keldoauth/console/clock.h"
-#include "tools/keldoauth/console/output.h"
-#include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/health/health.h"
+#include "tools/keldoauth/storage/presence.h"
 #include "tools/keldoauth/storage/purge.h"
 #include "tools/keldoauth/storage/stores.h"
 #include "utils/oauth_names.h"
@@ -62,73 +60,60 @@ Json::Value inspectTable(OAUTHDBBasic& store, const Table& table, Problems& prob
   return document;
 }
 
+/// Counting may do without the pages that hold the rows.
 template <typename Store>
-Json::Value expiredRows() try {
+void countExpired(Json::Value& table, Problems& problems) try {
+  if (table["rows"].isNull()) return;
   Store store;
-  return Json::Int64(purgeable(store, 0).size());
-} catch (const Failure&) {
-  return {};
-}
-
-/// Reading decrypts; what cannot be decrypted comes back as it is in the file.
-void checkClients(Problems& problems) try {
-  constexpr std::size_t kIdentifierBytes = 64;
-  Clients clients;
-  Json::ArrayIndex unreadable = 0;
-  for (const Json::Value& row : allRows(clients)) {
-    if (withoutDoubledQuotes(row[names::kClientId].asString()).size() != kIdentifierBytes) {
-      ++unreadable;
-    }
-  }
-  if (unreadable == 0) return;
-  problems.add(names::kClientInfoTable, counted(unreadable, "identifier") + " cannot be decrypted",
-               "the platform's key is not the one that encrypted them; put it back");
+  table["expired"] = Json::Int64(purgeable(store, 0).size());
 } catch (const Failure& failure) {
-  problems.add(names::kClientInfoTable, failure.text());
-}
-
-void checkCipher(Problems& problems) {
-  Json::Value probe;
-  probe[names::kClientId] = "probe";
-  if (OAUTHDBBasic::ParamEncrypt(probe) != 0) return;
-  problems.add("cipher", "cannot encrypt (" + std::to_string(errors::kEncryptFailed.code) + ")",
-               "the platform's cipher or its key cannot be used; the system log says more");
+  problems.add(table["name"].asString(), "cannot be read: " + failure.text());
 }
 
 void inspectTables(Json::Value& tables, Problems& problems) {
   Log store;  // any store: each table is named in turn
   for (const Table& table : kTables) tables.append(inspectTable(store, table, problems));
-  tables[1]["expired"] = expiredRows<Codes>();
-  tables[2]["expired"] = expiredRows<Tokens>();
+  countExpired<Codes>(tables[1], problems);
+  countExpired<Tokens>(tables[2], problems);
 }
 
 void inspectOpened(Json::Value& document, Problems& problems) try {
   inspectTables(document["tables"], problems);
   document["ready"] = true;
-  checkCipher(problems);
-  checkClients(problems);
+  inspectSoundness(problems);
+  inspectCipher(document["tables"], problems);
 } catch (const Failure& failure) {
   document["code"] = failure.code ? Json::Value(*failure.code) : Json::Value();
   document["message"] = failure.what();
   problems.add("database", "not ready: " + failure.text(), "the system log says more");
 }
 
+/// A file of no bytes is what the service's first use begins with.
+void checkForeign(const Json::Value& file, Problems& problems) {
+  if (file["size"] == 0) return;
+  problems.add("database",
+               "has none of the store's tables: it is another program's, or was emptied",
+               "the first use would add them; put back a copy, or move the file away");
+}
+
 }  // namespace
 
 Json::Value inspectDatabase(const Json::Value& files, Problems& problems) {
-  const Json::Value& file = files["database"];
-  const bool isAbsent = !file["exists"].asBool() && file["error"].isNull();
+  const Presence presence = databasePresence();
   Json::Value document;
   document["ready"] = false;
   document["code"] = Json::Value();
   document["message"] = "";
   document["tables"] = Json::arrayValue;
-  if (!isAbsent) {
-    inspectOpened(document, problems);
-  } else if (files["folder"]["exists"].asBool()) {
-    document["message"] = "does not exist yet; the first use creates it";
-  } else {
+  if (!files["folder"]["exists"].asBool() && files["folder"]["error"].isNull()) {
     document["message"] = "does not exist";
+  } else if (presence == Presence::kNoFile) {
+    document["message"] = "does not exist yet; the first use creates it";
+  } else if (presence == Presence::kNoTables) {
+    document["message"] = "is empty; the first use creates its tables";
+    checkForeign(files["database"], problems);
+  } else {
+    inspectOpened(document, problems);
   }
   return document;
 }

@@ -14,7 +14,6 @@
 #include <utility>
 
 #include "tools/keldoauth/health/health.h"
-#include "tools/keldoauth/storage/encrypted_values.h"
 #include "utils/oauth_names.h"
 
 namespace names = KELDOAUTHSERVER::names;
@@ -110,11 +109,17 @@ void checkSettings(const Inspected& settings, Problems& problems) {
   }
 }
 
-/// Parts of the store may be encrypted with either key.
-void checkWaitingKey(const Inspected& key, Problems& problems) {
-  if (key.exists()) {
-    problems.add("key", "a change of it was interrupted: " + key.path + " waits",
-                 "keep both keys and run 'keldoauth rekey' again");
+/// What a crash left half done is rolled back by the service's programs, which
+/// run as the folder's owner and must be able to read it.
+void checkJournals(const Inspected& folder, Problems& problems) {
+  for (const char* suffix : {"-journal", "-wal"}) {
+    const Inspected journal(std::string(names::kDatabaseFile) + suffix);
+    if (!folder.exists() || !journal.exists()) continue;
+    if (journal.status.st_uid == folder.status.st_uid) continue;
+    problems.add("journal",
+                 journal.path + " belongs to " + userName(journal.status.st_uid) +
+                     ", the folder to " + userName(folder.status.st_uid),
+                 "give it to the folder's owner by chown; never delete it");
   }
 }
 
@@ -127,7 +132,7 @@ Json::Value inspectFiles(Problems& problems) {
   checkFolder(folder, problems);
   checkDatabase(database, problems);
   checkSettings(settings, problems);
-  checkWaitingKey(Inspected(keyFiles().next), problems);
+  checkJournals(folder, problems);
 
   Json::Value files;
   files["folder"] = folder.document();

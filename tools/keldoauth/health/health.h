@@ -23,6 +23,20 @@ class Problems {
 /// Owner, group, mode and size of "folder", "database", "settings", "debug_flag".
 Json::Value inspectFiles(Problems& problems);
 
+/// Bytes "free" on the disk of the folder, and "needed" there for the largest
+/// purge; null where that cannot be known.
+Json::Value inspectDisk(Problems& problems);
+
+/// Key files that should not be there.
+void inspectKeyFiles(Problems& problems);
+
+/// Whether the cipher works and has the key of what is stored; `tables` is what
+/// inspectDatabase() found in them.
+void inspectCipher(const Json::Value& tables, Problems& problems);
+
+/// Damage, and what the library does not put into a database.
+void inspectSoundness(Problems& problems);
+
 /// Compares what the settings file says with what the library makes of it.
 void inspectSettings(Problems& problems);
 

@@ -57,8 +57,10 @@ std::string encrypted(std::string text) {
 }
 
 KeyFiles keyFiles() {
-  const char* chosen = secure_getenv(kKeyVariable);
-  const std::string current = chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE;
+  static const std::string current = [] {
+    const char* const chosen = secure_getenv(kKeyVariable);
+    return std::string(chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE);
+  }();
   return {current, current + ".next"};
 }
 

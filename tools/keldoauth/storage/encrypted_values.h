@@ -34,7 +34,8 @@ bool decrypt(EncryptedValue& value);
 std::string encrypted(std::string text);
 
 /// Where the stand-in cipher has its key, and where a new one waits while
-/// `keldoauth rekey` is at work, or after that was interrupted.
+/// `keldoauth rekey` is at work, or after that was interrupted: what the
+/// environment said before useKey() changed it.
 struct KeyFiles {
   std::string current;
   std::string next;

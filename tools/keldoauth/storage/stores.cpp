@@ -29,6 +29,18 @@ Json::Value rowByIdentifier(Clients& clients, const std::string& identifier) {
   return rows[0U];
 }
 
+/// Why the tables could not be made: the library leaves that to the log, but
+/// SQLite says it again of the first thing that it cannot do.
+Failure startFailure(OAUTHDBBasic& store, int code, const std::string& message) {
+  if (code != errors::kCreateTableFailed.code) return libraryFailure(code, message);
+  for (const char* step : {"SELECT * FROM sqlite_master", "BEGIN IMMEDIATE"}) {
+    if (store.DBCmdRun(step, nullptr, nullptr) != 0) continue;
+    return libraryFailure(store.GetErrCode(), message + ": " + store.GetErrMsg());
+  }
+  store.DBCmdRun("ROLLBACK", nullptr, nullptr);
+  return libraryFailure(code, message);
+}
+
 }  // namespace
 
 void requireReady(OAUTHDBBasic& store) {
@@ -38,7 +50,7 @@ void requireReady(OAUTHDBBasic& store) {
   const int code = store.GetErrCode();
   const std::string message = store.GetErrMsg();
   Json::Value count;
-  if (store.DBGetRowCount(count) == 0) throw libraryFailure(code, message);
+  if (store.DBGetRowCount(count) == 0) throw startFailure(store, code, message);
   store.SetErrCode(errors::kNone.code);
 }
 

@@ -1,0 +1,96 @@
+#include "tools/keldoauth/storage/presence.h"
+
+#include <sqlite3.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <filesystem>
+#include <memory>
+
+#include "core/oauth_errors.h"
+#include "tools/keldoauth/storage/encrypted_values.h"
+#include "utils/oauth_names.h"
+
+using namespace KELDOAUTHSERVER;
+
+namespace tool {
+namespace {
+
+constexpr const char* kTables[] = {names::kMetaTable, names::kClientInfoTable,
+                                   names::kGrantCodeTable, names::kTokenTable, names::kLogTable};
+
+struct CloseConnection {
+  void operator()(sqlite3* db) const { sqlite3_close(db); }
+};
+
+int noteRow(void* isFound, int /*count*/, char** /*values*/, char** /*columns*/) {
+  *static_cast<bool*>(isFound) = true;
+  return 0;
+}
+
+/// True only when SQLite could read the file and found none: a lock, damage or
+/// a journal to roll back is for the library to deal with.
+bool lacksTables() {
+  sqlite3* raw = nullptr;
+  const int opened = sqlite3_open_v2(names::kDatabaseFile, &raw, SQLITE_OPEN_READONLY, nullptr);
+  const std::unique_ptr<sqlite3, CloseConnection> db(raw);
+  if (opened != SQLITE_OK) return false;
+
+  std::string sql = "SELECT 1 FROM sqlite_master WHERE type='table' AND name IN (''";
+  for (const char* table : kTables) sql.append(",'").append(table).append("'");
+  sql += ")";
+  bool isFound = false;
+  return sqlite3_exec(raw, sql.c_str(), noteRow, &isFound, nullptr) == SQLITE_OK && !isFound;
+}
+
+bool isAbsent(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR);
+}
+
+std::optional<std::string>& keyFoundMissing() {
+  static std::optional<std::string> path;
+  return path;
+}
+
+}  // namespace
+
+Presence databasePresence() {
+  struct stat status {};
+  if (stat(names::kDatabaseFile, &status) == 0) {
+    return lacksTables() ? Presence::kNoTables : Presence::kThere;
+  }
+  const std::string folder = std::filesystem::path(names::kDatabaseFile).parent_path();
+  const bool isMissing = errno == ENOENT && stat(folder.c_str(), &status) == 0;
+  return isMissing ? Presence::kNoFile : Presence::kThere;
+}
+
+void requireDatabase() {
+  const Presence presence = databasePresence();
+  if (presence == Presence::kThere) return;
+  const std::string file = names::kDatabaseFile;
+  const std::string reason =
+      presence == Presence::kNoFile ? " does not exist" : " has none of the store's tables";
+  throw Failure(kUnavailable, "there is no database yet: " + file + reason,
+                "the service's first use makes it, or 'keldoauth client add', run by the "
+                "service's user");
+}
+
+void makeNoKey() {
+  const std::string path = keyFiles().current;
+  if (!isAbsent(path)) return;
+  keyFoundMissing() = path;
+  useKey(path + "/");  // below a file that is not there nothing can be made
+}
+
+std::optional<std::string> missingKey() {
+  return keyFoundMissing();
+}
+
+Failure withCause(const Failure& failure) {
+  if (failure.code != errors::kEncryptFailed.code || !missingKey()) return failure;
+  return {failure.exit, failure.what(), "the key file " + *missingKey() + " is missing",
+          failure.code};
+}
+
+}  // namespace tool
