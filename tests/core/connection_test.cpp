@@ -1,6 +1,3 @@
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <filesystem>
 #include <iterator>
 
@@ -18,107 +15,11 @@ namespace fs = std::filesystem;
 
 constexpr int kCannotOpen = 14;
 
-unsigned int modeOf(const std::string& path) {
-  struct stat status {};
-  EXPECT_EQ(stat(path.c_str(), &status), 0) << path;
-  return status.st_mode & 07777U;
-}
-
-/// Puts the umask of the process back at the end.
-class Umask {
- public:
-  explicit Umask(mode_t mask) : previous_(umask(mask)) {}
-  ~Umask() { umask(previous_); }
-  Umask(const Umask&) = delete;
-  Umask& operator=(const Umask&) = delete;
-
-  static mode_t current() {
-    const mode_t mask = umask(0);
-    umask(mask);
-    return mask;
-  }
-
- private:
-  mode_t previous_;
-};
-
-class ConnectionTest : public CoreTest {
- protected:
-  static std::string journal() { return std::string(kDatabase) + "-journal"; }
-};
+class ConnectionTest : public CoreTest {};
 
 TEST_F(ConnectionTest, DatabaseLiesAtItsDocumentedPath) {
   const OAUTHDBBasic store;
   EXPECT_TRUE(fs::is_regular_file("/var/packages/Corvane/target/etc/oauth.db"));
-}
-
-// File mode -------------------------------------------------------------------
-
-class FileModeTest : public ConnectionTest, public ::testing::WithParamInterface<mode_t> {};
-
-TEST_P(FileModeTest, CreatedFileIsItsOwnersAlone) {
-  const Umask callers(GetParam());
-  const OAUTHDBBasic store;
-  EXPECT_EQ(modeOf(kDatabase), 0600U);
-}
-
-TEST_P(FileModeTest, JournalOfACreatedFileIsItsOwnersAlone) {
-  const Umask callers(GetParam());
-  OAUTHDBBasic store;
-  ASSERT_EQ(store.DBCmd("BEGIN; INSERT INTO oauth_log VALUES(1, 'a', 1)", nullptr, nullptr), 1);
-  EXPECT_EQ(modeOf(journal()), 0600U);
-}
-
-TEST_P(FileModeTest, UmaskIsPutBack) {
-  const Umask callers(GetParam());
-  {
-    const OAUTHDBBasic store;
-    EXPECT_EQ(Umask::current(), GetParam());
-  }
-  EXPECT_EQ(Umask::current(), GetParam());
-}
-
-TEST_P(FileModeTest, UmaskIsPutBackAfterAFailedOpen) {
-  fs::create_directory(kDatabase);
-  const Umask callers(GetParam());
-  const OAUTHDBBasic store;
-  EXPECT_EQ(Umask::current(), GetParam());
-}
-
-INSTANTIATE_TEST_SUITE_P(Core, FileModeTest, ::testing::Values(0, 022, 077, 0177, 0777),
-                         [](const auto& row) { return "Umask0" + std::to_string(row.param); });
-
-TEST_F(ConnectionTest, ModeOfAnExistingFileStays) {
-  for (const mode_t mode : {0644, 0666, 0640, 0600, 0755}) {
-    fs::remove(kDatabase);
-    { const OAUTHDBBasic store; }
-    ASSERT_EQ(chmod(kDatabase, mode), 0);
-    const OAUTHDBBasic store;
-    EXPECT_EQ(modeOf(kDatabase), mode);
-  }
-}
-
-TEST_F(ConnectionTest, ModeOfAnExistingEmptyFileStays) {
-  writeFile(kDatabase, "");
-  ASSERT_EQ(chmod(kDatabase, 0664), 0);
-  const OAUTHDBBasic store;
-  expectNoError(store);
-  EXPECT_EQ(modeOf(kDatabase), 0664U);
-}
-
-TEST_F(ConnectionTest, JournalTakesTheModeOfAnExistingFile) {
-  writeFile(kDatabase, "");
-  ASSERT_EQ(chmod(kDatabase, 0640), 0);
-  OAUTHDBBasic store;
-  store.DBCmd("BEGIN; INSERT INTO oauth_log VALUES(1, 'a', 1)", nullptr, nullptr);
-  EXPECT_EQ(modeOf(journal()), 0640U);
-}
-
-TEST_F(ConnectionTest, OtherFilesOfTheProcessKeepTheCallersUmask) {
-  const Umask callers(022);
-  const OAUTHDBBasic store;
-  writeFile("/tmp/other", "");
-  EXPECT_EQ(modeOf("/tmp/other"), 0644U);
 }
 
 // Settings of the connection --------------------------------------------------
@@ -329,12 +230,6 @@ TEST_F(ConnectionTest, MissingFolderFailsTheOpenAndCreatesNothing) {
   expectError(store, kCannotOpen, "Open DB failed!!");
   EXPECT_THAT(messages(), ElementsAre("Open DB failed!![14]"));
   EXPECT_FALSE(fs::exists("/var/packages/Corvane/target"));
-}
-
-TEST_F(ConnectionTest, LinkIntoNowhereFailsTheOpen) {
-  fs::create_symlink("/tmp/missing/oauth.db", kDatabase);
-  const OAUTHDBBasic store;
-  expectError(store, kCannotOpen, "Open DB failed!!");
 }
 
 }  // namespace

@@ -54,6 +54,7 @@ Json::Value json(std::string text) {
 void CoreTest::SetUp() {
   World::SetUp();
   Engine::release();
+  Creation::release();
   Waiting::release();
   support::Platform::useReadableCipher();
 }
@@ -61,6 +62,7 @@ void CoreTest::SetUp() {
 void CoreTest::TearDown() {
   if (fs::exists(kHiddenFolder)) showFolder();
   Engine::release();
+  Creation::release();
   Waiting::release();
   World::TearDown();
 }

@@ -2,6 +2,7 @@
 
 #include <dlfcn.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
 
 #include <cerrno>
 #include <ctime>
@@ -22,6 +23,15 @@ struct EngineState {
   int refusal = SQLITE_OK;
 };
 EngineState engine;
+
+struct CreationState {
+  int attempts = 0;
+  std::function<void(int)> before;
+  std::function<void()> after;
+  int error = 0;
+  int refusals = 0;
+};
+CreationState creation;
 
 struct WaitingState {
   std::function<void(int)> onNap;
@@ -97,6 +107,23 @@ void Engine::refuseExec(const std::string& start, int code) {
   engine.refusal = code;
 }
 
+void Creation::release() {
+  creation = {};
+}
+int Creation::attempts() {
+  return creation.attempts;
+}
+void Creation::before(std::function<void(int)> hook) {
+  creation.before = std::move(hook);
+}
+void Creation::after(std::function<void()> hook) {
+  creation.after = std::move(hook);
+}
+void Creation::refuse(int error, int times) {
+  creation.error = error;
+  creation.refusals = times;
+}
+
 void Waiting::release() {
   waiting = {};
 }
@@ -137,6 +164,19 @@ int sqlite3_exec(sqlite3* db, const char* sql, int (*callback)(void*, int, char*
   }
   static const auto real = original<decltype(&sqlite3_exec)>("sqlite3_exec");
   return real(db, sql, callback, arg, text);
+}
+
+int mknod(const char* path, mode_t mode, dev_t device) noexcept {
+  ++creation.attempts;
+  call(creation.before, creation.attempts);
+  if (creation.refusals > 0) {
+    --creation.refusals;
+    errno = creation.error;
+    return -1;
+  }
+  const int result = original<decltype(&mknod)>("mknod")(path, mode, device);
+  if (result == 0 && creation.after) creation.after();
+  return result;
 }
 
 int nanosleep(const timespec* duration, timespec* remaining) {

@@ -1,5 +1,5 @@
-// The calls that the library makes to SQLite and, while it waits for a lock, to
-// the clock. What a test does not script goes where it belongs.
+// The calls that the library makes to SQLite, to create the database file and,
+// while it waits for a lock, to the clock. What a test does not script goes where it belongs.
 
 #ifndef KELDOAUTH_TESTS_CORE_ENGINE_H
 #define KELDOAUTH_TESTS_CORE_ENGINE_H
@@ -25,6 +25,18 @@ class Engine {
   /// sqlite3_exec runs nothing that begins with `start`: it returns `code` and
   /// no text.
   static void refuseExec(const std::string& start, int code);
+};
+
+/// The creation of files by mknod().
+class Creation {
+ public:
+  static void release();
+
+  static int attempts();
+  static void before(std::function<void(int nth)> hook);  // counted from 1
+  static void after(std::function<void()> hook);          // only when it worked
+  /// The next `times` attempts fail with `error`.
+  static void refuse(int error, int times);
 };
 
 /// Makes waiting take no time: the monotonic clock stands, and nanosleep() moves

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <array>
 #include <atomic>
@@ -104,6 +105,51 @@ TEST_F(ThreadsTest, ObjectsOfOneThreadServeOthers) {
     EXPECT_EQ(each->tokens.GetErrCode(), 255) << each->tokens.GetErrMsg();
     each.reset();
   }
+}
+
+mode_t modeOf(const std::string& path) {
+  struct stat status {};
+  EXPECT_EQ(stat(path.c_str(), &status), 0) << path;
+  return status.st_mode & 07777U;
+}
+
+/// As root, without a privilege to switch, threads may well construct at once.
+TEST_F(ThreadsTest, MissingFileIsCreatedOnceByThreadsThatConstructAtOnce) {
+  for (int i = 0; i < rounds_; ++i) {
+    fs::remove(names::kDatabaseFile);
+    std::array<bool, kThreads> ready{};
+    inThreads([&](int number) {
+      OAUTHDBLog log(names::kLogTable);
+      ready[static_cast<std::size_t>(number)] = log.Add("user") != 0;
+    });
+    EXPECT_THAT(ready, Each(true));
+    EXPECT_EQ(modeOf(names::kDatabaseFile), 0600U);
+    Json::Value rows;
+    EXPECT_EQ(OAUTHDBLog(names::kLogTable).Get("", "", &rows), 1);
+    EXPECT_EQ(rows.size(), static_cast<unsigned>(kThreads));
+  }
+}
+
+TEST_F(ThreadsTest, FilesOfOtherThreadsKeepTheModesOfTheirUmask) {
+  const mode_t callers = umask(022);
+  std::atomic<bool> done{false};
+  int made = 0;
+  int wrong = 0;
+  std::thread other([&] {
+    for (; !done; ++made) {
+      std::ofstream("/tmp/other") << "";
+      if (modeOf("/tmp/other") != 0644U) ++wrong;
+      fs::remove("/tmp/other");
+    }
+  });
+  for (int i = 0; i < rounds_; ++i) {
+    fs::remove(names::kDatabaseFile);
+    const OAUTHDBLog log(names::kLogTable);
+  }
+  done = true;
+  other.join();
+  umask(callers);
+  EXPECT_EQ(wrong, 0) << "of " << made;
 }
 
 TEST_F(ThreadsTest, SettingsAreReadWhileTheyChange) {
