@@ -4,6 +4,7 @@
 #include <json/reader.h>
 #include <json/value.h>
 #include <sys/random.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
@@ -55,6 +56,11 @@ class File {
 
   [[nodiscard]] bool isOpen() const { return descriptor_ >= 0; }
 
+  [[nodiscard]] bool isRegular() const {
+    struct stat file {};
+    return fstat(descriptor_, &file) == 0 && S_ISREG(file.st_mode);
+  }
+
   /// One read, taken up again when a signal interrupts it.
   ssize_t readSome(char* buffer, std::size_t size) const {
     ssize_t got = 0;
@@ -70,11 +76,14 @@ class File {
 
 // Settings ------------------------------------------------------------------
 
-/// O_NONBLOCK: whatever stands in the file's place must not keep a request
-/// waiting.
-bool readWholeFile(const char* path, std::string& text) {
-  const File file(path, O_RDONLY | O_NONBLOCK);
-  if (!file.isOpen()) return false;
+constexpr std::size_t kMostSettingsBytes = 65536;
+
+/// False for what is not a regular file, and for one that is longer or grows
+/// beyond that. O_NONBLOCK: whatever stands in the file's place must not keep a
+/// request waiting.
+bool readSettingsFile(std::string& text) {
+  const File file(names::kSettingsFile, O_RDONLY | O_NONBLOCK | O_NOCTTY);
+  if (!file.isOpen() || !file.isRegular()) return false;
 
   std::array<char, 4096> buffer;
   for (;;) {
@@ -82,13 +91,14 @@ bool readWholeFile(const char* path, std::string& text) {
     if (got < 0) return false;
     if (got == 0) return true;
     text.append(buffer.data(), static_cast<std::size_t>(got));
+    if (text.size() > kMostSettingsBytes) return false;
   }
 }
 
 /// The parser leaves a half-filled root behind when it fails, hence the bool.
 bool loadSettings(Json::Value& root) {
   std::string text;
-  if (!readWholeFile(names::kSettingsFile, text)) return false;
+  if (!readSettingsFile(text)) return false;
 
   const std::unique_ptr<Json::CharReader> parser(Json::CharReaderBuilder().newCharReader());
   return parser->parse(text.data(), text.data() + text.size(), &root, nullptr);

@@ -14,9 +14,10 @@ namespace KELDOAUTHSERVER {
 // Settings ------------------------------------------------------------------
 //
 // Read afresh from names::kSettingsFile on every call, so that an edit takes
-// effect at once. A file that cannot be read or parsed, a missing key and a
-// value that is no 32-bit integer (600.0 is one, 600.5 and "600" are not) all
-// give the default. Nothing is logged.
+// effect at once. A file that cannot be read or parsed, one that is not a
+// regular file or has more than 65536 bytes, a missing key and a value that is
+// no 32-bit integer (600.0 is one, 600.5 and "600" are not) all give the
+// default. Nothing is logged.
 
 /// Lifetime in seconds under `key` (names::kGrantCodeExpired or
 /// names::kTokenExpired). 600 when absent or below 1; no upper bound.

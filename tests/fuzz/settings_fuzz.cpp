@@ -21,6 +21,8 @@ namespace {
 namespace names = KELDOAUTHSERVER::names;
 using fuzz::expect;
 
+constexpr std::size_t kMostBytes = 65536;
+
 void writeSettings(const std::uint8_t* data, std::size_t size) {
   const int file = open(names::kSettingsFile, O_WRONLY | O_CREAT | O_TRUNC, 0600);
   expect(write(file, data, size) == static_cast<ssize_t>(size), "writing the settings");
@@ -57,7 +59,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   static const bool isSafe = (support::requirePrivateMounts(), true);
   expect(isSafe, "private mounts");
   writeSettings(data, size);
-  const Json::Value settings = parsed({reinterpret_cast<const char*>(data), size});
+  const bool isRead = size <= kMostBytes;
+  const Json::Value settings = parsed({reinterpret_cast<const char*>(data), isRead ? size : 0});
 
   for (const char* key : {names::kGrantCodeExpired, names::kTokenExpired}) {
     const int wanted = numberIn(settings, key) > 0 ? numberIn(settings, key) : 600;

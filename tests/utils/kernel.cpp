@@ -28,6 +28,8 @@ struct State {
   std::vector<std::size_t> deviceReads;
   std::vector<std::size_t> getrandomCalls;
   std::set<int> devices;
+  int reads = 0;
+  std::function<void()> beforeRead;
 };
 State& state() {
   static State theState;
@@ -97,6 +99,12 @@ std::vector<std::size_t> Kernel::deviceReads() {
 std::vector<std::size_t> Kernel::getrandomCalls() {
   return withState([](State& s) { return s.getrandomCalls; });
 }
+int Kernel::reads() {
+  return withState([](State& s) { return s.reads; });
+}
+void Kernel::beforeRead(std::function<void()> hook) {
+  withState([&](State& s) { s.beforeRead = std::move(hook); });
+}
 int Kernel::openDevices() {
   return withState([](State& s) { return static_cast<int>(s.devices.size()); });
 }
@@ -130,6 +138,11 @@ int close(int descriptor) {
 }
 
 ssize_t read(int descriptor, void* buffer, size_t size) {
+  const auto hook = withState([](State& s) {
+    ++s.reads;
+    return s.beforeRead;
+  });
+  if (hook) hook();
   const Kernel::Read script = withState([&](State& s) {
     if (s.devices.count(descriptor) == 0) return Kernel::Read();
     s.deviceReads.push_back(size);

@@ -32,6 +32,9 @@ class Kernel {
   /// Bytes asked for, call by call.
   static std::vector<std::size_t> getrandomCalls();
   static std::vector<std::size_t> deviceReads();
+  /// Reads of any file, and a hook that runs ahead of each.
+  static int reads();
+  static void beforeRead(std::function<void()> hook);
   /// Descriptors of the random device that are still open.
   static int openDevices();
 };

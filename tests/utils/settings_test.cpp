@@ -1,8 +1,12 @@
 #include <fcntl.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/un.h>
 #include <unistd.h>
 
+#include <cstring>
 #include <filesystem>
+#include <fstream>
 #include <limits>
 
 #include "tests/support/case_name.h"
@@ -32,6 +36,10 @@ class SettingsTest : public support::World {
   void SetUp() override {
     World::SetUp();
     Kernel::release();
+  }
+  void TearDown() override {
+    Kernel::release();
+    World::TearDown();
   }
 
   static void setTokenMax(const std::string& value) {
@@ -141,8 +149,7 @@ const File kFiles[] = {
     {"Comments", "// rows\n{/* most */ \"token_max\": 500 // of tokens\n}", 500},
     {"WindowsLines", "{\r\n\"token_max\": 500\r\n}\r\n", 500},
     {"LastOfDuplicateKeys", R"({"token_max": 400, "token_max": 500})", 500},
-    {"ManyKeys", "{" + repeat("\"filler\": \"............\", ", 40000) + "\"token_max\": 500}",
-     500},
+    {"ManyKeys", "{" + repeat("\"filler\": \"............\", ", 2000) + "\"token_max\": 500}", 500},
     {"NestedFiveHundredDeep",
      "{\"x\": " + repeat("[", 500) + repeat("]", 500) + ", \"token_max\": 500}", 500},
     {"NestedFiveThousandDeep",
@@ -178,6 +185,25 @@ TEST_F(SettingsTest, FifoThatStaysOpenIsAbsentAndNotWaitedFor) {
   const int descriptor = open(kSettings, O_RDWR);
   const std::string text = R"({"token_max": 500})";
   ASSERT_EQ(write(descriptor, text.data(), text.size()), static_cast<ssize_t>(text.size()));
+  EXPECT_EQ(tokenMax(), kDefaultRows);
+  std::string left(text.size(), ' ');
+  EXPECT_EQ(read(descriptor, left.data(), left.size()), static_cast<ssize_t>(text.size()));
+  EXPECT_EQ(left, text);  // its reader's, not ours
+  close(descriptor);
+}
+
+TEST_F(SettingsTest, DeviceIsAbsentAndNotReadFrom) {
+  fs::create_symlink("/dev/null", kSettings);
+  EXPECT_EQ(tokenMax(), kDefaultRows);
+  EXPECT_EQ(Kernel::reads(), 0);
+}
+
+TEST_F(SettingsTest, SocketIsAbsent) {
+  const int descriptor = socket(AF_UNIX, SOCK_STREAM, 0);
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  std::strncpy(address.sun_path, kSettings, sizeof address.sun_path - 1);
+  ASSERT_EQ(bind(descriptor, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
   EXPECT_EQ(tokenMax(), kDefaultRows);
   close(descriptor);
 }
@@ -254,14 +280,44 @@ TEST_F(SettingsTest, BrokenFileDoesNotSpoilTheNextReading) {
   }
 }
 
+/// A file of so many bytes that says 500 at its end.
+void writeSettingsOfSize(std::size_t size) {
+  const std::string end = "\"token_max\": 500}";
+  std::ofstream(names::kSettingsFile) << '{' << std::string(size - end.size() - 1, ' ') << end;
+}
+
 /// Sizes around those of read buffers.
-TEST_F(SettingsTest, FilesOfAnySizeAreReadToTheEnd) {
-  for (const int size : {4095, 4096, 4097, 8192, 65536, 1 << 20}) {
-    const std::string end = "\"token_max\": 500}";
-    const std::string blanks(static_cast<std::size_t>(size) - end.size() - 1, ' ');
-    writeSettings("{" + blanks + end);
+TEST_F(SettingsTest, FilesUpTo64KibibytesAreReadToTheEnd) {
+  for (const std::size_t size : {4095U, 4096U, 4097U, 8192U, 65535U, 65536U}) {
+    writeSettingsOfSize(size);
     EXPECT_EQ(tokenMax(), 500) << size << " bytes";
   }
+}
+
+TEST_F(SettingsTest, LargerFilesAreAbsent) {
+  for (const std::size_t size : {65537U, 69632U, 1U << 20U}) {
+    writeSettingsOfSize(size);
+    EXPECT_EQ(tokenMax(), kDefaultRows) << size << " bytes";
+    EXPECT_EQ(codeLifetime(), kDefaultSeconds);
+  }
+}
+
+TEST_F(SettingsTest, NoMoreThan64KibibytesOfALargeFileAreLookedAt) {
+  writeSettings("{");
+  fs::resize_file(kSettings, 1U << 26U);
+  EXPECT_EQ(tokenMax(), kDefaultRows);
+  EXPECT_LE(Kernel::reads(), 17);  // of 4096 bytes each
+}
+
+TEST_F(SettingsTest, FileThatGrowsWhileItIsReadIsAbsentInTheEnd) {
+  setTokenMax("500");
+  int grown = 0;
+  Kernel::beforeRead([&] {
+    if (++grown > 100) return;
+    std::ofstream(kSettings, std::ios::app) << std::string(4096, ' ');
+  });
+  EXPECT_EQ(tokenMax(), kDefaultRows);
+  EXPECT_LE(grown, 17);
 }
 
 TEST_F(SettingsTest, FileIsOpenedOncePerCall) {
