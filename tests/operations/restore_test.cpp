@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
 
 #include "tests/faults/small_medium.h"
@@ -16,6 +17,7 @@ namespace fs = std::filesystem;
 using testing::AnyOf;
 using testing::HasSubstr;
 using testing::IsEmpty;
+using testing::Not;
 
 class Restore : public Operations {
  protected:
@@ -294,6 +296,23 @@ TEST_F(Restore, OntoAFullDiskKeepsTheOldStore) {
   medium.empty();
   EXPECT_THAT(restore(), ExitsWith(cli::kOk));
   EXPECT_EQ(contentOf(), then_);
+}
+
+// Whoever waits for the lock waits for the disk: a restore keeps them waiting no
+// longer than any change does.
+TEST_F(Restore, SyncsTheStoreAsOftenAsTheWritingOfOneRow) {
+  const auto syncs = [](const Arguments& arguments) {
+    std::vector<std::string> steps = stepsOf(arguments);
+    const auto isOther = [](const std::string& step) {
+      return step.rfind(std::string("sync ") + kDatabase, 0) != 0;
+    };
+    steps.erase(std::remove_if(steps.begin(), steps.end(), isOther), steps.end());
+    fs::remove("/tmp/steps");
+    return steps;
+  };
+  const std::vector<std::string> ofARow = syncs({"log", "add", "entry"});
+  EXPECT_THAT(ofARow, Not(IsEmpty()));
+  EXPECT_EQ(syncs({"restore", "--yes", kCopy}), ofARow);
 }
 
 TEST_F(Restore, GivesUpOnALockThatNeverGoes) {
