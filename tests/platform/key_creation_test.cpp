@@ -201,13 +201,14 @@ void PrintTo(const BadPlace& place, std::ostream* out) {
 class BadPlaceTest : public KeyCreationTest, public ::testing::WithParamInterface<BadPlace> {};
 
 TEST_P(BadPlaceTest, IsOneLinePerCallAndNoKey) {
-  writeFile("/tmp/file", "");
+  std::filesystem::create_directory("/tmp/places");
+  writeFile("/tmp/places/file", "");
   useKeyFile(GetParam().path);
   EXPECT_EQ(encrypt("text"), std::nullopt);
   expectOneLine(GetParam().path, GetParam().reason);
   EXPECT_EQ(decrypt("BuUUoEG87WCe74gPRP1q0g"), std::nullopt);
   expectOneLine(GetParam().path, GetParam().reason);
-  EXPECT_THAT(filesIn("/tmp"), ElementsAre("file"));
+  EXPECT_THAT(filesIn("/tmp/places"), ElementsAre("file"));
   EXPECT_THAT(filesIn(kStateDir), IsEmpty());
 }
 
@@ -219,12 +220,12 @@ std::string dots(int count) {
 }
 
 const BadPlace kBadPlaces[] = {
-    {"MissingFolder", "/tmp/absent/keldcore.key", "No such file or directory"},
-    {"FileForAFolder", "/tmp/file/keldcore.key", "Not a directory"},
-    {"NameWithoutRoomForADraft", "/tmp/" + std::string(250, 'k'), "File name too long"},
-    {"PathWithoutRoomForADraft", "/tmp/" + dots(2043) + "k", "File name too long"},
-    {"NameTooLong", "/tmp/" + std::string(256, 'k'), "File name too long"},
-    {"PathTooLong", "/tmp/" + std::string(5000, 'k'), "File name too long"},
+    {"MissingFolder", "/tmp/places/absent/keldcore.key", "No such file or directory"},
+    {"FileForAFolder", "/tmp/places/file/keldcore.key", "Not a directory"},
+    {"NameWithoutRoomForADraft", "/tmp/places/" + std::string(250, 'k'), "File name too long"},
+    {"PathWithoutRoomForADraft", "/tmp/places/" + dots(2040) + "k", "File name too long"},
+    {"NameTooLong", "/tmp/places/" + std::string(256, 'k'), "File name too long"},
+    {"PathTooLong", "/tmp/places/" + std::string(5000, 'k'), "File name too long"},
 };
 INSTANTIATE_TEST_SUITE_P(KeyCreation, BadPlaceTest, ::testing::ValuesIn(kBadPlaces),
                          support::CaseName());
