@@ -18,44 +18,43 @@ if [[ ${KELDOAUTH_IN_SANDBOX:-} != entered ]]; then
 fi
 unset KELDOAUTH_IN_SANDBOX
 
-tmpfs() { mount -t tmpfs -o "mode=$1" tmpfs "$2"; }
+# -n: the host's table of mounts is not ours to write, or even closed to us.
+tmpfs() { mount -n -t tmpfs -o "mode=$1" tmpfs "$2"; }
+# What a mount hides is still to be had through a descriptor opened before.
+put_back() { mount -n --no-canonicalize "$1" "/proc/self/fd/$2" "$3"; }
 
-# What the mounts below would hide is kept at hand under /mnt until the end.
-tmpfs 755 /mnt
-mkdir /mnt/project /mnt/var
-mount --rbind "$project" /mnt/project
-mount --rbind /var /mnt/var
+exec {project_fd}<"$project" {var_fd}</var
 if [[ -n ${KELDOAUTH_STATE:-} ]]; then
-  mkdir /mnt/state
-  mount --bind "$KELDOAUTH_STATE" /mnt/state
+  exec {state_fd}<"$KELDOAUTH_STATE"
 fi
 
 tmpfs 1777 /tmp
 
 # The host may have no /var/packages to mount over, and must not get one.
 tmpfs 755 /var
-for entry in /mnt/var/*; do
+for entry in "/proc/self/fd/$var_fd"/*; do
   name=${entry##*/}
   if [[ -L $entry ]]; then
     cp -P "$entry" "/var/$name"
   elif [[ -d $entry && $name != packages ]]; then
     mkdir "/var/$name"
-    mount --rbind "$entry" "/var/$name"
+    mount -n --no-canonicalize --rbind "$entry" "/var/$name"
   fi
 done
 (umask 022 && mkdir -p "$state_dir")
 if [[ -n ${KELDOAUTH_STATE:-} ]]; then
-  mount --move /mnt/state "$state_dir"
+  put_back --bind "$state_fd" "$state_dir"
+  exec {state_fd}<&-
 else
   tmpfs 700 "$state_dir"
 fi
 
 if [[ ! -e $project/CMakeLists.txt ]]; then
   mkdir -p "$project"
-  mount --rbind /mnt/project "$project"
+  put_back --rbind "$project_fd" "$project"
 fi
+exec {project_fd}<&- {var_fd}<&-
 cd "${KELDOAUTH_CWD:-$project}"
-umount -R -l /mnt
 
 if [[ -n ${KELDOAUTH_LIB_DIR:-} ]]; then
   export LD_LIBRARY_PATH=$KELDOAUTH_LIB_DIR${LD_LIBRARY_PATH:+:$LD_LIBRARY_PATH}
