@@ -43,6 +43,10 @@ install(FILES ${CMAKE_CURRENT_BINARY_DIR}/keldoauth.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)
 
 file(GLOB documents docs/*.md)
-install(FILES README.md ${documents} DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT dev)
+# Documents keep their folders, so that they find each other.
+install(FILES README.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT dev)
+install(FILES ${documents} DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs COMPONENT dev)
+install(FILES platform/README.md platform/keldcore.h platform/keldcgi.h
+  DESTINATION ${CMAKE_INSTALL_DOCDIR}/platform COMPONENT dev)
 install(FILES examples/first_token.cpp
   DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT dev)

@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# Builds a consumer in one of the three ways and runs it in private mounts.
-# Usage: run.sh BUILD-FOLDER find_package|pkg_config|subdirectory
+# Builds a consumer in one of the three ways and runs it in private mounts; or
+# looks whether every link of the installed documents leads to something.
+# Usage: run.sh BUILD-FOLDER find_package|pkg_config|subdirectory|documents
 set -euo pipefail
 
 build=$1
@@ -17,20 +18,35 @@ if [[ $way != subdirectory ]]; then
   libraries=$(dirname "$(find "$prefix" -name libkeldoauth.so.1)")
 fi
 
+run_consumer() { KELDOAUTH_LIB_DIR=$libraries "$here/../support/sandbox.sh" "$work/consumer"; }
+
 case $way in
   find_package)
-    cmake -S "$here/find_package" -B "$work" -G Ninja -DCMAKE_PREFIX_PATH="$prefix" >/dev/null
-    cmake --build "$work" >/dev/null
+    # Whether or not JsonCpp says where it is, without pkg-config, and by a
+    # consumer that did not think of the language's version.
+    for without in jsoncpp PkgConfig; do
+      cmake -S "$here/find_package" -B "$work" -G Ninja --fresh --no-warn-unused-cli \
+        -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_CXX_STANDARD=14 \
+        -DCMAKE_DISABLE_FIND_PACKAGE_PkgConfig=ON \
+        -DCMAKE_DISABLE_FIND_PACKAGE_"$without"=ON >/dev/null
+      cmake --build "$work" --clean-first >/dev/null
+      run_consumer
+    done
+    exit
     ;;
   pkg_config)
     export PKG_CONFIG_PATH=$libraries/pkgconfig
-    read -ra flags <<<"$(pkg-config --cflags --libs keldoauth)"
+    flags=()
+    # It writes a blank within a path as a shell would take it.
+    eval "flags=($(pkg-config --cflags --libs keldoauth))"
     g++ -std=c++17 "$here/consumer.cpp" "${flags[@]}" -o "$work/consumer"
     ;;
   subdirectory)
     cmake -S "$here/subdirectory" -B "$work" -G Ninja -DKELDOAUTH_PLATFORM=standin >/dev/null
     cmake --build "$work" --target consumer >/dev/null
     ;;
+  documents)
+    exec "$here/check-links" "$prefix"
+    ;;
 esac
-
-KELDOAUTH_LIB_DIR=$libraries "$here/../support/sandbox.sh" "$work/consumer"
+run_consumer
