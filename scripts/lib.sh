@@ -17,6 +17,14 @@ die() {
   exit 1
 }
 
+# Every script tells its usage when asked: the words at its head.
+case ${1:-} in
+  -h | --help)
+    sed -n '2,/^[^#]/ s/^# \{0,1\}//p' "$0"
+    exit
+    ;;
+esac
+
 # progress TEXT: one line that says what is going on.
 progress() { printf '%s==> %s%s\n' "$bold" "$*" "$plain"; }
 
