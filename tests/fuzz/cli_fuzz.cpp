@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <iostream>
 #include <memory>
 #include <sstream>
@@ -15,6 +16,7 @@
 #include <vector>
 
 #include "tests/fuzz/world.h"
+#include "utils/oauth_names.h"
 
 /// The tool's own, under another name.
 int keldoauth_main(int argc, char** argv);
@@ -49,6 +51,8 @@ std::string harmless(std::string argument) {
 bool enterPrivateFolder() {
   World::instance();  // refuses to run outside private mounts
   std::filesystem::create_directory("/tmp/cli");
+  // The tool asks whether the file is there; what is in it lies in memory.
+  std::ofstream(KELDOAUTHSERVER::names::kDatabaseFile, std::ios::app).flush();
   return chdir("/tmp/cli") == 0 && unsetenv("COLUMNS") == 0;
 }
 
@@ -101,8 +105,15 @@ Run run(const Texts& arguments) {
 
 // What holds of every run -----------------------------------------------------------
 
+/// U+0080 to U+009F, as UTF-8 writes them.
+bool hasC1Control(const std::string& text) {
+  return std::adjacent_find(text.begin(), text.end(), [](char first, char second) {
+           return first == '\xc2' && (second & '\xe0') == '\x80';
+         }) != text.end();
+}
+
 bool isPrintable(const std::string& text) {
-  return std::all_of(text.begin(), text.end(), [](char c) {
+  return !hasC1Control(text) && std::all_of(text.begin(), text.end(), [](char c) {
     return c == '\n' || (static_cast<unsigned char>(c) >= ' ' && c != '\x7f');
   });
 }
@@ -143,12 +154,18 @@ void check(const Run& run) {
   if (wantsJson(run.arguments)) checkJson(run.out);
 }
 
+bool listsClients() {
+  return run({"client", "list"}).exit == 0;
+}
+
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   static const bool isSafe = enterPrivateFolder();
   expect(isSafe, "a private folder");
   World::instance().startOver();
+  static const bool isAtWork = listsClients();
+  expect(isAtWork, "a store that the tool finds");
 
   fuzz::Input input(data, size);
   offerInput(input.text());
