@@ -250,6 +250,10 @@ int OAUTHDBBasic::Run(const std::string& sql, RowCallback callback, Json::Value*
   if (isTraced(kCoreTrace)) {
     syslog(LOG_ERR, "%s:%d ==> %s[%s]", kSource, line::kDBCmdRunEntry, "DBCmdRun", sql.c_str());
   }
+  return Execute(sql, callback, arg);
+}
+
+int OAUTHDBBasic::Execute(const std::string& sql, RowCallback callback, Json::Value* arg) {
   const OwnCallback* const own = findOwn(callback);
   if (own != nullptr && !canFill(*own, arg)) return Fail(errors::kBadParameters);
 
@@ -286,6 +290,9 @@ int OAUTHDBBasic::TabGetCallback(void* arg, int count, char** values, char** col
 int OAUTHDBBasic::DBInit() try {
   ready_ = lender_ != nullptr ? lender_->ready_ : 0;
   if (lender_ != nullptr || db_ == nullptr) return ready_;
+
+  // Within a transaction SQLite keeps to the setting that stands.
+  if (!InTransaction() && Execute(schema::kSyncFolderToo, nullptr, nullptr) == 0) return ready_;
 
   if (isTraced(kCoreTrace)) {
     syslog(LOG_ERR, "%s:%d ==> %s[init meta table]", kSource, line::kInitMetaEntry, __func__);

@@ -34,9 +34,10 @@ class OAUTHDBBasic {
   /// Opens names::kDatabaseFile with raised privileges, creates the file (mode
   /// 0600) and any missing table, and keeps the connection for life. A
   /// statement that meets another process's lock waits up to 5 seconds for it.
-  /// When the file cannot be opened: SQLite's code, "Open DB failed!!". When a
-  /// table cannot be created: -1, "Create table failed". In both cases the
-  /// object is not ready and refuses every later operation; there is no reopen.
+  /// When the file cannot be opened: SQLite's code, "Open DB failed!!". When it
+  /// is no database or stays locked: SQLite's code and text. When a table cannot
+  /// be created: -1, "Create table failed". In each case the object is not ready
+  /// and refuses every later operation; there is no reopen.
   OAUTHDBBasic();
 
   /// Closes the connection, again with raised privileges, unless it is lent.
@@ -88,7 +89,9 @@ class OAUTHDBBasic {
 
   // Schema ------------------------------------------------------------------
 
-  /// Creates what is missing and marks the object ready; returns the ready
+  /// Has SQLite sync what commits a change before it acknowledges the change
+  /// (within a transaction it allows no such thing, and the setting stays as it
+  /// is), creates what is missing and marks the object ready; returns the ready
   /// flag, which is cleared first. Does nothing without a connection. On a lent
   /// connection it takes over whether the lending object is ready, no more. The
   /// constructors call it.
@@ -203,6 +206,7 @@ class OAUTHDBBasic {
   // The bodies of the public operations that start-up must see fail: they
   // throw.
   int Run(const std::string& sql, RowCallback callback, Json::Value* arg);
+  int Execute(const std::string& sql, RowCallback callback, Json::Value* arg);  // without a trace
   int FindTable(const std::string& name);
   void InsertMetaRows();
 

@@ -36,6 +36,11 @@ inline constexpr char kCreateLog[] =
     "CREATE TABLE IF NOT EXISTS oauth_log(timestamp integer NOT NULL, msg text NOT NULL, "
     "id integer PRIMARY KEY);";
 
+/// The removal of the journal is what commits. SQLite leaves that to the file
+/// system, which may hold it back for seconds, unless it is told to sync the
+/// folder as well.
+inline constexpr char kSyncFolderToo[] = "PRAGMA synchronous=EXTRA;";
+
 /// One step of start-up after the meta table.
 struct Step {
   const char* table;

@@ -35,7 +35,7 @@ void PrintTo(const Pragma& pragma, std::ostream* out) {
 
 class PragmaTest : public ConnectionTest, public ::testing::WithParamInterface<Pragma> {};
 
-TEST_P(PragmaTest, IsAsTheEngineHasIt) {
+TEST_P(PragmaTest, IsAsTheEngineHasItButForTheFoldersSync) {
   OAUTHDBBasic store;
   Json::Value rows(Json::arrayValue);
   ASSERT_EQ(
@@ -46,7 +46,7 @@ TEST_P(PragmaTest, IsAsTheEngineHasIt) {
 }
 
 const Pragma kPragmas[] = {
-    {"journal_mode", "delete"}, {"synchronous", "2"}, {"locking_mode", "normal"},
+    {"journal_mode", "delete"}, {"synchronous", "3"}, {"locking_mode", "normal"},
     {"foreign_keys", "0"},      {"auto_vacuum", "0"}, {"encoding", "UTF-8"},
     {"temp_store", "0"},        {"query_only", "0"},  {"cache_size", "-2000"},
 };

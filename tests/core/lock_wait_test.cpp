@@ -83,18 +83,21 @@ TEST_F(LockWaitTest, StartUpWaitsToo) {
   });
   OAUTHDBBasic other;
   EXPECT_EQ(Waiting::naps(), 7);
-  EXPECT_EQ(other.DBCmd("SELECT 1", nullptr, nullptr), 1);
+  Json::Value setting(Json::arrayValue);
+  EXPECT_EQ(other.DBCmd("PRAGMA synchronous", OAUTHDBBasic::TabCountCallback, &setting), 1);
+  EXPECT_EQ(setting, json("['3']"));
   EXPECT_THAT(SystemLog::lines(), IsEmpty());
 }
 
 TEST_F(LockWaitTest, StartUpThatWaitsInVainIsNotReady) {
   holder->run("BEGIN EXCLUSIVE");
   waitInVain();
-  const OAUTHDBBasic other;
-  expectError(other, -1, "Create table failed");
-  EXPECT_THAT(messages(), ElementsAre("Run Command failed!![database is locked][5]",
-                                      "Run Command failed!![database is locked][5]",
-                                      "Create Table failed!![meta]"));
+  OAUTHDBBasic other;
+  EXPECT_EQ(Waiting::napped(), kLimit);
+  expectError(other, kLocked, "database is locked");
+  EXPECT_THAT(lines(), ElementsAre(runFailed("database is locked", kLocked)));
+  holder->run("COMMIT");
+  EXPECT_EQ(other.DBCmd("SELECT 1", nullptr, nullptr), 0);
 }
 
 TEST_F(LockWaitTest, WaitGoesInEvenStepsOfAMillisecond) {

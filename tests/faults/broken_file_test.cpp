@@ -191,8 +191,8 @@ TEST_F(BrokenFileTest, ThatIsATextIsLeftAlone) {
   const std::string text = "Dear diary, this is no database. " + std::string(2000, '.');
   replaceFile(text);
   const OAUTHDBToken tokens(names::kTokenTable);
-  EXPECT_EQ(tokens.GetErrCode(), -1);
-  EXPECT_EQ(tokens.GetErrMsg(), "Create table failed");
+  EXPECT_EQ(tokens.GetErrCode(), SQLITE_NOTADB);
+  EXPECT_EQ(tokens.GetErrMsg(), "file is not a database");
   EXPECT_GT(SystemLog::count("Run Command failed!![file is not a database][26]"), 0);
   workOnIt();
   EXPECT_EQ(readFile(kDatabase), text);

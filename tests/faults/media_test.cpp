@@ -188,7 +188,7 @@ TEST_F(ReadOnlyMediumTest, WithAHotJournalIsNotReady) {
   OAUTHDBToken tokens(names::kTokenTable);
   Json::Value rows;
   EXPECT_FALSE(isReady(tokens));
-  EXPECT_EQ(tokens.GetErrMsg(), "Create table failed");
+  EXPECT_EQ(tokens.GetErrMsg(), "attempt to write a readonly database");
   EXPECT_FALSE(tokens.Get(&rows));
 }
 

@@ -277,7 +277,7 @@ TEST_F(Restore, OfAFileThatIsNotThere) {
 TEST_F(Restore, OverADamagedDatabaseSaysToMoveItAway) {
   writeFile(kDatabase, std::string(4096, 'x'));
   expectRefused(kCopy,
-                "Create table failed: file is not a database (26)\n"
+                "file is not a database (26)\n"
                 "hint: if the database is damaged, move it away together with its journal\n",
                 cli::kUnavailable);
 }

@@ -194,8 +194,8 @@ TEST_F(VerifyTest, ObjectThatIsNotReadyReportsTheErrorItCarries) {
   Json::Value result;
   EXPECT_FALSE(notReady.Verify(id64('a'), result));
   EXPECT_EQ(result["err_code"].asInt(), notReady.GetErrCode());
-  EXPECT_EQ(result["err_msg"].asString(), "Create table failed");
-  EXPECT_EQ(result["err_code"].asInt(), -1);
+  EXPECT_EQ(result["err_msg"].asString(), "file is not a database");
+  EXPECT_EQ(result["err_code"].asInt(), 26);
 }
 
 // Expiry texts --------------------------------------------------------------------

@@ -260,11 +260,10 @@ TEST_F(Status, ADatabaseThatIsNone) {
   const Json::Value database = json({"status"}, "", kUnhealthy)["database"];
   EXPECT_EQ(database["ready"], Json::Value(false));
   EXPECT_EQ(database["code"], Json::Value(26));
-  EXPECT_EQ(database["message"], "Create table failed: file is not a database");
-  EXPECT_THAT(problems(), ElementsAre("database: not ready: Create table failed: "
+  EXPECT_EQ(database["message"], "file is not a database");
+  EXPECT_THAT(problems(), ElementsAre("database: not ready: "
                                       "file is not a database (26)"));
-  EXPECT_THAT(run({"status"}).out,
-              HasSubstr("\nDatabase     Create table failed: file is not a database\n"));
+  EXPECT_THAT(run({"status"}).out, HasSubstr("\nDatabase     file is not a database\n"));
 }
 
 TEST_F(Status, AMalformedSchema) {

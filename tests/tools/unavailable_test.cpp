@@ -55,7 +55,7 @@ TEST_F(Unavailable, ADamagedDatabase) {
   const Outcome outcome = run({"client", "list"});
   EXPECT_THAT(outcome, ExitsWith(kUnavailable));
   EXPECT_EQ(outcome.err,
-            "keldoauth: client list: Create table failed: file is not a database (26)\n"
+            "keldoauth: client list: file is not a database (26)\n"
             "hint: the database file is damaged; put back a copy or move the file away\n");
 }
 
