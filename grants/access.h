@@ -1,0 +1,99 @@
+// Who has access to what, and ending it.
+
+#ifndef KELDOAUTH_GRANTS_ACCESS_H
+#define KELDOAUTH_GRANTS_ACCESS_H
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "grants/outcome.h"
+#include "grants/texts.h"
+
+namespace KELDOAUTHSERVER::grants {
+
+class Store;
+
+/// Names one code, login or own token as it was read. The row's id alone names
+/// nothing: ids are given out again.
+struct AccessHandle {
+  enum class Table { kCodes, kTokens };
+  Table table;
+  long long row;
+  std::string mark;  // a digest of what the row held: no use to anybody else
+};
+
+/// One row. Rows of other programs are here, too.
+struct AccessEntry {
+  enum class Kind {
+    kCode,   // agreed to, not logged in yet
+    kSpent,  // a code that was redeemed; remembered in case it comes again
+    kLogin,  // a pair of tokens
+    kOwn,    // a token of an application that acts for itself
+  };
+  AccessHandle handle;
+  Kind kind;
+  std::optional<User> user;  // none for kOwn
+  ApplicationId application;
+  /// None when the application is not registered any more.
+  std::optional<ApplicationName> applicationName;
+  Scope scope;        // of the login
+  long long since;    // Unix seconds: of the login; 0 when not known
+  long long renewed;  // when the present tokens were issued; 0 likewise
+  long long expires;  // of the access token or the code
+  long long ends;     // when it is dead if nobody uses it
+  PeerAddress from;   // of the last request that renewed it
+  std::string flow;   // "authorization_code", "client_credentials"; empty for a code
+  CallerText text;    // of other programs' rows: their state
+  bool isDead;        // no good any more, and gone with the next purge
+  bool isForeign;     // stored by another program, in the clear
+};
+
+/// What is absent does not narrow.
+struct AccessFilter {
+  std::optional<User> user = {};
+  std::optional<ApplicationId> application = {};
+  bool withDead = false;   // also what is dead
+  bool withSpent = false;  // also codes that were redeemed
+};
+
+struct Ended {
+  int codes;   // that were not redeemed yet
+  int tokens;  // logins and own tokens
+};
+
+/// Each throws Trouble. What ends something leaves one audit entry when there
+/// was something to end.
+class Access {
+ public:
+  explicit Access(Store& store) : store_(store) {}
+
+  /// In the order of the rows, codes first. A filter with a user leaves out
+  /// what applications have for themselves.
+  [[nodiscard]] std::vector<AccessEntry> list(const AccessFilter& filter) const;
+
+  /// The entry that a code or token belongs to, dead or not.
+  [[nodiscard]] std::optional<AccessEntry> find(const Code& code) const;
+  [[nodiscard]] std::optional<AccessEntry> find(const AnyToken& token) const;
+
+  /// What the handle named, if it is still as it was read; else nothing.
+  Ended end(const AccessHandle& handle, const Actor& by);
+
+  /// Several in one transaction; those that are not as they were are left out.
+  Ended end(const std::vector<AccessHandle>& handles, const Actor& by);
+
+  /// Codes included. A user is found in both spellings in which other programs
+  /// may have stored quotes.
+  Ended endUser(const User& user, const Actor& by);
+  Ended endUserWith(const User& user, const ApplicationId& application, const Actor& by);
+  /// Logins and own tokens; the application stays registered.
+  Ended endApplication(const ApplicationId& application, const Actor& by);
+  Ended endEverything(const Actor& by);
+
+ private:
+  Store& store_;
+};
+
+}  // namespace KELDOAUTHSERVER::grants
+
+#endif  // KELDOAUTH_GRANTS_ACCESS_H

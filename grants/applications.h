@@ -1,0 +1,129 @@
+// The registry of applications.
+//
+// Rows that the registry's own Add stored have addresses without a scheme: they
+// come as they stand there.
+
+#ifndef KELDOAUTH_GRANTS_APPLICATIONS_H
+#define KELDOAUTH_GRANTS_APPLICATIONS_H
+
+#include <optional>
+#include <vector>
+
+#include "grants/outcome.h"
+#include "grants/texts.h"
+
+namespace KELDOAUTHSERVER::grants {
+
+class Store;
+
+/// A confidential application has a secret. A public one, whose every user
+/// holds its code, has none.
+enum class ApplicationKind { kConfidential, kPublic };
+
+struct Application {
+  ApplicationId identifier;
+  ApplicationName name;
+  ApplicationKind kind;
+  bool isEnabled;
+  std::vector<RedirectAddress> addresses;
+  std::vector<LogoutAddress> logoutAddresses;
+  Scope scope;            // the most that it may be granted
+  bool needsPkce;         // always true of a public one
+  bool registeredItself;  // not by an administrator
+  long long row;          // for showing only: ids are given out again
+};
+
+struct NewApplication {
+  ApplicationName name;
+  /// Absolute addresses in printable ASCII without a blank; none for an
+  /// application that only acts for itself. What else an address must be is
+  /// the service's to say. Together with what else is remembered of the
+  /// application, a blank between any two, 2048 bytes.
+  std::vector<RedirectAddress> addresses;
+  Scope scope;
+  ApplicationKind kind = ApplicationKind::kConfidential;
+  std::vector<LogoutAddress> logoutAddresses = {};  // as the addresses
+  bool needsPkce = true;
+  bool registersItself = false;
+  bool isEnabled = true;
+  /// Generated when absent. An identifier has 64 of the letters, digits and
+  /// "-._~".
+  std::optional<ApplicationId> identifier = {};
+  /// Generated when absent. Printable ASCII; not with a public one.
+  std::optional<Secret> secret = {};
+};
+
+/// The secret is told this once; none for a public application.
+struct Registered {
+  ApplicationId identifier;
+  std::optional<Secret> secret;
+};
+
+/// What is absent stays as it is, however it is stored.
+struct ApplicationChange {
+  std::optional<ApplicationName> name = {};
+  std::optional<std::vector<RedirectAddress>> addresses = {};
+  std::optional<std::vector<LogoutAddress>> logoutAddresses = {};
+  std::optional<Scope> scope = {};
+  std::optional<bool> needsPkce = {};
+};
+
+struct Removed {
+  int codes;
+  int tokens;
+};
+
+/// Every operation that changes something leaves one entry in the audit log
+/// and fails when it cannot. Each throws Trouble.
+class Applications {
+ public:
+  explicit Applications(Store& store) : store_(store) {}
+
+  /// Refusals: kInvalidRedirectUri for addresses, kInvalidClientMetadata for
+  /// the rest. A name that has an identifier's form (64 letters, digits and
+  /// "-._~") is refused. When applications that registered themselves have
+  /// their part of the registry, the oldest of them that has neither a code
+  /// nor a token goes, or else the registry is full. Trouble: kFull.
+  Outcome<Registered> add(const NewApplication& application, const Actor& by);
+
+  // Look-ups ------------------------------------------------------------------
+
+  std::optional<Application> find(const ApplicationId& identifier) const;
+  /// Several applications may have one name.
+  std::vector<Application> named(const ApplicationName& name) const;
+  std::vector<Application> all() const;
+
+  /// The enabled application that has shown this secret, compared in constant
+  /// time; without a secret, an enabled public one. Refusals: kInvalidClient.
+  Outcome<Application> authenticate(const ApplicationId& identifier,
+                                    const std::optional<Secret>& secret) const;
+
+  /// For the administrator's eyes; none for a public application.
+  std::optional<Secret> secretOf(const ApplicationId& identifier) const;
+
+  // Changes -------------------------------------------------------------------
+  // Refusals: kInvalidClient (kNoApplication), and as `add`.
+
+  Outcome<Application> change(const ApplicationId& identifier, const ApplicationChange& change,
+                              const Actor& by);
+
+  /// The old secret is no good from now on. Refused (kUnauthorizedClient) for a
+  /// public application.
+  Outcome<Secret> renewSecret(const ApplicationId& identifier, const Actor& by);
+
+  /// Nothing of a disabled application is issued, redeemed, refreshed or
+  /// verified. Its rows stay, and serve again when it is enabled. Doing it
+  /// twice is no fault and leaves no second entry.
+  Outcome<Done> enable(const ApplicationId& identifier, const Actor& by);
+  Outcome<Done> disable(const ApplicationId& identifier, const Actor& by);
+
+  /// The application with its codes and tokens.
+  Outcome<Removed> remove(const ApplicationId& identifier, const Actor& by);
+
+ private:
+  Store& store_;
+};
+
+}  // namespace KELDOAUTHSERVER::grants
+
+#endif  // KELDOAUTH_GRANTS_APPLICATIONS_H
