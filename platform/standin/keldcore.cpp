@@ -33,14 +33,14 @@ struct Schedule {
   siv_cmac_aes256_ctx context{};
 };
 
-const siv_cmac_aes256_ctx* scheduledKey() {
+const siv_cmac_aes256_ctx* scheduledKey(keldcore::WhenAbsent whenAbsent) {
   thread_local Schedule schedule;
   const char* path = keldcore::keyFilePath();
   if (keldcore::isUnchanged(path, schedule.stamp)) return &schedule.context;
 
   schedule = {};
   keldcore::Key key;
-  if (!keldcore::loadKey(path, key, schedule.stamp)) return nullptr;
+  if (!keldcore::loadKey(path, whenAbsent, key, schedule.stamp)) return nullptr;
   siv_cmac_aes256_set_key(&schedule.context, key.bytes.data());
   return &schedule.context;
 }
@@ -78,7 +78,7 @@ int KCORECryptSzEncrypt(const char* clear, char* out, size_t outSize) {
   const std::size_t size = std::strlen(clear) + SIV_DIGEST_SIZE;
   if (size > kMaxSealed) return 0;
 
-  const siv_cmac_aes256_ctx* key = scheduledKey();
+  const siv_cmac_aes256_ctx* key = scheduledKey(keldcore::WhenAbsent::kMake);
   if (key == nullptr) return 0;
   Sealed sealed;
   siv_cmac_aes256_encrypt_message(key, kVersionLabel.size(), kVersionLabel.data(), 0, nullptr, size,
@@ -98,7 +98,7 @@ int KCORECryptSzDecrypt(const char* cipher, char* out, size_t outSize) {
   const std::size_t length = size - SIV_DIGEST_SIZE;
   if (length >= outSize) return 0;
 
-  const siv_cmac_aes256_ctx* key = scheduledKey();
+  const siv_cmac_aes256_ctx* key = scheduledKey(keldcore::WhenAbsent::kFail);
   if (key == nullptr) return 0;
   Sealed clear;
   const bool authentic =

@@ -10,10 +10,15 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "platform/standin/store_file.h"
+#include "utils/oauth_names.h"
+
 namespace keldcore {
 namespace {
 
 using PathBuffer = std::array<char, PATH_MAX>;
+
+constexpr char kDescriptors[] = "/proc/self/fd";
 
 class Descriptor {
  public:
@@ -51,6 +56,12 @@ const char* fault(const struct stat& status) {
   return nullptr;
 }
 
+/// `buffer` holds what is returned.
+const char* folderOf(const char* path, PathBuffer& buffer) {
+  std::snprintf(buffer.data(), buffer.size(), "%s", path);
+  return dirname(buffer.data());
+}
+
 bool readAll(int descriptor, Key& key) {
   std::size_t filled = 0;
   while (filled < key.bytes.size()) {
@@ -73,13 +84,13 @@ bool writeAll(int descriptor, const Key& key) {
   return true;
 }
 
-/// A private file beside the key's place, under a name that is gone at the end
-/// of the scope.
+/// A private file in the key's folder, without a name where the medium knows
+/// such files; else its name is gone at the end of the scope.
 class Draft {
  public:
   explicit Draft(const char* path) : file_(create(path)) {}
   ~Draft() {
-    if (file_.isOpen()) unlink(name_.data());
+    if (name_[0] != '\0') unlink(name_.data());
   }
   Draft(const Draft&) = delete;
   Draft& operator=(const Draft&) = delete;
@@ -96,28 +107,44 @@ class Draft {
   /// Never replaces: of several processes the first one wins, and the others
   /// use its key.
   [[nodiscard]] bool publish(const char* path) const {
-    return link(name_.data(), path) == 0 || errno == EEXIST;
+    std::array<char, 32> own{};
+    std::snprintf(own.data(), own.size(), "%s/%d", kDescriptors, file_.get());
+    const char* const from = name_[0] != '\0' ? name_.data() : own.data();
+    return linkat(AT_FDCWD, from, AT_FDCWD, path, AT_SYMLINK_FOLLOW) == 0 || errno == EEXIST;
   }
 
  private:
   int create(const char* path) {
-    const int length = std::snprintf(name_.data(), name_.size(), "%s.XXXXXX", path);
-    if (length < 0 || static_cast<std::size_t>(length) >= name_.size()) {
-      errno = ENAMETOOLONG;
-      return -1;
-    }
-    return mkostemp(name_.data(), O_CLOEXEC);
+    const int nameless = createNameless(path);
+    const bool isUnknown = errno == EOPNOTSUPP || errno == EISDIR || errno == EINVAL;
+    if (nameless >= 0 || !isUnknown) return nameless;
+
+    const int length = std::snprintf(name_.data(), name_.size(), "%s.draft-XXXXXX", path);
+    const bool fits = length >= 0 && static_cast<std::size_t>(length) < name_.size();
+    if (!fits) errno = ENAMETOOLONG;
+    const int named = fits ? mkostemp(name_.data(), O_CLOEXEC) : -1;
+    if (named < 0) name_[0] = '\0';
+    return named;
   }
 
-  PathBuffer name_{};
+  /// It gets its name by way of /proc, which a jail may lack.
+  static int createNameless(const char* path) {
+    if (faccessat(AT_FDCWD, kDescriptors, F_OK, 0) != 0) {
+      errno = EOPNOTSUPP;
+      return -1;
+    }
+    PathBuffer folder{};
+    return open(folderOf(path, folder), O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR);
+  }
+
+  PathBuffer name_{};  // empty without one
   Descriptor file_;
 };
 
 /// A new name survives a power cut only when its folder is synced, too.
 bool syncFolderOf(const char* path) {
-  PathBuffer copy{};
-  std::snprintf(copy.data(), copy.size(), "%s", path);
-  const Descriptor folder(open(dirname(copy.data()), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  PathBuffer buffer{};
+  const Descriptor folder(open(folderOf(path, buffer), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return folder.isOpen() && fsync(folder.get()) == 0;
 }
 
@@ -127,6 +154,18 @@ bool makeKey(const char* path) {
   const bool made = draft.isOpen() && getentropy(key.bytes.data(), key.bytes.size()) == 0 &&
                     draft.write(key) && draft.publish(path) && syncFolderOf(path);
   return made || refuse(path, errno);
+}
+
+/// Why no key may be made now, null when one may.
+const char* hindranceToMaking() {
+  switch (storedValues(KELDOAUTHSERVER::names::kDatabaseFile)) {
+    case StoredValues::kNone:
+      return nullptr;
+    case StoredValues::kSome:
+      return "is missing, and the store has values that it encrypted";
+    default:
+      return "is missing, and whether the store has values that it encrypted cannot be seen";
+  }
 }
 
 /// The key is no link: its place is where its folder's owner put it. And a pipe
@@ -151,14 +190,19 @@ const char* keyFilePath() {
   return chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE;
 }
 
-bool loadKey(const char* path, Key& key, FileStamp& stamp) {
+bool loadKey(const char* path, WhenAbsent whenAbsent, Key& key, FileStamp& stamp) {
   const Descriptor present(openKey(path));
   if (present.isOpen()) return readKey(path, present.get(), key, stamp);
   if (errno != ENOENT) return refuse(path, errno);
+  if (whenAbsent == WhenAbsent::kFail) return refuse(path, "is missing");
 
-  if (!makeKey(path)) return false;
+  const char* const hindrance = hindranceToMaking();
+  if (hindrance == nullptr && !makeKey(path)) return false;
+  // Also where it may not be made: another process may have made it and stored
+  // the values that we saw.
   const Descriptor made(openKey(path));
-  return made.isOpen() ? readKey(path, made.get(), key, stamp) : refuse(path, errno);
+  if (made.isOpen()) return readKey(path, made.get(), key, stamp);
+  return hindrance != nullptr ? refuse(path, hindrance) : refuse(path, errno);
 }
 
 bool isUnchanged(const char* path, const FileStamp& stamp) {

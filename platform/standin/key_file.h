@@ -43,11 +43,15 @@ struct FileStamp {
 /// with raised privileges), else the one set when this was built.
 const char* keyFilePath();
 
-/// Reads the key, and makes it when the file is absent: whole or not at all,
-/// and the same for all processes that race for it. False, with one line in the
-/// system log, when the file is not exactly a key, not a regular file of the
-/// effective user, or open to anybody else, and when it cannot be made.
-bool loadKey(const char* path, Key& key, FileStamp& stamp);
+/// Where there is no key, nothing can be decrypted, not by a new one either.
+enum class WhenAbsent { kMake, kFail };
+
+/// Reads the key. An absent one is made on demand: whole or not at all, the same
+/// for all processes that race for it, and only while the store has no value
+/// that an earlier one encrypted. False, with one line in the system log, when
+/// the file is not exactly a key, not a regular file of the effective user, or
+/// open to anybody else, and when it is absent and not made.
+bool loadKey(const char* path, WhenAbsent whenAbsent, Key& key, FileStamp& stamp);
 
 /// Whether the file of that stamp stands there, as it was.
 bool isUnchanged(const char* path, const FileStamp& stamp);

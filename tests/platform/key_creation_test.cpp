@@ -22,6 +22,7 @@
 namespace {
 
 using support::SystemLog;
+using ::testing::AnyOf;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
@@ -133,8 +134,19 @@ TEST_F(KeyCreationTest, HappensInAnyFolder) {
 TEST_F(KeyCreationTest, BytesAreOnTheDiskBeforeTheirNameAndTheNameBeforeTheFirstUse) {
   SystemCalls::follow([](const std::string&) { return 0; });
   encrypt("text");
-  EXPECT_THAT(SystemCalls::names(), ElementsAre("getentropy", "fchmod", "write", "fsync", "link",
-                                                "fsync folder", "unlink", "read"));
+  EXPECT_THAT(SystemCalls::names(), ElementsAre("O_TMPFILE", "getentropy", "fchmod", "write",
+                                                "fsync", "linkat", "fsync folder", "read"));
+}
+
+TEST_F(KeyCreationTest, MediumWithoutNamelessFilesGivesTheDraftAName) {
+  SystemCalls::fail("O_TMPFILE", EOPNOTSUPP);
+  const Text cipher = encrypt("text");
+  EXPECT_THAT(SystemCalls::names(),
+              ElementsAre("O_TMPFILE", "getentropy", "fchmod", "write", "fsync", "linkat",
+                          "fsync folder", "unlink", "read"));
+  SystemCalls::release();
+  EXPECT_EQ(cipher, seal(readFile(kKeyFile), "keldcore-1", "text"));
+  EXPECT_THAT(filesIn(kStateDir), ElementsAre("keldcore.key"));
 }
 
 TEST_F(KeyCreationTest, WritesMayBeShortAndInterrupted) {
@@ -172,7 +184,8 @@ const FailedStep kFailedSteps[] = {
     {"ModeRefused", "fchmod", EPERM, "Operation not permitted"},
     {"DiskFull", "write", ENOSPC, "No space left on device"},
     {"DiskBroken", "fsync", EIO, "Input/output error"},
-    {"NoHardLinks", "link", EPERM, "Operation not permitted"},
+    {"NoNewFile", "O_TMPFILE", EROFS, "Read-only file system"},
+    {"NoHardLinks", "linkat", EPERM, "Operation not permitted"},
 };
 INSTANTIATE_TEST_SUITE_P(KeyCreation, FailedStepTest, ::testing::ValuesIn(kFailedSteps),
                          support::CaseName());
@@ -187,11 +200,16 @@ TEST_F(KeyCreationTest, FolderThatCannotBeSyncedFailsTheCallAndKeepsTheKey) {
   EXPECT_EQ(readFile(kKeyFile).size(), 64U);
 }
 
+const std::string kPlace = "/tmp/places/";
+constexpr char kTooLong[] = "File name too long";
+constexpr char kMissing[] = "is missing";
+
 /// A place where no file can be made.
 struct BadPlace {
   const char* name;
   std::string path;
   const char* reason;
+  const char* reasonOfDecryption;
 };
 
 void PrintTo(const BadPlace& place, std::ostream* out) {
@@ -201,14 +219,14 @@ void PrintTo(const BadPlace& place, std::ostream* out) {
 class BadPlaceTest : public KeyCreationTest, public ::testing::WithParamInterface<BadPlace> {};
 
 TEST_P(BadPlaceTest, IsOneLinePerCallAndNoKey) {
-  std::filesystem::create_directory("/tmp/places");
-  writeFile("/tmp/places/file", "");
+  std::filesystem::create_directory(kPlace);
+  writeFile(kPlace + "file", "");
   useKeyFile(GetParam().path);
   EXPECT_EQ(encrypt("text"), std::nullopt);
   expectOneLine(GetParam().path, GetParam().reason);
   EXPECT_EQ(decrypt("BuUUoEG87WCe74gPRP1q0g"), std::nullopt);
-  expectOneLine(GetParam().path, GetParam().reason);
-  EXPECT_THAT(filesIn("/tmp/places"), ElementsAre("file"));
+  expectOneLine(GetParam().path, GetParam().reasonOfDecryption);
+  EXPECT_THAT(filesIn(kPlace), ElementsAre("file"));
   EXPECT_THAT(filesIn(kStateDir), IsEmpty());
 }
 
@@ -220,15 +238,35 @@ std::string dots(int count) {
 }
 
 const BadPlace kBadPlaces[] = {
-    {"MissingFolder", "/tmp/places/absent/keldcore.key", "No such file or directory"},
-    {"FileForAFolder", "/tmp/places/file/keldcore.key", "Not a directory"},
-    {"NameWithoutRoomForADraft", "/tmp/places/" + std::string(250, 'k'), "File name too long"},
-    {"PathWithoutRoomForADraft", "/tmp/places/" + dots(2040) + "k", "File name too long"},
-    {"NameTooLong", "/tmp/places/" + std::string(256, 'k'), "File name too long"},
-    {"PathTooLong", "/tmp/places/" + std::string(5000, 'k'), "File name too long"},
+    {"MissingFolder", kPlace + "absent/keldcore.key", "No such file or directory", kMissing},
+    {"FileForAFolder", kPlace + "file/keldcore.key", "Not a directory", "Not a directory"},
+    {"NameTooLong", kPlace + std::string(256, 'k'), kTooLong, kTooLong},
+    {"PathTooLong", kPlace + std::string(5000, 'k'), kTooLong, kTooLong},
 };
 INSTANTIATE_TEST_SUITE_P(KeyCreation, BadPlaceTest, ::testing::ValuesIn(kBadPlaces),
                          support::CaseName());
+
+// Names that would have no room for a draft's beside them.
+TEST_F(KeyCreationTest, HappensUnderTheLongestNames) {
+  std::filesystem::create_directory(kPlace);
+  for (const std::string& name : {std::string(255, 'k'), dots(2041) + "k"}) {
+    useKeyFile(kPlace + name);
+    EXPECT_NE(encrypt("text"), std::nullopt);
+    EXPECT_THAT(SystemLog::lines(), IsEmpty());
+  }
+}
+
+TEST_F(KeyCreationTest, NamelessFilesUnknownAndNoRoomForADraftIsOneLine) {
+  std::filesystem::create_directory(kPlace);
+  for (const std::string& name : {std::string(250, 'k'), dots(2040) + "k"}) {
+    useKeyFile(kPlace + name);
+    SystemCalls::fail("O_TMPFILE", EOPNOTSUPP);
+    EXPECT_EQ(encrypt("text"), std::nullopt);
+    SystemCalls::release();
+    expectOneLine(kPlace + name, kTooLong);
+    EXPECT_THAT(filesIn(kPlace), IsEmpty());
+  }
+}
 
 /// What processes share with the test.
 struct Shared {
@@ -299,7 +337,7 @@ TEST_F(KeyRaceTest, FiftyProcessesThatStartTogetherAgreeOnOneKey) {
 TEST_F(KeyRaceTest, FiftyProcessesThatPublishTogetherAgreeOnOneKey) {
   race([&] {
     SystemCalls::follow([&](const std::string& name) {
-      if (name == "link") waitForAll();
+      if (name == "linkat") waitForAll();
       return 0;
     });
   });
@@ -314,6 +352,7 @@ TEST_F(KeyCreationTest, KillAtAnyStepLeavesNoKeyOrAWholeOne) {
       SystemCalls::stopAt(steps + 1);
       return encrypt("text").has_value() ? 0 : 1;
     }));
+    EXPECT_THAT(filesIn(kStateDir), AnyOf(IsEmpty(), ElementsAre("keldcore.key")));
     expectNoneOrAll();
   }
   EXPECT_EQ(steps, 9) << "eight calls to die at, and a run that gets by";

@@ -1,6 +1,7 @@
 #include "tests/platform/system_calls.h"
 
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <sys/random.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -8,6 +9,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
+#include <cstdarg>
 #include <cstdlib>
 #include <utility>
 
@@ -98,9 +100,23 @@ int fsync(int descriptor) {
   return original<decltype(&fsync)>("fsync")(descriptor);
 }
 
-int link(const char* from, const char* to) noexcept {
-  if (admit("link") != 0) return -1;
-  return original<int (*)(const char*, const char*)>("link")(from, to);
+int linkat(int fromFolder, const char* from, int toFolder, const char* to, int flags) noexcept {
+  if (admit("linkat") != 0) return -1;
+  return original<int (*)(int, const char*, int, const char*, int)>("linkat")(fromFolder, from,
+                                                                              toFolder, to, flags);
+}
+
+/// The stand-ins are built with 64-bit offsets.
+int open64(const char* path, int flags, ...) {
+  mode_t mode = 0;
+  if ((flags & (O_CREAT | O_TMPFILE)) != 0) {
+    va_list arguments;
+    va_start(arguments, flags);
+    mode = va_arg(arguments, mode_t);
+    va_end(arguments);
+  }
+  if ((flags & O_TMPFILE) == O_TMPFILE && admit("O_TMPFILE") != 0) return -1;
+  return original<int (*)(const char*, int, ...)>("open64")(path, flags, mode);
 }
 
 int unlink(const char* path) noexcept {

@@ -10,9 +10,10 @@
 
 class SystemCalls {
  public:
-  /// Asked before each call of getentropy, fchmod, write, fsync, link, unlink
+  /// Asked before each call of getentropy, fchmod, write, fsync, linkat, unlink
   /// and read, with its name: what errno to fail with, 0 for going on. fsync of
-  /// a folder is named "fsync folder".
+  /// a folder is named "fsync folder", an open for a file without a name
+  /// "O_TMPFILE"; other opens are not asked about.
   using Script = std::function<int(const std::string& name)>;
 
   static void follow(Script script);
