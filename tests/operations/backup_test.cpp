@@ -1,8 +1,10 @@
 // keldoauth backup.
 
+#include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -16,8 +18,10 @@ namespace operations {
 namespace {
 
 namespace fs = std::filesystem;
+using testing::AnyOf;
 using testing::HasSubstr;
 using testing::IsEmpty;
+using testing::SizeIs;
 
 class Backup : public Operations {
  protected:
@@ -32,6 +36,19 @@ class Backup : public Operations {
     EXPECT_THAT(outcome, ExitsWith(exit));
     EXPECT_EQ(outcome.err, "keldoauth: backup: " + error);
     EXPECT_EQ(filesIn(kStateDir), before);
+  }
+
+  /// The files of the attacker that hold a database by now.
+  static int wonFiles(const char* folder) {
+    int won = 0;
+    for (const auto& entry : fs::recursive_directory_iterator(folder)) {
+      struct stat status {};
+      const std::string path = entry.path();
+      if (!entry.is_regular_file() || ::stat(path.c_str(), &status) != 0) continue;
+      if (status.st_uid != cli::kNobody) continue;
+      won += readFile(path).find("SQLite format 3") != std::string::npos ? 1 : 0;
+    }
+    return won;
   }
 };
 
@@ -56,11 +73,12 @@ TEST_F(Backup, IsPrivateUnderEveryUmask) {
   }
 }
 
-TEST_F(Backup, KilledAtAnyStepLeavesNoHalfCopyAndNobodyElseReadsItsDraft) {
+TEST_F(Backup, KilledAtAnyStepLeavesAWholeCopyOrNothing) {
   const Content content = contentOf();
   const auto check = [&] {
     expectPrivate(kCopies);
-    if (fs::exists(kCopy)) {
+    EXPECT_THAT(filesIn(kCopies), AnyOf(IsEmpty(), SizeIs(1)));
+    if (!fs::is_empty(kCopies)) {
       EXPECT_EQ(contentOf(kCopy), content);
     }
     expectNextProgramReady();
@@ -72,6 +90,31 @@ TEST_F(Backup, KilledAtAnyStepLeavesNoHalfCopyAndNobodyElseReadsItsDraft) {
   RecordProperty("steps", steps);
 }
 
+TEST_F(Backup, FailingAtAnyStepSaysSoAndLeavesAWholeCopyOrNothing) {
+  const Content content = contentOf();
+  const auto check = [&](const Outcome& outcome) {
+    EXPECT_THAT(filesIn(kCopies), AnyOf(IsEmpty(), SizeIs(1)));
+    if (outcome.exit == cli::kOk || !fs::is_empty(kCopies)) {
+      EXPECT_EQ(contentOf(kCopy), content);
+    }
+    if (outcome.exit != cli::kOk) {
+      EXPECT_NE(outcome.err, "");
+    }
+    EXPECT_EQ(contentOf(), content);
+  };
+  failAtEachStep(
+      {"backup", kCopy}, [] { putBack(kCopies, {}); }, check);
+}
+
+TEST_F(Backup, ReportsAFolderThatCannotBeSynced) {
+  const Outcome outcome = withoutFolderSync({"backup", kCopy});
+  EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
+  EXPECT_EQ(outcome.err,
+            "keldoauth: backup: /tmp/copies/copy.db is whole, but its folder cannot be synced: "
+            "Input/output error\nhint: a power cut may take the name away again\n");
+  EXPECT_EQ(contentOf(kCopy), contentOf());
+}
+
 TEST_F(Backup, MayBeTriedAgainAfterAKill) {
   dieAt(12, Death::kBeforeTheStep, {"backup", kCopy});
   EXPECT_THAT(backUp(), ExitsWith(cli::kOk));
@@ -79,16 +122,16 @@ TEST_F(Backup, MayBeTriedAgainAfterAKill) {
 
 TEST_F(Backup, IsOnTheDiskBeforeItHasItsName) {
   const std::vector<std::string> steps = stepsOf({"backup", kCopy});
-  const auto named = std::find(steps.begin(), steps.end(), "rename /tmp/copies/copy.db");
+  const auto named = std::find(steps.begin(), steps.end(), "link copy.db");
   ASSERT_NE(named, steps.end());
   const auto isWrite = [](const std::string& step) {
-    return step.rfind("write /tmp/copies/copy.db", 0) == 0;
+    return step.rfind("write /tmp/copies/", 0) == 0;
   };
   const auto isSync = [](const std::string& step) {
-    return step.rfind("sync /tmp/copies/copy.db", 0) == 0 &&
-           step.find("-journal") == std::string::npos;
+    return step.rfind("sync /tmp/copies/", 0) == 0;
   };
   const auto last = std::find_if(std::make_reverse_iterator(named), steps.rend(), isWrite);
+  ASSERT_NE(last, steps.rend());
   EXPECT_NE(std::find_if(last.base(), named, isSync), named) << "written but not synced";
   EXPECT_NE(std::find(named, steps.end(), "sync /tmp/copies"), steps.end());
 }
@@ -108,6 +151,78 @@ TEST_F(Backup, OfAStoreInWalModeStandsAlone) {
   fs::create_directory(elsewhere);
   fs::copy(kCopy, elsewhere / "copy.db");
   EXPECT_EQ(contentOf(elsewhere / "copy.db"), contentOf());
+}
+
+TEST_F(Backup, OfAStoreWithATriggerIsKeptAndSaysThatItCannotBeRestored) {
+  execute(kDatabase, "CREATE TRIGGER spy AFTER INSERT ON oauth_token BEGIN SELECT 1; END");
+  const Outcome outcome = backUp();
+  EXPECT_THAT(outcome, ExitsWith(cli::kUnhealthy));
+  EXPECT_EQ(outcome.err,
+            "keldoauth: backup: the store has what no store has: trigger spy\n"
+            "hint: the copy is kept, but 'restore' refuses it; remove the intruder from the store "
+            "and make another copy\n");
+  EXPECT_EQ(contentOf(kCopy), contentOf());
+}
+
+TEST_F(Backup, WithoutNamelessFilesKeepsItsDraftPrivateAndLeavesNothing) {
+  fs::create_directory("/tmp/empty");
+  ASSERT_EQ(mount("/tmp/empty", "/proc", nullptr, MS_BIND, nullptr), 0);
+  const Outcome outcome = backUp();
+  umount2("/proc", MNT_DETACH);
+  EXPECT_THAT(outcome, ExitsWith(cli::kOk));
+  EXPECT_THAT(filesIn(kCopies), SizeIs(1));
+  expectPrivate(kCopies);
+  EXPECT_EQ(contentOf(kCopy), contentOf());
+}
+
+// An attacker -----------------------------------------------------------------------
+
+/// Watches the folder without any privilege, moves away what appears there and
+/// puts a file of its own, open to all, under the same name. Ends when the folder
+/// has a file "end".
+[[noreturn]] void attack(const char* folder) {
+  if (setresgid(cli::kNobody, cli::kNobody, cli::kNobody) != 0) ::_exit(1);
+  if (setresuid(cli::kNobody, cli::kNobody, cli::kNobody) != 0) ::_exit(1);
+  ::alarm(300);
+  int replaced = 0;
+  const std::string prey = std::string(folder) + "/prey/";
+  while (!fs::exists(std::string(folder) + "/end")) {
+    std::error_code error;
+    for (const auto& entry : fs::directory_iterator(folder, error)) {
+      const std::string name = entry.path().filename();
+      struct stat status {};
+      const bool isNew = ::lstat(entry.path().c_str(), &status) == 0 && S_ISREG(status.st_mode) &&
+                         status.st_uid != cli::kNobody;
+      if (!isNew) continue;
+      if (::rename(entry.path().c_str(), (prey + std::to_string(++replaced)).c_str()) != 0)
+        continue;
+      ::close(::open(entry.path().c_str(), O_CREAT | O_EXCL | O_RDWR | O_CLOEXEC, 0666));
+      ::chmod(entry.path().c_str(), 0666);
+    }
+  }
+  ::_exit(0);
+}
+
+TEST_F(Backup, WritesNothingIntoTheFileOfAnAttackerWhoWatchesTheFolder) {
+  if (!cli::canBecomeNobody()) GTEST_SKIP() << "no other user in this namespace";
+  constexpr int kRounds = 60;
+  fs::permissions(kCopies, fs::perms::all);
+  fs::create_directory("/tmp/copies/prey");
+  fs::permissions("/tmp/copies/prey", fs::perms::all);
+  const pid_t attacker = ::fork();
+  if (attacker == 0) attack(kCopies);
+  int won = 0;
+  for (int round = 0; round < kRounds; ++round) {
+    backUp("/tmp/copies/copy" + std::to_string(round) + ".db");
+    won += wonFiles(kCopies);
+  }
+  writeFile("/tmp/copies/end", "");
+  int status = -1;
+  ::waitpid(attacker, &status, 0);
+  EXPECT_EQ(status, 0);
+  EXPECT_GT(filesIn("/tmp/copies/prey").size(), 0U) << "there was no attack";
+  EXPECT_EQ(won, 0) << "of " << kRounds << " copies";
+  RecordProperty("attacks", static_cast<int>(filesIn("/tmp/copies/prey").size()));
 }
 
 // Refusals --------------------------------------------------------------------------

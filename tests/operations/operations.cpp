@@ -123,11 +123,21 @@ std::vector<Operations::Death> Operations::deathsAt(int step) {
   return {step % 2 == 0 ? Death::kBeforeTheStep : Death::kWithinTheStep};
 }
 
-Outcome Operations::meanwhile(int nth, const Arguments& other, const Arguments& arguments) {
-  std::string line = "exec env -u KELDOAUTH_DIE_AT -u KELDCORE_KEY_FILE";
-  for (const std::string& word : cli::commandLine(KELDOAUTH_CLI, other)) line += " '" + word + "'";
+Outcome Operations::meanwhile(int nth, const std::string& line, const Arguments& arguments) {
   const Variable at("KELDOAUTH_DIE_AT", std::to_string(nth));
   const Variable action("KELDOAUTH_MEANWHILE", line);
+  return runProgram(victim(arguments));
+}
+
+Outcome Operations::failAt(int nth, Failing how, const Arguments& arguments) {
+  const Variable at("KELDOAUTH_DIE_AT", std::to_string(nth));
+  const Variable failure("KELDOAUTH_FAIL", how == Failing::kDone ? "done" : "undone");
+  const Variable hurried("KELDOAUTH_HURRY", "1");
+  return runProgram(victim(arguments));
+}
+
+Outcome Operations::withoutFolderSync(const Arguments& arguments) {
+  const Variable failing("KELDOAUTH_NO_FOLDER_SYNC", "1");
   return runProgram(victim(arguments));
 }
 
@@ -138,6 +148,7 @@ Outcome Operations::hurry(const Arguments& arguments) {
 
 std::vector<std::string> Operations::stepsOf(const Arguments& arguments) {
   static constexpr char kRecord[] = "/tmp/steps";
+  fs::remove(kRecord);
   const Variable record("KELDOAUTH_STEPS", kRecord);
   const Outcome outcome = runProgram(victim(arguments));
   EXPECT_THAT(outcome, ExitsWith(cli::kOk));

@@ -44,10 +44,21 @@ class Operations : public cli::CliTest {
   /// Runs a command until its n-th step; exits with -SIGKILL, or as usual when
   /// it takes fewer steps.
   static Outcome dieAt(int nth, Death death, const Arguments& arguments);
+  /// What becomes of a step that reports an error of the disk.
+  enum class Failing { kUndone, kDone };
+  /// Runs a command to its end; its n-th step fails.
+  static Outcome failAt(int nth, Failing how, const Arguments& arguments);
+  /// Runs a command as often as it has steps, and in either way; `check` gets
+  /// the outcome.
+  template <typename Prepare, typename Check>
+  static void failAtEachStep(const Arguments& arguments, Prepare prepare, Check check);
+  /// Every sync of a folder fails.
+  static Outcome withoutFolderSync(const Arguments& arguments);
+
   /// The same without an end; waiting for locks takes no time.
   static Outcome hurry(const Arguments& arguments);
-  /// Runs a command to its end, and `other` before its n-th step.
-  static Outcome meanwhile(int nth, const Arguments& other, const Arguments& arguments);
+  /// Runs a command to its end, and a line of the shell before its n-th step.
+  static Outcome meanwhile(int nth, const std::string& line, const Arguments& arguments);
   /// The steps of a command that runs to its end.
   static std::vector<std::string> stepsOf(const Arguments& arguments);
 
@@ -95,6 +106,19 @@ int Operations::dieAtEachStep(const Arguments& arguments, Prepare prepare, Check
     }
   }
   return 0;
+}
+
+template <typename Prepare, typename Check>
+void Operations::failAtEachStep(const Arguments& arguments, Prepare prepare, Check check) {
+  prepare();
+  const auto steps = static_cast<int>(stepsOf(arguments).size());
+  for (int nth = 1; nth <= steps && !HasFailure(); ++nth) {
+    for (const Failing how : {Failing::kUndone, Failing::kDone}) {
+      SCOPED_TRACE("step " + std::to_string(nth) + (how == Failing::kDone ? ", done" : ""));
+      prepare();
+      check(failAt(nth, how, arguments));
+    }
+  }
 }
 
 }  // namespace operations

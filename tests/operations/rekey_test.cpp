@@ -22,6 +22,7 @@ using support::Row;
 using testing::Contains;
 using testing::HasSubstr;
 using testing::Not;
+using testing::SizeIs;
 
 /// What a key makes of every encrypted value, nothing where it is not its own.
 using Clear = std::vector<std::string>;
@@ -68,6 +69,12 @@ class Rekey : public Operations {
       if (clear[i].empty()) clear[i] = others[i];
     }
     return clear;
+  }
+
+  /// The store and its one key.
+  void expectNothingLeft() const {
+    EXPECT_THAT(filesIn(kStateDir), SizeIs(before_.size()));
+    EXPECT_EQ(fs::hard_link_count(kKey), 1U);
   }
 
   void expectRefused(const Outcome& outcome, int exit, const std::string& error) const {
@@ -123,7 +130,7 @@ TEST_F(Rekey, KilledAtAnyStepIsFinishedByTheNextRun) {
     if (clearWith(kKey) != clear_) ++resumed;
     EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
     EXPECT_EQ(clearWith(kKey), clear_);
-    EXPECT_FALSE(fs::exists(kNextKey));
+    expectNothingLeft();
     contentOf();
   };
   const int steps = dieAtEachStep(
@@ -131,6 +138,61 @@ TEST_F(Rekey, KilledAtAnyStepIsFinishedByTheNextRun) {
   EXPECT_GT(steps, 50);
   EXPECT_GT(resumed, 0) << "no kill struck between the commit and the new key's place";
   RecordProperty("steps", steps);
+}
+
+TEST_F(Rekey, KilledManyTimesLeavesNothingOnceTheNextRunIsThrough) {
+  int kills = 0;
+  for (int nth = 1; nth < 400 && !HasFailure(); nth += 3) {
+    kills += dieAt(nth, Death::kBeforeTheStep, {"rekey", "--yes"}).exit == -9 ? 1 : 0;
+  }
+  EXPECT_GT(kills, 20);
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_EQ(clearWith(kKey), clear_);
+  expectNothingLeft();
+}
+
+TEST_F(Rekey, RemovesTheDraftsOfKilledProcessesAndNothingElse) {
+  for (const char* name : {".draft-a1B2c3", ".backup", ".draft-long-ago"}) {
+    writeFile(kKey + std::string(name), "bytes");
+  }
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_FALSE(fs::exists(std::string(kKey) + ".draft-a1B2c3"));
+  EXPECT_TRUE(fs::exists(std::string(kKey) + ".backup"));
+  EXPECT_TRUE(fs::exists(std::string(kKey) + ".draft-long-ago"));
+}
+
+TEST_F(Rekey, FailingAtAnyStepSaysSoAndIsFinishedByTheNextRun) {
+  const auto check = [&](const Outcome& outcome) {
+    if (outcome.exit == cli::kOk) {
+      EXPECT_EQ(clearWith(kKey), clear_);
+    } else {
+      EXPECT_NE(outcome.err, "");
+    }
+    EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+    EXPECT_EQ(clearWith(kKey), clear_);
+    expectNothingLeft();
+  };
+  failAtEachStep(
+      {"rekey", "--yes"}, [&] { putBack(kStateDir, before_); }, check);
+}
+
+TEST_F(Rekey, WithoutASyncedFolderChangesNothingAndSaysSo) {
+  const Outcome outcome = withoutFolderSync({"rekey", "--yes"});
+  EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
+  EXPECT_EQ(outcome.err, std::string("keldoauth: rekey: ") + kStateDir + ": Input/output error\n");
+  EXPECT_EQ(filesIn(kStateDir), before_);
+}
+
+TEST_F(Rekey, DrawsAnewWhenTheWaitingKeyDecryptsNothing) {
+  for (const std::string& waiting :
+       {std::string(64, 'w'), std::string("half a key"), std::string()}) {
+    writeFile(kNextKey, waiting);
+    ::chmod(kNextKey, 0600);
+    EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+    EXPECT_NE(readFile(kKey), waiting);
+    EXPECT_EQ(clearWith(kKey), clear_);
+    expectNothingLeft();
+  }
 }
 
 TEST_F(Rekey, KilledTwice) {
@@ -173,7 +235,7 @@ TEST_F(Rekey, RemovesTheOldKeyOnlyWhenTheNewValuesAreOnTheDisk) {
 
 TEST_F(Rekey, KnowsItsNewKeyOnTheDiskBeforeItCommits) {
   const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
-  const auto made = std::find(steps.begin(), steps.end(), std::string("link ") + kNextKey);
+  const auto made = std::find(steps.begin(), steps.end(), std::string("write ") + kNextKey);
   const auto written = std::find(steps.begin(), steps.end(), std::string("write ") + kDatabase);
   ASSERT_LT(made, written);
   EXPECT_NE(std::find(made, written, std::string("sync ") + kStateDir), written);
@@ -181,19 +243,21 @@ TEST_F(Rekey, KnowsItsNewKeyOnTheDiskBeforeItCommits) {
 
 /// The service was not stopped: it encrypts with the old key still.
 TEST_F(Rekey, KeepsBothKeysWhenAValueCameInAfterTheCommit) {
+  const std::string cipher = sqlText("SELECT client_id FROM oauth_clientInfo WHERE id=1");
   const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
   putBack(kStateDir, before_);
   const auto commit = std::find(steps.rbegin(), steps.rend(), std::string("unlink ") + kJournal);
-  const Outcome outcome =
-      meanwhile(static_cast<int>(steps.rend() - commit) + 1,
-                {"client", "add", "--redirect-uri", "app:/", "--scope", "x", "--name", "late"},
-                {"rekey", "--yes"});
+  const Outcome outcome = meanwhile(static_cast<int>(steps.rend() - commit) + 1,
+                                    std::string("sqlite3 ") + kDatabase +
+                                        " \"INSERT INTO oauth_grantCode VALUES('u','" + cipher +
+                                        "','s','c','1','x','i',9)\"",
+                                    {"rekey", "--yes"});
   expectRefused(outcome, cli::kUnavailable,
                 "the store has values that the new key does not decrypt\n"
                 "hint: both keys are still there; stop the service and run the command again\n");
   EXPECT_EQ(readFile(kKey), before_["keldcore.key"]);
   EXPECT_TRUE(fs::exists(kNextKey));
-  EXPECT_THAT(rekey().out, HasSubstr("Encrypted 2 values"));
+  EXPECT_THAT(rekey().out, HasSubstr("Encrypted 1 value "));
   EXPECT_THAT(clearWith(kKey), Not(Contains("")));
 }
 
@@ -219,18 +283,18 @@ TEST_F(Rekey, WithAnotherKeyChangesNothing) {
 
 TEST_F(Rekey, WithoutAKeyMakesNone) {
   fs::remove(kKey);
-  expectRefused(rekey(), cli::kRefused,
-                std::string("no key file ") + kKey +
-                    "\nhint: only the stand-in cipher has one; it is made when it is first "
-                    "needed\n");
+  expectRefused(
+      rekey(), cli::kRefused,
+      std::string("the key file ") + kKey +
+          " is missing\nhint: put it back; where nothing was encrypted yet, the stand-in cipher "
+          "makes one when it is first needed\n");
   EXPECT_FALSE(fs::exists(kKey));
 }
 
 TEST_F(Rekey, InAFolderThatCannotBeWrittenChangesNothing) {
   {
     const cli::ReadOnlyFolder readOnly;
-    expectRefused(rekey(), cli::kUnavailable,
-                  "the cipher refuses to encrypt\nhint: the system log says why\n");
+    expectRefused(rekey(), cli::kUnavailable, std::string(kNextKey) + ": Read-only file system\n");
   }
   EXPECT_EQ(filesIn(kStateDir), before_);
 }
@@ -248,12 +312,14 @@ TEST_F(Rekey, WithItsKeyApartAndADatabaseThatCannotBeWrittenChangesNothing) {
   EXPECT_EQ(filesIn(kCopies), keys);
 }
 
-TEST_F(Rekey, WithAWaitingKeyThatIsNoneChangesNothing) {
+TEST_F(Rekey, WithAnotherKeyAndAWaitingOneThatIsNoneChangesNothing) {
+  writeFile(kKey, std::string(64, 'k'));
   writeFile(kNextKey, "half a key");
   ::chmod(kNextKey, 0600);
   const auto before = filesIn(kStateDir);
-  expectRefused(rekey(), cli::kUnavailable,
-                "the cipher refuses to encrypt\nhint: the system log says why\n");
+  expectRefused(rekey(), cli::kRefused,
+                "oauth_clientInfo 1: client_id is encrypted with another key\n"
+                "hint: nothing was changed\n");
   EXPECT_EQ(filesIn(kStateDir), before);
 }
 

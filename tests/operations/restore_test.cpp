@@ -9,6 +9,7 @@
 
 #include "tests/faults/small_medium.h"
 #include "tests/operations/operations.h"
+#include "tests/support/case_name.h"
 
 namespace operations {
 namespace {
@@ -122,7 +123,7 @@ TEST_F(Restore, AsksFirst) {
 // The key ---------------------------------------------------------------------------
 
 TEST_F(Restore, WarnsOfAnotherKey) {
-  fs::rename(kKey, kOtherKey);
+  writeFile(kKey, std::string(64, 'k'));
   const Outcome outcome = restore();
   EXPECT_THAT(outcome, ExitsWith(cli::kUnhealthy));
   EXPECT_EQ(outcome.out, "Restored the store from /tmp/copies/copy.db.\n");
@@ -130,6 +131,26 @@ TEST_F(Restore, WarnsOfAnotherKey) {
             "keldoauth: restore: the platform's key is not the one of this copy\n"
             "hint: put back the key that belongs to it; until then no client is found\n");
   EXPECT_EQ(contentOf(), then_);
+}
+
+TEST_F(Restore, NamesAMissingKeyAndMakesNone) {
+  fs::rename(kKey, kOtherKey);
+  const Outcome outcome = restore();
+  EXPECT_THAT(outcome, ExitsWith(cli::kUnhealthy));
+  EXPECT_EQ(outcome.err,
+            std::string("keldoauth: restore: the key file ") + kKey +
+                " is missing\nhint: put back the key that belongs to it; until then no client "
+                "is found\n");
+  EXPECT_EQ(contentOf(), then_);
+  EXPECT_FALSE(fs::exists(kKey));
+}
+
+TEST_F(Restore, WithoutADatabaseAndAKeyMakesNoKey) {
+  fs::remove(kDatabase);
+  fs::remove(kKey);
+  EXPECT_THAT(restore(), ExitsWith(cli::kUnhealthy));
+  EXPECT_EQ(contentOf(), then_);
+  EXPECT_FALSE(fs::exists(kKey));
 }
 
 TEST_F(Restore, WarnsOfACipherThatDoesNotWork) {
@@ -192,6 +213,48 @@ TEST_F(Restore, KilledAtAnyStepOfMakingTheDatabaseMayBeTriedAgain) {
             20);
 }
 
+// Failing ---------------------------------------------------------------------------
+
+TEST_F(Restore, FailingAtAnyStepSaysWhatHasBecomeOfTheStore) {
+  const auto before = filesIn(kStateDir);
+  int replaced = 0;
+  const auto check = [&](const Outcome& outcome) {
+    const Content content = contentOf();
+    EXPECT_THAT(content, AnyOf(now_, then_));
+    if (outcome.exit == cli::kOk) {
+      EXPECT_EQ(content, then_);
+    }
+    if (outcome.err.find("the store is as it was") != std::string::npos) {
+      EXPECT_EQ(content, now_) << outcome.err;
+    }
+    if (outcome.err.find("the store was replaced") != std::string::npos) {
+      EXPECT_EQ(content, then_) << outcome.err;
+      ++replaced;
+    }
+    if (outcome.exit == cli::kUnavailable && content == then_) {
+      EXPECT_THAT(outcome.err, HasSubstr("replaced")) << "and nothing is said of it";
+    }
+  };
+  failAtEachStep(
+      {"restore", "--yes", kCopy}, [&] { putBack(kStateDir, before); }, check);
+  EXPECT_GT(replaced, 0) << "no step failed past the commit";
+}
+
+TEST_F(Restore, ReportsAFolderThatCannotBeSyncedAndThatItIsReplacedAllTheSame) {
+  const Outcome outcome = withoutFolderSync({"restore", "--yes", kCopy});
+  EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
+  EXPECT_THAT(outcome.err, HasSubstr("the store was replaced all the same, but a power cut may "
+                                     "undo it; run the command again\n"));
+  EXPECT_EQ(contentOf(), then_);
+}
+
+TEST_F(Restore, IsOnTheDiskWithTheRemovalOfItsJournal) {
+  const std::vector<std::string> steps = stepsOf({"restore", "--yes", kCopy});
+  const auto removed = std::find(steps.rbegin(), steps.rend(), std::string("unlink ") + kJournal);
+  ASSERT_NE(removed, steps.rend());
+  EXPECT_NE(std::find(removed.base(), steps.end(), std::string("sync ") + kStateDir), steps.end());
+}
+
 // Refusals --------------------------------------------------------------------------
 
 TEST_F(Restore, OfTheDatabaseItself) {
@@ -231,6 +294,54 @@ TEST_F(Restore, OfADatabaseOfAnotherProgram) {
 TEST_F(Restore, OfAStoreWithoutOneOfItsColumns) {
   execute(kCopy, "ALTER TABLE oauth_token RENAME COLUMN flow_type TO flow");
   expectRefused(kCopy, "/tmp/copies/copy.db is no store: no such column: flow_type\n");
+}
+
+/// What rides along in a copy.
+struct Stranger {
+  const char* name;
+  const char* sql;
+  const char* told;
+};
+
+void PrintTo(const Stranger& stranger, std::ostream* out) {
+  *out << stranger.name;
+}
+
+class StrangerTest : public Restore, public testing::WithParamInterface<Stranger> {};
+
+TEST_P(StrangerTest, InACopyIsRefused) {
+  execute(kCopy, GetParam().sql);
+  expectRefused(kCopy, std::string("/tmp/copies/copy.db has what no store has: ") +
+                           GetParam().told +
+                           "\nhint: it would work on in the store; a copy of the file without it "
+                           "can be restored\n");
+}
+
+const Stranger kStrangers[] = {
+    {"Trigger", "CREATE TRIGGER spy AFTER INSERT ON oauth_token BEGIN SELECT 1; END",
+     "trigger spy"},
+    {"View", "CREATE VIEW oauth_all AS SELECT * FROM oauth_token", "view oauth_all"},
+    {"OtherTable", "CREATE TABLE songs(title)", "table songs"},
+    {"VirtualTable", "CREATE VIRTUAL TABLE pages USING fts5(text)", "table pages"},
+    {"OtherIndex", "CREATE INDEX by_user ON oauth_token(username)", "index by_user"},
+    {"UniqueIndex", "CREATE UNIQUE INDEX once ON oauth_log(id)", "index once"},
+    {"MoreColumns", "ALTER TABLE oauth_token ADD COLUMN more text", "table oauth_token"},
+    {"OtherKindOfTable",
+     "CREATE TABLE other AS SELECT * FROM oauth_log; DROP TABLE oauth_log;"
+     "ALTER TABLE other RENAME TO oauth_log",
+     "table oauth_log"},
+    {"TriggerWithANameOfSqlites",
+     "CREATE TRIGGER spy AFTER INSERT ON oauth_token BEGIN SELECT 1; END;"
+     "PRAGMA writable_schema=1; UPDATE sqlite_master SET "
+     "name='sqlite_spy',sql=replace(sql,'spy','sqlite_spy') WHERE type='trigger'",
+     "trigger sqlite_spy"},
+};
+INSTANTIATE_TEST_SUITE_P(Restore, StrangerTest, testing::ValuesIn(kStrangers), support::CaseName());
+
+TEST_F(Restore, OfACopyWithSqlitesOwnStatistics) {
+  execute(kCopy, "ANALYZE");
+  EXPECT_THAT(restore(), ExitsWith(cli::kOk));
+  EXPECT_EQ(contentOf(), then_);
 }
 
 TEST_F(Restore, OfADamagedPage) {

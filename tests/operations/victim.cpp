@@ -1,9 +1,13 @@
 // Linked into a second copy of the command line: ends the process, as SIGKILL
-// would, before the n-th step that reaches a disk, and does not wait for locks.
+// would, before the n-th step that reaches a disk, or lets that step fail, and
+// does not wait for locks.
 //   KELDOAUTH_DIE_AT    n; without it the program runs to its end
 //   KELDOAUTH_DIE_TORN  when that step writes, half of it is written all the same
 //   KELDOAUTH_MEANWHILE a line of the shell that runs before that step, instead
 //                       of the end
+//   KELDOAUTH_FAIL      what becomes of that step instead: "undone" or "done", and
+//                       in either case it reports an error of the disk
+//   KELDOAUTH_NO_FOLDER_SYNC  every sync of a folder fails
 //   KELDOAUTH_STEPS     a file that gets a line for each step
 //   KELDOAUTH_HURRY     waiting takes no time
 
@@ -16,7 +20,9 @@
 #include <unistd.h>
 
 #include <array>
+#include <cerrno>
 #include <climits>
+#include <cstdarg>
 #include <cstdlib>
 #include <ctime>
 #include <string>
@@ -29,6 +35,16 @@ Function original(const char* name) {
 }
 
 #define ORIGINAL(name) original<decltype(&name)>(#name)
+
+/// The argument that only some calls have.
+#define GET_MODE                                                    \
+  mode_t mode = 0;                                                  \
+  if ((flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE) { \
+    va_list arguments;                                              \
+    va_start(arguments, flags);                                     \
+    mode = static_cast<mode_t>(va_arg(arguments, unsigned int));    \
+    va_end(arguments);                                              \
+  }
 
 long number(const char* variable) {
   const char* text = std::getenv(variable);
@@ -45,7 +61,8 @@ std::string nameOf(int descriptor) {
 void note(const std::string& step) {
   const char* record = std::getenv("KELDOAUTH_STEPS");
   if (record == nullptr) return;
-  const int file = open(record, O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0600);
+  static const auto openRecord = ORIGINAL(open);
+  const int file = openRecord(record, O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0600);
   const std::string line = step + "\n";
   static const auto put = ORIGINAL(write);
   if (put(file, line.data(), line.size()) < 0) std::abort();
@@ -63,6 +80,11 @@ bool isAnotherActing() {
   return true;
 }
 
+bool isFolder(int descriptor) {
+  struct stat status {};
+  return fstat(descriptor, &status) == 0 && S_ISDIR(status.st_mode);
+}
+
 /// True when this is the step that is not to be.
 bool isLast(const std::string& step) {
   static long count = 0;
@@ -70,15 +92,43 @@ bool isLast(const std::string& step) {
   return ++count == number("KELDOAUTH_DIE_AT") && !isAnotherActing();
 }
 
-void step(const std::string& name) {
-  if (isLast(name)) die();
+/// Takes a step, or dies, or reports what did not happen, or not so.
+template <typename Take>
+auto step(const std::string& name, Take take) -> decltype(take()) {
+  if (!isLast(name)) return take();
+  const char* const failure = std::getenv("KELDOAUTH_FAIL");
+  if (failure == nullptr) die();
+  if (std::string(failure) == "done") take();
+  errno = EIO;
+  return -1;
 }
 
 template <typename Write>
-void stepOfWriting(const std::string& name, Write writeHalf) {
-  if (!isLast(name)) return;
-  if (number("KELDOAUTH_DIE_TORN") != 0) writeHalf();
-  die();
+ssize_t stepOfWriting(int file, size_t size, Write write) {
+  if (!isLast("write " + nameOf(file))) return write(size);
+  const char* const failure = std::getenv("KELDOAUTH_FAIL");
+  const bool isDone = failure != nullptr && std::string(failure) == "done";
+  if (number("KELDOAUTH_DIE_TORN") != 0) (void)!write(size / 2);
+  if (failure == nullptr) die();
+  if (isDone) (void)!write(size);
+  errno = EIO;
+  return -1;
+}
+
+int stepOfSyncing(int file, int (*sync)(int)) {
+  if (isFolder(file) && number("KELDOAUTH_NO_FOLDER_SYNC") != 0) {
+    note("sync " + nameOf(file));
+    errno = EIO;
+    return -1;
+  }
+  return step("sync " + nameOf(file), [=] { return sync(file); });
+}
+
+/// Only what makes a file is a step.
+template <typename Open>
+int stepOfOpening(const char* path, int flags, Open open) {
+  const bool makes = (flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE;
+  return makes ? step(std::string("create ") + path, open) : open();
 }
 
 timespec skipped{};
@@ -98,65 +148,74 @@ extern "C" {
 
 ssize_t write(int file, const void* bytes, size_t size) {
   static const auto put = ORIGINAL(write);
-  stepOfWriting("write " + nameOf(file), [=] { (void)!put(file, bytes, size / 2); });
-  return put(file, bytes, size);
+  return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part); });
+}
+
+ssize_t pwrite(int file, const void* bytes, size_t size, off_t at) {
+  static const auto put = ORIGINAL(pwrite);
+  return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part, at); });
 }
 
 ssize_t pwrite64(int file, const void* bytes, size_t size, off64_t at) {
   static const auto put = ORIGINAL(pwrite64);
-  stepOfWriting("write " + nameOf(file), [=] { (void)!put(file, bytes, size / 2, at); });
-  return put(file, bytes, size, at);
+  return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part, at); });
+}
+
+int ftruncate(int file, off_t size) noexcept {
+  return step("truncate " + nameOf(file), [=] { return ORIGINAL(ftruncate)(file, size); });
 }
 
 int ftruncate64(int file, off64_t size) noexcept {
-  step("truncate " + nameOf(file));
-  return ORIGINAL(ftruncate64)(file, size);
+  return step("truncate " + nameOf(file), [=] { return ORIGINAL(ftruncate64)(file, size); });
 }
 
 int fsync(int file) {
-  step("sync " + nameOf(file));
-  return ORIGINAL(fsync)(file);
+  return stepOfSyncing(file, ORIGINAL(fsync));
 }
 
 int fdatasync(int file) {
-  step("sync " + nameOf(file));
-  return ORIGINAL(fdatasync)(file);
+  return stepOfSyncing(file, ORIGINAL(fdatasync));
 }
 
 int fchmod(int file, mode_t mode) noexcept {
-  step("chmod " + nameOf(file));
-  return ORIGINAL(fchmod)(file, mode);
+  return step("chmod " + nameOf(file), [=] { return ORIGINAL(fchmod)(file, mode); });
 }
 
 int unlink(const char* path) noexcept {
-  step(std::string("unlink ") + path);
-  return ORIGINAL(unlink)(path);
+  return step(std::string("unlink ") + path, [=] { return ORIGINAL(unlink)(path); });
 }
 
-int link(const char* from, const char* to) noexcept {
-  step(std::string("link ") + to);
-  return ORIGINAL(link)(from, to);
+int linkat(int fromFolder, const char* from, int toFolder, const char* to, int flags) noexcept {
+  return step(std::string("link ") + to,
+              [=] { return ORIGINAL(linkat)(fromFolder, from, toFolder, to, flags); });
 }
 
 int rename(const char* from, const char* to) noexcept {
-  step(std::string("rename ") + to);
-  return ORIGINAL(rename)(from, to);
+  return step(std::string("rename ") + to, [=] { return ORIGINAL(rename)(from, to); });
 }
 
-int renameat2(int fromFolder, const char* from, int toFolder, const char* to,
-              unsigned flags) noexcept {
-  step(std::string("rename ") + to);
-  return ORIGINAL(renameat2)(fromFolder, from, toFolder, to, flags);
+int open(const char* path, int flags, ...) {
+  GET_MODE;
+  return stepOfOpening(path, flags, [=] { return ORIGINAL(open)(path, flags, mode); });
 }
 
-int mkostemp(char* name, int flags) {
-  step("create");
-  return ORIGINAL(mkostemp)(name, flags);
+int open64(const char* path, int flags, ...) {
+  GET_MODE;
+  return stepOfOpening(path, flags, [=] { return ORIGINAL(open64)(path, flags, mode); });
+}
+
+int openat(int folder, const char* path, int flags, ...) {
+  GET_MODE;
+  return stepOfOpening(path, flags, [=] { return ORIGINAL(openat)(folder, path, flags, mode); });
+}
+
+int getentropy(void* bytes, size_t size) {
+  return step("draw", [=] { return ORIGINAL(getentropy)(bytes, size); });
 }
 
 /// Every row that changes, long before it reaches the disk.
 int sqlite3_exec(sqlite3* db, const char* sql, sqlite3_callback callback, void* arg, char** error) {
-  step("statement");
+  if (isLast("statement") && std::getenv("KELDOAUTH_FAIL") == nullptr) die();
   return ORIGINAL(sqlite3_exec)(db, sql, callback, arg, error);
 }
 

@@ -1,7 +1,7 @@
 // keldoauth backup and restore: whole copies of the database, made by SQLite's
 // own means while the service runs.
 
-#include <cstdlib>
+#include <cstdint>
 #include <filesystem>
 #include <iostream>
 
@@ -20,10 +20,10 @@ using namespace KELDOAUTHSERVER;
 namespace tool {
 namespace {
 
-Json::Value describe(const std::string& file) {
+Json::Value describe(const std::string& file, std::uintmax_t bytes) {
   Json::Value document;
   document["file"] = file;
-  document["bytes"] = Json::UInt64(std::filesystem::file_size(file));
+  document["bytes"] = Json::UInt64(bytes);
   return document;
 }
 
@@ -35,17 +35,34 @@ void requireSound(DatabaseFile& copy) try { copy.requireStore(); } catch (const 
                 "no copy was kept; an older one can be restored");
 }
 
+void copyStoreTo(const Draft& draft) {
+  DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
+  DatabaseFile copy(draft);
+  store.copyTo(copy);
+}
+
+void warnOfStranger(const std::string& stranger) {
+  std::cerr << "keldoauth: backup: the store has what no store has: " + printable(stranger) +
+                   "\nhint: the copy is kept, but 'restore' refuses it; remove the " +
+                   "intruder from the store and make another copy\n";
+}
+
 Answer backup(const Arguments& arguments) {
-  const Draft draft(*arguments.file);
+  Draft draft(*arguments.file);
+  copyStoreTo(draft);
+  Answer answer;
   {
-    DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
-    DatabaseFile copy(draft.name(), DatabaseFile::Use::kWrite);
-    store.copyTo(copy);
-    copy.leaveWal();
+    DatabaseFile copy(draft);
     requireSound(copy);
+    const std::string stranger = copy.stranger();
+    if (!stranger.empty()) {
+      warnOfStranger(stranger);
+      answer.exit = kUnhealthy;
+    }
   }
   draft.publish();
-  return {describe(*arguments.file)};
+  answer.document = describe(*arguments.file, draft.size());
+  return answer;
 }
 
 void printBackup(const Json::Value& document, std::ostream& out) {
@@ -63,20 +80,41 @@ void requireTarget() try { Log(); } catch (const Failure& failure) {
                 "if the database is damaged, move it away together with its journal", failure.code);
 }
 
-Failure nothingChanged(const Failure& failure) {
-  return {failure.exit, failure.what(),
-          failure.hint + (failure.hint.empty() ? "" : "; ") + "the store is as it was",
-          failure.code};
+void copyToStore(DatabaseFile& copy) {
+  DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
+  copy.copyTo(store);
+  store.requireStore();
+}
+
+/// What became of the store, by a look at the file itself: a call that failed
+/// may have done all of its work before.
+std::string fateOfStore(std::uint64_t before, std::uint64_t wanted) try {
+  DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
+  store.requireStore();
+  const std::uint64_t now = store.digest();
+  if (now == before) return "the store is as it was";
+  if (now != wanted) return "the store is neither as it was nor as the copy: somebody wrote to it";
+  return "the store was replaced all the same, but a power cut may undo it; run the command again";
+} catch (const Failure& failure) {
+  return "whether the store was replaced cannot be seen: " + failure.text();
+}
+
+std::uint64_t digestOfStore() try {
+  return DatabaseFile(names::kDatabaseFile, DatabaseFile::Use::kWrite).digest();
+} catch (const Failure& failure) {
+  throw Failure(failure.exit, failure.what(), failure.hintAnd("the store is as it was"),
+                failure.code);
 }
 
 void replaceStore(DatabaseFile& copy) {
-  DatabaseFile store(names::kDatabaseFile, DatabaseFile::Use::kWrite);
+  const std::uint64_t wanted = copy.digest();
+  const std::uint64_t before = digestOfStore();
   try {
-    copy.copyTo(store);
+    copyToStore(copy);
   } catch (const Failure& failure) {
-    throw nothingChanged(failure);
+    throw Failure(failure.exit, failure.what(), failure.hintAnd(fateOfStore(before, wanted)),
+                  failure.code);
   }
-  store.requireStore();
 }
 
 /// Whether the key is that of the values restored; null when that cannot be
@@ -86,17 +124,29 @@ Json::Value keyFits() try {
   encrypted("probe");
   return false;
 } catch (const Failure&) {
-  return {};
+  return absenceOfKey().empty() ? Json::Value() : Json::Value(false);
 }
 
 void warnOfKey(const Json::Value& fits) {
-  std::cerr << "keldoauth: restore: "
-            << (fits.isNull() ? "the platform's cipher does not work for this user\n"
-                                "hint: the system log says why; 'keldoauth status', run by the "
-                                "service's user, says whether its key fits\n"
-                              : "the platform's key is not the one of this copy\n"
-                                "hint: put back the key that belongs to it; until then no client "
-                                "is found\n");
+  const std::string missing = absenceOfKey();
+  std::string warning = "the platform's key is not the one of this copy";
+  std::string hint = "put back the key that belongs to it; until then no client is found";
+  if (fits.isNull()) {
+    warning = "the platform's cipher does not work for this user";
+    hint =
+        "the system log says why; 'keldoauth status', run by the service's user, says whether "
+        "its key fits";
+  } else if (!missing.empty()) {
+    warning = missing;
+  }
+  std::cerr << "keldoauth: restore: " + warning + "\nhint: " + hint + "\n";
+}
+
+void requireNoStranger(DatabaseFile& copy, const std::string& path) {
+  const std::string stranger = copy.stranger();
+  if (stranger.empty()) return;
+  throw Failure(kRefused, path + " has what no store has: " + stranger,
+                "it would work on in the store; a copy of the file without it can be restored");
 }
 
 Answer restore(const Arguments& arguments) {
@@ -108,13 +158,14 @@ Answer restore(const Arguments& arguments) {
   DatabaseFile copy(path, DatabaseFile::Use::kRead);
   copy.holdStill();
   copy.requireStore();
+  requireNoStranger(copy, path);
   confirm(arguments, "Replace everything in the store by " + printable(path) + "?");
 
   const MaintenanceLock lock;
   requireTarget();
   replaceStore(copy);
 
-  Answer answer{describe(path)};
+  Answer answer{describe(path, std::filesystem::file_size(path))};
   const Json::Value fits = keyFits();
   answer.document["key_fits"] = fits;
   if (fits != Json::Value(true)) {

@@ -8,6 +8,7 @@
 #include "tools/keldoauth/console/terminal.h"
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/bounds.h"
+#include "tools/keldoauth/storage/encrypted_values.h"
 #include "tools/keldoauth/storage/stores.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
@@ -23,7 +24,7 @@ constexpr Columns kListColumns{
     {"ID", names::kId},
     {"ENABLED", "enabled"},
     {"NAME", names::kDisplayName, Width::kShrinks},
-    {"CLIENT ID", names::kClientId, Width::kShrinks},
+    {"CLIENT ID", names::kClientId, Width::kShrinks, identifierText},
     {"REDIRECT URI", names::kRedirectUri, Width::kShrinks},
     {"SCOPE", names::kScope, Width::kShrinks},
 };
@@ -32,15 +33,15 @@ constexpr Columns kDetailColumns{
     {"id", names::kId},
     {"enabled", "enabled"},
     {"name", names::kDisplayName},
-    {"client id", names::kClientId},
-    {"client secret", names::kClientSecret},
+    {"client id", names::kClientId, Width::kFixed, identifierText},
+    {"client secret", names::kClientSecret, Width::kFixed, secretText},
     {"redirect uri", names::kRedirectUri},
     {"scope", names::kScope},
 };
 
 constexpr Columns kCredentialColumns{
-    {"client id", names::kClientId},
-    {"client secret", names::kClientSecret},
+    {"client id", names::kClientId, Width::kFixed, identifierText},
+    {"client secret", names::kClientSecret, Width::kFixed, secretText},
 };
 
 std::string described(const Json::Value& client) {
@@ -72,6 +73,7 @@ Answer add(const Arguments& arguments) {
                                  ? readSecret(*arguments.secretFile, "Client secret")
                                  : getRandomStr(kGeneratedLength);
   Clients clients;
+  requireKeyOf(clients);
   Json::Value credentials;
   if (clients.Add(identifier, secret, *arguments.redirectUri, *arguments.scope,
                   *arguments.displayName, arguments.disabled ? "0" : "1", credentials) == 0) {

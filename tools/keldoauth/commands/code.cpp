@@ -22,7 +22,7 @@ constexpr unsigned int kCodeLength = 64;
 constexpr Columns kListColumns{
     {"ID", names::kId},
     {"USERNAME", names::kUsername, Width::kShrinks},
-    {"CLIENT ID", names::kClientId, Width::kShrinks},
+    {"CLIENT ID", names::kClientId, Width::kShrinks, identifierText},
     {"SCOPE", names::kScope, Width::kShrinks},
     {"CODE", names::kCode},
     {"EXPIRES", "expires_at", Width::kFixed, expiryText},
@@ -32,7 +32,7 @@ constexpr Columns kListColumns{
 constexpr Columns kDetailColumns{
     {"id", names::kId},
     {"username", names::kUsername},
-    {"client id", names::kClientId},
+    {"client id", names::kClientId, Width::kFixed, identifierText},
     {"scope", names::kScope},
     {"code", names::kCode},
     {"expires", "expires_at", Width::kFixed, expiryAndRemainingText},

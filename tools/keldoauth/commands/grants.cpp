@@ -23,12 +23,12 @@ std::string clientToIssueFor(const Arguments& arguments) {
   if (client[names::kEnable] != "1") {
     std::cerr << "keldoauth: note: client " << client[names::kId].asString() << " is disabled\n";
   }
-  return client[names::kClientId].asString();
+  return readableIdentifier(client);
 }
 
 Arguments withClientIdentifier(const Arguments& arguments) {
   Arguments given = arguments;
-  if (given.client) given.client = requireClient(*given.client)[names::kClientId].asString();
+  if (given.client) given.client = readableIdentifier(requireClient(*given.client));
   return given;
 }
 

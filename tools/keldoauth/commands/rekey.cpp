@@ -6,12 +6,13 @@
 // database changes in one transaction, in which every value is read back with
 // the new key before it is committed; it is read once more from the file, and
 // then the new key takes the old one's place. A run that was interrupted is
-// taken up by the next: values that the waiting key decrypts are done.
+// taken up by the next: values that the waiting key decrypts are done, and a
+// waiting key that decrypts none is drawn anew.
 
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
-#include <filesystem>
 #include <ostream>
 #include <utility>
 #include <vector>
@@ -23,6 +24,7 @@
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
 #include "tools/keldoauth/storage/files.h"
+#include "tools/keldoauth/storage/key_files.h"
 #include "tools/keldoauth/storage/stores.h"
 #include "utils/oauth_names.h"
 
@@ -33,106 +35,138 @@ namespace {
 
 // Keys ------------------------------------------------------------------------------
 
-void requireKeyFile(const KeyFiles& keys) {
-  if (std::filesystem::exists(keys.current)) return;
-  throw Failure(kRefused, "no key file " + keys.current,
-                "only the stand-in cipher has one; it is made when it is first needed");
+void requireKeyFile() {
+  const std::string missing = absenceOfKey();
+  if (missing.empty()) return;
+  throw Failure(kRefused, missing,
+                "put it back; where nothing was encrypted yet, the stand-in cipher makes one "
+                "when it is first needed");
 }
 
-/// The key to come. An interrupted run may have left one, and values that are
-/// encrypted with it. One that is made here is gone with the scope, until it is
-/// to be kept.
+/// The key to come. An interrupted run may have left one: it stays as long as a
+/// value needs it. One that is drawn here is gone with the scope, until it is to
+/// be kept.
 class NextKey {
  public:
-  /// A platform library that keeps its key elsewhere gives the same ciphertext
-  /// whatever the variable says.
-  explicit NextKey(const KeyFiles& keys)
-      : file_(keys.next), isMineToRemove_(!std::filesystem::exists(file_)) {
-    useKey(keys.current);
-    const std::string before = encrypted("probe");
-    useKey(keys.next);
-    if (encrypted("probe") == before) {
-      throw Failure(kRefused, "the platform's cipher does not take its key from a file");
-    }
-  }
+  explicit NextKey(const KeyFiles& keys) : keys_(keys) {}
   ~NextKey() {
-    if (isMineToRemove_) unlink(file_.c_str());
+    if (isMineToRemove_) unlink(keys_.next.c_str());
   }
   NextKey(const NextKey&) = delete;
   NextKey& operator=(const NextKey&) = delete;
 
+  /// In place of one that waits for nothing, whatever it is. A platform library
+  /// that keeps its key elsewhere gives the same ciphertext whatever the
+  /// variable says.
+  void draw() {
+    useKey(keys_.current);
+    const std::string before = encrypted("probe");
+    if (unlink(keys_.next.c_str()) != 0 && errno != ENOENT) throw systemFailure(keys_.next);
+    drawKey(keys_.next);
+    isMineToRemove_ = true;
+    useKey(keys_.next);
+    if (encrypted("probe") == before) {
+      throw Failure(kRefused, "the platform's cipher does not take its key from a file");
+    }
+  }
+
   /// From now on values may depend on it.
   void keep() {
-    syncFolderOf(file_);
+    syncFolderOf(keys_.next);
     isMineToRemove_ = false;
   }
 
  private:
-  std::string file_;
-  bool isMineToRemove_;
+  const KeyFiles& keys_;
+  bool isMineToRemove_ = false;
 };
 
 /// The old key goes here. A commit survives a power cut only when the folder
 /// knows that its journal is gone.
 void replaceKey(const KeyFiles& keys) {
-  syncFolderOf(names::kDatabaseFile);
-  if (std::rename(keys.next.c_str(), keys.current.c_str()) != 0) throw systemFailure(keys.current);
-  syncFolderOf(keys.current);
+  try {
+    syncFolderOf(names::kDatabaseFile);
+    if (std::rename(keys.next.c_str(), keys.current.c_str()) != 0) {
+      throw systemFailure(keys.current);
+    }
+  } catch (const Failure& failure) {
+    throw Failure(failure.exit, failure.what(),
+                  "every value is encrypted with " + keys.next + "; run the command again");
+  }
+  try {
+    removeKeyDrafts(keys.current);
+    syncFolderOf(keys.current);
+  } catch (const Failure& failure) {
+    throw Failure(failure.exit, failure.what(),
+                  "the new key is in its place, but a power cut may bring both keys back; "
+                  "then run the command again");
+  }
 }
 
 // Values ----------------------------------------------------------------------------
 
-/// Those that the current key decrypts, with their clear text. Throws for a
-/// value that neither key does.
-std::vector<EncryptedValue> valuesToConvert(OAUTHDBBasic& store, const KeyFiles& keys) {
-  std::vector<EncryptedValue> todo;
-  std::vector<EncryptedValue> others;
+/// The values of the store by the key that decrypts them, with their clear text.
+struct Sorted {
+  struct Value : EncryptedValue {
+    const char* table;
+  };
+  std::vector<Value> current;
+  std::vector<Value> next;
+};
+
+/// Throws for a value that neither key decrypts.
+Sorted sortedValues(OAUTHDBBasic& store, const KeyFiles& keys) {
+  Sorted sorted;
   useKey(keys.current);
-  for (EncryptedValue& value : encryptedValues(store)) {
-    (decrypt(value) ? todo : others).push_back(std::move(value));
+  for (const char* table : kTablesWithSecrets) {
+    store.SetTabName(table);
+    for (EncryptedValue& value : encryptedValues(store)) {
+      const bool isDone = decrypt(value);
+      (isDone ? sorted.current : sorted.next).push_back({std::move(value), table});
+    }
   }
   useKey(keys.next);
-  for (EncryptedValue& value : others) {
+  for (Sorted::Value& value : sorted.next) {
     if (decrypt(value)) continue;
     throw Failure(kRefused,
-                  store.GetTabName() + " " + value.id + ": " + value.column +
+                  std::string(value.table) + " " + value.id + ": " + value.column +
                       " is encrypted with another key",
                   "nothing was changed");
   }
-  return todo;
+  return sorted;
 }
 
 /// With the next key in use.
-void convertValues(OAUTHDBBasic& store, const std::vector<EncryptedValue>& values) {
-  for (const EncryptedValue& value : values) {
+void convertValues(OAUTHDBBasic& store, const std::vector<Sorted::Value>& values) {
+  for (const Sorted::Value& value : values) {
     Json::Value request;
     request[names::kCondition][names::kId] = value.id;
     request[names::kModified][value.column] = value.clear;
+    store.SetTabName(value.table);
     if (!store.DBEdit(request)) throw libraryFailure(store);
   }
 }
 
 void requireAllReadable(OAUTHDBBasic& store) {
-  for (EncryptedValue& value : encryptedValues(store)) {
-    if (!decrypt(value)) throw Failure(kUnavailable, "a value cannot be read back");
+  for (const char* table : kTablesWithSecrets) {
+    store.SetTabName(table);
+    for (EncryptedValue& value : encryptedValues(store)) {
+      if (!decrypt(value)) throw Failure(kUnavailable, "a value cannot be read back");
+    }
   }
 }
 
 std::size_t convertStore(const KeyFiles& keys, NextKey& next) {
-  std::size_t converted = 0;
   OAUTHDBBasic store;
   requireReady(store);
   Transaction transaction(store);
-  for (const char* table : kTablesWithSecrets) {
-    store.SetTabName(table);
-    const std::vector<EncryptedValue> values = valuesToConvert(store, keys);
-    convertValues(store, values);
-    requireAllReadable(store);
-    converted += values.size();
-  }
+  const Sorted sorted = sortedValues(store, keys);
+  if (sorted.next.empty()) next.draw();
+  convertValues(store, sorted.current);
+  requireAllReadable(store);
   next.keep();
   transaction.commit();
-  return converted;
+  return sorted.current.size();
 }
 
 /// Through a connection of its own, and with what came in since the commit.
@@ -144,7 +178,7 @@ void verifyStore() {
 
 Answer rekey(const Arguments& arguments) {
   const KeyFiles keys = keyFiles();
-  requireKeyFile(keys);
+  requireKeyFile();
   confirm(arguments,
           "Encrypt every identifier and secret with a new key? "
           "Stop the service first: what it writes meanwhile would be lost.");

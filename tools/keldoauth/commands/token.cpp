@@ -20,7 +20,7 @@ namespace {
 constexpr Columns kListColumns{
     {"ID", names::kId},
     {"USERNAME", names::kUsername, Width::kShrinks},
-    {"CLIENT ID", names::kClientId, Width::kShrinks},
+    {"CLIENT ID", names::kClientId, Width::kShrinks, identifierText},
     {"SCOPE", names::kScope, Width::kShrinks},
     {"ACCESS", names::kAccessToken},
     {"REFRESH", names::kRefreshToken},
@@ -31,7 +31,7 @@ constexpr Columns kListColumns{
 constexpr Columns kDetailColumns{
     {"id", names::kId},
     {"username", names::kUsername},
-    {"client id", names::kClientId},
+    {"client id", names::kClientId, Width::kFixed, identifierText},
     {"scope", names::kScope},
     {"access token", names::kAccessToken},
     {"refresh token", names::kRefreshToken},

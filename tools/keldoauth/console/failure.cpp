@@ -5,6 +5,7 @@
 #include "core/oauth_db_basic.h"
 #include "core/oauth_errors.h"
 #include "tools/keldoauth/console/text.h"
+#include "tools/keldoauth/storage/key_files.h"
 
 using namespace KELDOAUTHSERVER;
 
@@ -26,12 +27,12 @@ ExitCode exitFor(int code) {
   return refused ? kRefused : kUnavailable;
 }
 
-const char* adviceFor(int code) {
+std::string adviceFor(int code) {
   switch (code) {
     case errors::kCreateTableFailed.code:
       return "the system log names the table and the cause";
     case errors::kEncryptFailed.code:
-      return "the platform's cipher or its key cannot be used; the system log says more";
+      return adviceOnCipher();
     case kBusy:
       return "another process holds the database; try again";
     case kReadOnly:
@@ -62,10 +63,13 @@ std::string Failure::text() const {
   return what() + (code ? " (" + std::to_string(*code) + ")" : "");
 }
 
+std::string Failure::hintAnd(const std::string& more) const {
+  return hint + (hint.empty() ? "" : "; ") + more;
+}
+
 Failure libraryFailure(int code, const std::string& message, const std::string& explanation) {
   const ExitCode exit = exitFor(code);
-  const std::string hint =
-      exit == kRefused && !explanation.empty() ? explanation : std::string(adviceFor(code));
+  const std::string hint = exit == kRefused && !explanation.empty() ? explanation : adviceFor(code);
   if (code == errors::kNone.code) return {exit, "refused, without an error code", hint};
   return {exit, message, hint, code};
 }

@@ -37,6 +37,9 @@ class Failure : public std::runtime_error {
   /// The message with the library's code: "Bad parameters (-2)".
   [[nodiscard]] std::string text() const;
 
+  /// The hint, and then `more`.
+  [[nodiscard]] std::string hintAnd(const std::string& more) const;
+
   ExitCode exit;
   std::optional<int> code;  // the library's, when it set one
   std::string hint;         // what to do about it; may be empty

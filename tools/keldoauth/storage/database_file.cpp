@@ -2,10 +2,13 @@
 
 #include <sqlite3.h>
 
-#include <cstdlib>
 #include <ctime>
-#include <memory>
+#include <functional>
+#include <string_view>
 
+#include "core/schema.h"
+#include "tools/keldoauth/storage/descriptor_vfs.h"
+#include "tools/keldoauth/storage/files.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
@@ -33,10 +36,54 @@ constexpr Table kTables[] = {
     {names::kLogTable, "id, timestamp, msg"},
 };
 
-struct FinalizeStatement {
-  void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
+class Statement {
+ public:
+  /// `error` makes what is thrown when SQLite refuses.
+  Statement(sqlite3* db, const std::string& sql, const std::function<Failure()>& error)
+      : error_(error) {
+    const int result = sqlite3_prepare_v2(db, sql.c_str(), -1, &statement_, nullptr);
+    if (result != SQLITE_OK) throw error_();
+  }
+  ~Statement() { sqlite3_finalize(statement_); }
+  Statement(const Statement&) = delete;
+  Statement& operator=(const Statement&) = delete;
+
+  /// False after the last row.
+  bool step() {
+    const int result = sqlite3_step(statement_);
+    if (result != SQLITE_ROW && result != SQLITE_DONE) throw error_();
+    return result == SQLITE_ROW;
+  }
+
+  [[nodiscard]] int columns() const { return sqlite3_column_count(statement_); }
+
+  [[nodiscard]] std::string_view text(int column) const {
+    const unsigned char* const bytes = sqlite3_column_text(statement_, column);
+    const int size = sqlite3_column_bytes(statement_, column);
+    if (bytes == nullptr) return {};
+    return {reinterpret_cast<const char*>(bytes), static_cast<std::size_t>(size)};
+  }
+
+ private:
+  std::function<Failure()> error_;
+  sqlite3_stmt* statement_ = nullptr;
 };
-using Statement = std::unique_ptr<sqlite3_stmt, FinalizeStatement>;
+
+/// FNV-1a. Nobody gains by two contents with one digest.
+class Digest {
+ public:
+  void add(std::string_view text) {
+    for (const char byte : text) mix(static_cast<unsigned char>(byte));
+    for (std::size_t size = text.size(), i = 0; i < sizeof size; ++i, size /= 256) {
+      mix(static_cast<unsigned char>(size % 256));
+    }
+  }
+  [[nodiscard]] std::uint64_t value() const { return value_; }
+
+ private:
+  void mix(unsigned char byte) { value_ = (value_ ^ byte) * 1099511628211U; }
+  std::uint64_t value_ = 14695981039346656037U;
+};
 
 /// SQLite's busy handler. Short even steps: the growing ones of SQLite's own
 /// would never get a turn between busy writers.
@@ -73,16 +120,25 @@ void DatabaseFile::CloseConnection::operator()(sqlite3* db) const {
 }
 
 DatabaseFile::DatabaseFile(const std::string& path, Use use) : path_(path), use_(use) {
-  const int flags = use == Use::kRead ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE;
+  open(path, use == Use::kRead ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE, nullptr);
+  if (use == Use::kWrite) execute("PRAGMA synchronous=EXTRA");
+}
+
+DatabaseFile::DatabaseFile(const Draft& draft) : path_(draft.path()), use_(Use::kWrite) {
+  open(descriptorName(draft.descriptor()), SQLITE_OPEN_READWRITE, descriptorVfs());
+  execute("PRAGMA journal_mode=OFF; PRAGMA temp_store=MEMORY");
+}
+
+void DatabaseFile::open(const std::string& name, int flags, const char* vfs) {
   sqlite3* raw = nullptr;
-  const int result = sqlite3_open_v2(path.c_str(), &raw, flags, nullptr);
+  const int result = sqlite3_open_v2(name.c_str(), &raw, flags, vfs);
   db_.reset(raw);  // a failed open may hand out a handle, too
   if (result != SQLITE_OK) throw failure();
   sqlite3_busy_handler(raw, waitForLock, nullptr);
 }
 
 void DatabaseFile::holdStill() {
-  if (sqlite3_exec(db_.get(), "BEGIN", nullptr, nullptr, nullptr) != SQLITE_OK) throw failure();
+  execute("BEGIN");
 }
 
 void DatabaseFile::requireStore() {
@@ -110,18 +166,54 @@ void DatabaseFile::copyTo(DatabaseFile& target) {
   if (copied != SQLITE_DONE) throw target.failure(copied);
 }
 
-void DatabaseFile::leaveWal() {
-  text("PRAGMA journal_mode=DELETE");
+std::string DatabaseFile::stranger() {
+  DatabaseFile model(":memory:", Use::kWrite);
+  model.execute(schema::kCreateMeta);
+  for (const schema::Step& step : schema::kSteps) model.execute(step.statement);
+  const std::map<std::string, std::string> own = model.schemaEntries();
+  for (const auto& [definition, name] : schemaEntries()) {
+    if (own.count(definition) == 0) return name;
+  }
+  return {};
+}
+
+/// The name of each with its type, by everything that defines it.
+std::map<std::string, std::string> DatabaseFile::schemaEntries() {
+  Statement rows(db_.get(),
+                 "SELECT type || ' ' || name, type, name, tbl_name, sql FROM sqlite_master "
+                 "WHERE type NOT IN ('table', 'index') OR name NOT LIKE 'sqlite^_%' ESCAPE '^'",
+                 [this] { return failure(); });
+  std::map<std::string, std::string> entries;
+  while (rows.step()) {
+    std::string definition;
+    for (int i = 1; i < rows.columns(); ++i) definition.append(rows.text(i)).append(1, '\0');
+    entries[definition] = rows.text(0);
+  }
+  return entries;
+}
+
+std::uint64_t DatabaseFile::digest() {
+  Digest digest;
+  for (const Table& table : kTables) {
+    digest.add(table.name);
+    Statement rows(db_.get(), std::string("SELECT ") + table.columns + " FROM " + table.name,
+                   [this] { return failure(); });
+    while (rows.step()) {
+      for (int i = 0; i < rows.columns(); ++i) digest.add(rows.text(i));
+    }
+  }
+  return digest.value();
+}
+
+void DatabaseFile::execute(const std::string& sql) {
+  if (sqlite3_exec(db_.get(), sql.c_str(), nullptr, nullptr, nullptr) != SQLITE_OK) throw failure();
 }
 
 /// The first column of the first row.
 std::string DatabaseFile::text(const std::string& sql) {
-  sqlite3_stmt* raw = nullptr;
-  if (sqlite3_prepare_v2(db_.get(), sql.c_str(), -1, &raw, nullptr) != SQLITE_OK) throw failure();
-  const Statement statement(raw);
-  if (sqlite3_step(raw) != SQLITE_ROW) throw failure();
-  const unsigned char* const column = sqlite3_column_text(raw, 0);
-  return column == nullptr ? "" : reinterpret_cast<const char*>(column);
+  Statement statement(db_.get(), sql, [this] { return failure(); });
+  if (!statement.step()) throw failure();
+  return std::string(statement.text(0));
 }
 
 Failure DatabaseFile::failure() const {

@@ -1,17 +1,15 @@
 #include "tools/keldoauth/storage/encrypted_values.h"
 
 #include <algorithm>
-#include <cstdlib>
 
 #include "tools/keldoauth/console/failure.h"
+#include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/stores.h"
 
 using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
-
-constexpr char kKeyVariable[] = "KELDCORE_KEY_FILE";
 
 /// The library's own conversion, one value at a time.
 bool convert(int (*conversion)(Json::Value&), std::string& text) {
@@ -53,19 +51,7 @@ bool decrypt(EncryptedValue& value) {
 
 std::string encrypted(std::string text) {
   if (convert(OAUTHDBBasic::ParamEncrypt, text)) return text;
-  throw Failure(kUnavailable, "the cipher refuses to encrypt", "the system log says why");
-}
-
-KeyFiles keyFiles() {
-  static const std::string current = [] {
-    const char* const chosen = secure_getenv(kKeyVariable);
-    return std::string(chosen != nullptr && *chosen != '\0' ? chosen : KELDCORE_KEY_FILE);
-  }();
-  return {current, current + ".next"};
-}
-
-void useKey(const std::string& file) {
-  setenv(kKeyVariable, file.c_str(), 1);
+  throw Failure(kUnavailable, "the cipher refuses to encrypt", adviceOnCipher());
 }
 
 bool isAllReadable() {
@@ -77,6 +63,21 @@ bool isAllReadable() {
     if (!std::all_of(values.begin(), values.end(), decrypt)) return false;
   }
   return true;
+}
+
+void requireKeyOf(OAUTHDBBasic& clients) {
+  std::vector<EncryptedValue> values = encryptedValues(clients);
+  if (values.empty() || std::any_of(values.begin(), values.end(), decrypt)) return;
+  const std::string missing = absenceOfKey();
+  throw Failure(
+      kUnavailable,
+      missing.empty() ? "the platform's key is not the one that encrypted this store" : missing,
+      "nothing was stored; put back the key that belongs to the store");
+}
+
+bool isDecrypted(const std::string& text) {
+  constexpr std::size_t kIdentifierBytes = 64;
+  return text.size() == kIdentifierBytes || withoutDoubledQuotes(text).size() == kIdentifierBytes;
 }
 
 }  // namespace tool

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "core/oauth_db_basic.h"
+#include "tools/keldoauth/storage/key_files.h"
 #include "utils/oauth_names.h"
 
 namespace tool {
@@ -33,21 +34,17 @@ bool decrypt(EncryptedValue& value);
 /// Throws Failure.
 std::string encrypted(std::string text);
 
-/// Where the stand-in cipher has its key, and where a new one waits while
-/// `keldoauth rekey` is at work, or after that was interrupted: what the
-/// environment said before useKey() changed it.
-struct KeyFiles {
-  std::string current;
-  std::string next;
-};
-KeyFiles keyFiles();
-
-/// From now on the stand-in cipher of this process takes that key.
-void useKey(const std::string& file);
-
 /// Whether the cipher's key is that of every value in the database. Throws
 /// Failure.
 bool isAllReadable();
+
+/// Throws kUnavailable when the store has clients and the cipher decrypts none
+/// of them: what came in now would be lost as soon as the right key is back.
+void requireKeyOf(KELDOAUTHSERVER::OAUTHDBBasic& clients);
+
+/// An identifier or secret as the library hands it out. What it could not
+/// decrypt comes as it is in the file, and has another length.
+bool isDecrypted(const std::string& text);
 
 }  // namespace tool
 

@@ -3,6 +3,7 @@
 #ifndef KELDOAUTH_TOOLS_FILES_H
 #define KELDOAUTH_TOOLS_FILES_H
 
+#include <cstdint>
 #include <string>
 
 #include "tools/keldoauth/console/failure.h"
@@ -18,12 +19,29 @@ void requireReadableFile(const std::string& path);
 bool isSameFile(const std::string& one, const std::string& other);
 
 /// Makes new, changed and removed names in the folder of `path` survive a power
-/// cut, as far as the system allows.
+/// cut. Throws Failure.
 void syncFolderOf(const std::string& path);
 
-/// A file of the owner's alone under a name of its own beside `path`: empty at
-/// first, and gone with the scope, together with what SQLite put beside it,
-/// unless it was published.
+/// Closes with the scope.
+class Descriptor {
+ public:
+  explicit Descriptor(int value) : value_(value) {}
+  ~Descriptor();
+  Descriptor(const Descriptor&) = delete;
+  Descriptor& operator=(const Descriptor&) = delete;
+
+  [[nodiscard]] bool isOpen() const { return value_ >= 0; }
+  [[nodiscard]] int get() const { return value_; }
+
+ private:
+  int value_;
+};
+
+/// A file that is to be `path` once it is whole: the owner's alone, empty at
+/// first, and gone with the scope unless it was published. It is written through
+/// its descriptor only. It has no name as long as it is a draft, so that nobody
+/// who may write the folder can put another file in its place; on media that
+/// know no such files it has one of its own, which nothing is written by.
 class Draft {
  public:
   /// Throws Failure, also when `path` is there already.
@@ -32,15 +50,25 @@ class Draft {
   Draft(const Draft&) = delete;
   Draft& operator=(const Draft&) = delete;
 
-  [[nodiscard]] const std::string& name() const { return name_; }
+  [[nodiscard]] const std::string& path() const { return path_; }
+  [[nodiscard]] int descriptor() const { return file_.get(); }
+  [[nodiscard]] std::uintmax_t size() const;
 
-  /// Gives the file the name `path`, and never another file's place. Throws
-  /// Failure.
-  void publish() const;
+  /// Brings the file to the disk and gives it the name `path`, never another
+  /// file's place. Throws Failure; one that names the folder leaves the file
+  /// there, whole.
+  void publish();
 
  private:
+  int create();
+  [[nodiscard]] bool moveToFreeName() const;
+  [[nodiscard]] bool isInPlace() const;
+
   std::string path_;
-  std::string name_;
+  std::string base_;
+  std::string draftName_;  // empty without one
+  Descriptor folder_;
+  Descriptor file_;
 };
 
 /// Keeps commands apart that must not change database or key at the same time.
@@ -50,12 +78,9 @@ class MaintenanceLock {
  public:
   /// Throws Failure, at once when another command has it.
   MaintenanceLock();
-  ~MaintenanceLock();
-  MaintenanceLock(const MaintenanceLock&) = delete;
-  MaintenanceLock& operator=(const MaintenanceLock&) = delete;
 
  private:
-  int folder_;
+  Descriptor folder_;
 };
 
 }  // namespace tool

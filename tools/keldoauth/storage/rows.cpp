@@ -5,7 +5,10 @@
 #include <system_error>
 
 #include "tools/keldoauth/console/clock.h"
+#include "tools/keldoauth/console/failure.h"
+#include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/text.h"
+#include "tools/keldoauth/storage/encrypted_values.h"
 #include "utils/oauth_names.h"
 
 namespace names = KELDOAUTHSERVER::names;
@@ -32,6 +35,20 @@ void mask(Json::Value& row, Secrets secrets, std::initializer_list<const char*> 
   for (const char* column : columns) row[column] = masked(row[column].asString());
 }
 
+/// After masking: a mask of what could not be decrypted says nothing.
+void markUndecrypted(Json::Value& shown, const Json::Value& row,
+                     std::initializer_list<const char*> columns) {
+  for (const char* column : columns) {
+    if (!row.isMember(column) || isDecrypted(row[column].asString())) continue;
+    shown[column] = Json::Value();
+    shown["undecrypted"].append(column);
+  }
+}
+
+std::string decryptedText(const Json::Value& row, const char* column) {
+  return row[column].isNull() ? "(cannot be decrypted)" : cellText(row[column]);
+}
+
 void presentExpiry(Json::Value& row, bool (*isExpired)(long long expiry, long long now)) {
   const long long expiry = expiryOf(row);
   row["expires_at"] = timeOrNull(expiry);
@@ -47,6 +64,7 @@ Json::Value presentClient(const Json::Value& row, Secrets secrets) {
   shown.removeMember(names::kEnable);
   shown["enabled"] = row[names::kEnable] == "1";
   mask(shown, secrets, {names::kClientSecret});
+  markUndecrypted(shown, row, {names::kClientId, names::kClientSecret});
   return shown;
 }
 
@@ -55,6 +73,7 @@ Json::Value presentCode(const Json::Value& row, Secrets secrets) {
   shown[names::kId] = numberOrText(row[names::kId]);
   presentExpiry(shown, isExpiredCode);
   mask(shown, secrets, {names::kCode});
+  markUndecrypted(shown, row, {names::kClientId});
   return shown;
 }
 
@@ -63,6 +82,7 @@ Json::Value presentToken(const Json::Value& row, Secrets secrets) {
   shown[names::kId] = numberOrText(row[names::kId]);
   presentExpiry(shown, isExpiredToken);
   mask(shown, secrets, {names::kAccessToken, names::kRefreshToken});
+  markUndecrypted(shown, row, {names::kClientId});
   return shown;
 }
 
@@ -88,6 +108,22 @@ bool isExpiredCode(long long expiry, long long now) {
 
 bool isExpiredToken(long long expiry, long long now) {
   return expiry < now;
+}
+
+std::string readableIdentifier(const Json::Value& row) {
+  const std::string identifier = row[names::kClientId].asString();
+  if (isDecrypted(identifier)) return identifier;
+  throw Failure(kUnavailable,
+                "client " + row[names::kId].asString() + ": its identifier cannot be decrypted",
+                adviceOnCipher());
+}
+
+std::string identifierText(const Json::Value& row) {
+  return decryptedText(row, names::kClientId);
+}
+
+std::string secretText(const Json::Value& row) {
+  return decryptedText(row, names::kClientSecret);
 }
 
 std::string expiryText(const Json::Value& row) {
