@@ -45,10 +45,9 @@ class KeyAway : public Operations {
 TEST_F(KeyAway, ClientIsRefusedAndTheKeyIsNamed) {
   const Outcome outcome = run(kAddClient);
   EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
-  EXPECT_EQ(
-      outcome.err,
-      std::string("keldoauth: client add: the key file ") + kKey +
-          " is missing\nhint: nothing was stored; put back the key that belongs to the store\n");
+  EXPECT_EQ(outcome.err,
+            std::string("keldoauth: client add: Data Encrypt failed (-4)\nhint: the key file ") +
+                kKey + " is missing\n");
   expectNothingDone();
 }
 

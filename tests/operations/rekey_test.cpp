@@ -241,13 +241,14 @@ TEST_F(Rekey, KnowsItsNewKeyOnTheDiskBeforeItCommits) {
   EXPECT_NE(std::find(made, written, std::string("sync ") + kStateDir), written);
 }
 
-/// The service was not stopped: it encrypts with the old key still.
+/// The service was not stopped: it encrypts with the old key still. It comes in
+/// after the commit and the sync that ends it.
 TEST_F(Rekey, KeepsBothKeysWhenAValueCameInAfterTheCommit) {
   const std::string cipher = sqlText("SELECT client_id FROM oauth_clientInfo WHERE id=1");
   const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
   putBack(kStateDir, before_);
   const auto commit = std::find(steps.rbegin(), steps.rend(), std::string("unlink ") + kJournal);
-  const Outcome outcome = meanwhile(static_cast<int>(steps.rend() - commit) + 1,
+  const Outcome outcome = meanwhile(static_cast<int>(steps.rend() - commit) + 2,
                                     std::string("sqlite3 ") + kDatabase +
                                         " \"INSERT INTO oauth_grantCode VALUES('u','" + cipher +
                                         "','s','c','1','x','i',9)\"",

@@ -68,11 +68,10 @@ bool isAllReadable() {
 void requireKeyOf(OAUTHDBBasic& clients) {
   std::vector<EncryptedValue> values = encryptedValues(clients);
   if (values.empty() || std::any_of(values.begin(), values.end(), decrypt)) return;
-  const std::string missing = absenceOfKey();
-  throw Failure(
-      kUnavailable,
-      missing.empty() ? "the platform's key is not the one that encrypted this store" : missing,
-      "nothing was stored; put back the key that belongs to the store");
+  std::string probe = "probe";
+  if (!convert(OAUTHDBBasic::ParamEncrypt, probe)) return;
+  throw Failure(kUnavailable, "the platform's key is not the one that encrypted this store",
+                "nothing was stored; put back the key that belongs to the store");
 }
 
 bool isDecrypted(const std::string& text) {

@@ -38,8 +38,9 @@ std::string encrypted(std::string text);
 /// Failure.
 bool isAllReadable();
 
-/// Throws kUnavailable when the store has clients and the cipher decrypts none
-/// of them: what came in now would be lost as soon as the right key is back.
+/// Throws kUnavailable when the store has clients and the cipher works, but
+/// decrypts none of them: what came in now would be lost as soon as the right
+/// key is back.
 void requireKeyOf(KELDOAUTHSERVER::OAUTHDBBasic& clients);
 
 /// An identifier or secret as the library hands it out. What it could not
