@@ -144,6 +144,14 @@ constexpr sqlite3_io_methods kMethods = {
 
 // The file system -------------------------------------------------------------
 
+/// The library makes the database itself, right before SQLite opens it.
+bool isNewFile(const char* name, int flags) {
+  if (name == nullptr) return false;
+  struct stat status {};
+  if (stat(name, &status) != 0) return true;
+  return (flags & SQLITE_OPEN_MAIN_DB) != 0 && status.st_size == 0;
+}
+
 int openFile(sqlite3_vfs* vfs, const char* name, sqlite3_file* file, int flags, int* outFlags) {
   FaultyVfs& owner = ownerOf(vfs);
   ShimFile& opened = shim(file);
@@ -153,7 +161,7 @@ int openFile(sqlite3_vfs* vfs, const char* name, sqlite3_file* file, int flags, 
   opened.owner = &owner;
   opened.path = name != nullptr ? name : "";
   opened.real = reinterpret_cast<sqlite3_file*>(&opened + 1);
-  const bool isNew = name != nullptr && access(name, F_OK) != 0;
+  const bool isNew = isNewFile(name, flags);
   const int result = plain()->xOpen(plain(), name, opened.real, flags, outFlags);
   if (opened.real->pMethods == nullptr) return result;
 

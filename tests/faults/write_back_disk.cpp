@@ -24,8 +24,8 @@ void apply(std::string& bytes, std::size_t offset, const std::string& piece) {
 
 }  // namespace
 
-WriteBackDisk::WriteBackDisk(const std::string& database, FolderWrites folderWrites, unsigned seed)
-    : paths_{database, database + "-journal"}, folderWrites_(folderWrites), random_(seed) {
+WriteBackDisk::WriteBackDisk(const std::string& database, unsigned seed)
+    : paths_{database, database + "-journal"}, random_(seed) {
   for (const std::string& path : paths_) load(path);
   onMedium_ = seen_;
 }
@@ -67,9 +67,7 @@ int WriteBackDisk::permit(Call call) {
 int WriteBackDisk::created(const std::string& path) {
   if (path.empty()) return SQLITE_OK;
   enter({path, std::make_shared<Content>(Content{{}, {}, modeOf(path)})});
-  if (isCutNow()) return SQLITE_CANTOPEN;
-  if (folderWrites_ == FolderWrites::kAtOnce) writeFolder(cachedEntries_.size());
-  return SQLITE_OK;
+  return isCutNow() ? SQLITE_CANTOPEN : SQLITE_OK;
 }
 
 int WriteBackDisk::wrote(const std::string& path, std::int64_t offset, const std::string& bytes) {
@@ -97,7 +95,7 @@ int WriteBackDisk::removed(const std::string& path, bool folder) {
   if (path.empty()) return SQLITE_OK;
   enter({path, nullptr});
   if (isCutNow()) return SQLITE_IOERR_DELETE;
-  if (folder || folderWrites_ == FolderWrites::kAtOnce) writeFolder(cachedEntries_.size());
+  if (folder) writeFolder(cachedEntries_.size());
   return SQLITE_OK;
 }
 

@@ -18,17 +18,12 @@
 
 namespace faults {
 
-/// When the name of a file that was created or removed reaches the medium.
-enum class FolderWrites {
-  kAtOnce,  // with the call itself, as in SQLite's own crash tests
-  kOnSync,  // only when SQLite syncs the folder
-};
-
 /// Watches a database and its journal. A change is one creation, write,
-/// truncation, sync or removal.
+/// truncation, sync or removal. The name of a file that was created may be
+/// missing, and one that was removed may be back, until the folder is synced.
 class WriteBackDisk : public Medium {
  public:
-  WriteBackDisk(const std::string& database, FolderWrites folderWrites, unsigned seed);
+  WriteBackDisk(const std::string& database, unsigned seed);
 
   /// Power goes while the `change`-th change from now on (1 is the next) is
   /// under way: that one may still reach the medium, in part or not at all.
@@ -78,7 +73,6 @@ class WriteBackDisk : public Medium {
   unsigned draw(unsigned below);
 
   std::vector<std::string> paths_;
-  FolderWrites folderWrites_;
   Entries seen_;      // by SQLite
   Entries onMedium_;  // after the power is back
   std::vector<Entry> cachedEntries_;
