@@ -44,8 +44,8 @@ class Descriptor {
   int number_;
 };
 
-/// Puts `image` behind the loop device `loop`, which lets go of it as soon as it
-/// is neither open nor mounted. False when another process was faster.
+/// Puts `image` behind the loop device `loop`, which lets go of it as soon as
+/// it is neither open nor mounted. False when another process was faster.
 bool attach(const Descriptor& loop, const Descriptor& image) {
   if (ioctl(loop.number(), LOOP_SET_FD, image.number()) != 0) {
     require(errno == EBUSY, "attach a loop device");

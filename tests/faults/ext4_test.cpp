@@ -72,8 +72,8 @@ TEST_P(Ext4Test, HasWhatWasAcknowledged) {
 INSTANTIATE_TEST_SUITE_P(EveryOperation, Ext4Test, ::testing::ValuesIn(everyOperation()),
                          support::CaseName());
 
-/// The same cut takes the change back where the folder is not synced, so that it
-/// is no kindness of this file system that keeps it.
+/// The same cut takes the change back where the folder is not synced, so that
+/// it is no kindness of this file system that keeps it.
 using Ext4ControlTest = Ext4Test;
 
 /// A registration ends with an entry through a connection of its own, which
