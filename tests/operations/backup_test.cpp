@@ -164,15 +164,44 @@ TEST_F(Backup, OfAStoreWithATriggerIsKeptAndSaysThatItCannotBeRestored) {
   EXPECT_EQ(contentOf(kCopy), contentOf());
 }
 
+/// While it lives no file can do without a name, as on FAT.
+class NoNamelessFiles {
+ public:
+  NoNamelessFiles() {
+    fs::create_directory("/tmp/empty");
+    EXPECT_EQ(mount("/tmp/empty", "/proc", nullptr, MS_BIND, nullptr), 0);
+  }
+  ~NoNamelessFiles() { umount2("/proc", MNT_DETACH); }
+  NoNamelessFiles(const NoNamelessFiles&) = delete;
+  NoNamelessFiles& operator=(const NoNamelessFiles&) = delete;
+};
+
 TEST_F(Backup, WithoutNamelessFilesKeepsItsDraftPrivateAndLeavesNothing) {
-  fs::create_directory("/tmp/empty");
-  ASSERT_EQ(mount("/tmp/empty", "/proc", nullptr, MS_BIND, nullptr), 0);
-  const Outcome outcome = backUp();
-  umount2("/proc", MNT_DETACH);
-  EXPECT_THAT(outcome, ExitsWith(cli::kOk));
+  {
+    const NoNamelessFiles named;
+    EXPECT_THAT(backUp(), ExitsWith(cli::kOk));
+  }
   EXPECT_THAT(filesIn(kCopies), SizeIs(1));
   expectPrivate(kCopies);
   EXPECT_EQ(contentOf(kCopy), contentOf());
+}
+
+TEST_F(Backup, WithoutNamelessFilesNoticesThatItsDraftWasReplaced) {
+  const NoNamelessFiles named;
+  const std::vector<std::string> steps = stepsOf({"backup", kCopy});
+  const auto sync = std::find_if(steps.begin(), steps.end(), [](const std::string& step) {
+    return step.rfind("sync ", 0) == 0;
+  });
+  ASSERT_NE(sync, steps.end());
+  putBack(kCopies, {});
+  const Outcome outcome = meanwhile(static_cast<int>(sync - steps.begin()) + 1,
+                                    "cd /tmp/copies; mkdir ../prey; for draft in copy.db.*; do "
+                                    "mv $draft ../prey; echo other >$draft; done",
+                                    {"backup", kCopy});
+  EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
+  EXPECT_THAT(outcome.err, HasSubstr("/tmp/copies/copy.db is another file now: somebody put it "
+                                     "there\n"));
+  EXPECT_EQ(readFile(kCopy), "other\n");
 }
 
 // An attacker -----------------------------------------------------------------------

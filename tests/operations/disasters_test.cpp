@@ -84,6 +84,8 @@ TEST_F(Disasters, TheDatabaseIsMalformedAndThereIsNoCopy) {
   EXPECT_THAT(run({"client", "list"}).out, HasSubstr("first0"));
   contentOf();
   expectNextProgramReady();
+  EXPECT_THAT(backUp(), ExitsWith(cli::kOk));
+  EXPECT_THAT(restore(), ExitsWith(cli::kOk));
 }
 
 TEST_F(Disasters, TheDatabaseIsGone) {

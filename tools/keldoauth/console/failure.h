@@ -22,7 +22,7 @@ enum ExitCode : int {
   kNotFound = 3,      // no such client, code or token
   kUnavailable = 4,   // the database or the cipher does not work
   kInvalid = 5,       // a token or code is unknown or expired
-  kUnhealthy = 6,     // `status` found something wrong, or `restore` another key
+  kUnhealthy = 6,     // `status`, `restore` or `backup` found something wrong
   kNotConfirmed = 7,  // a destructive command was not confirmed
   kNotWritten = 8,    // the answer could not be written to standard output
 };
