@@ -12,6 +12,7 @@
 #include <filesystem>
 
 #include "platform/keldcore.h"
+#include "tests/faults/small_medium.h"
 #include "tests/operations/operations.h"
 
 namespace operations {
@@ -260,6 +261,31 @@ TEST_F(Rekey, KeepsBothKeysWhenAValueCameInAfterTheCommit) {
   EXPECT_TRUE(fs::exists(kNextKey));
   EXPECT_THAT(rekey().out, HasSubstr("Encrypted 1 value "));
   EXPECT_THAT(clearWith(kKey), Not(Contains("")));
+}
+
+TEST_F(Rekey, NeverFollowsALinkInThePlaceOfTheWaitingKey) {
+  writeFile("/tmp/copies/precious", "precious");
+  fs::create_symlink("/tmp/copies/precious", kNextKey);
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_EQ(readFile("/tmp/copies/precious"), "precious");
+  EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(kKey)));
+  EXPECT_EQ(clearWith(kKey), clear_);
+  expectNothingLeft();
+}
+
+TEST_F(Rekey, OnAFullDiskChangesNothingAndMayBeTriedAgain) {
+  const faults::SmallMedium medium(kStateDir);
+  putBack(kStateDir, before_);
+  for (int pages = 0; pages < 6; ++pages) {
+    medium.fill(pages);
+    EXPECT_THAT(rekey(), ExitsWith(cli::kUnavailable));
+    EXPECT_EQ(clearWith(kKey), clear_);
+    EXPECT_FALSE(fs::exists(kNextKey));
+    medium.empty();
+  }
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_EQ(clearWith(kKey), clear_);
+  expectNothingLeft();
 }
 
 // Refusals --------------------------------------------------------------------------

@@ -338,6 +338,27 @@ const Stranger kStrangers[] = {
 };
 INSTANTIATE_TEST_SUITE_P(Restore, StrangerTest, testing::ValuesIn(kStrangers), support::CaseName());
 
+/// Locks do not keep away who ignores them. The copy is larger than what SQLite
+/// keeps of it in memory.
+TEST_F(Restore, OfACopyThatIsOverwrittenAfterItsCheckBringsInNothingUnchecked) {
+  execute(kCopy,
+          "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i+1 FROM n WHERE i<1000) "
+          "INSERT INTO oauth_log(timestamp, msg) SELECT i, hex(randomblob(2000)) FROM n");
+  const Content checked = contentOf(kCopy);
+  const Arguments command{"restore", "--yes", kCopy};
+  const auto state = filesIn(kStateDir);
+  const std::vector<std::string> steps = stepsOf(command);
+  putBack(kStateDir, state);
+  const auto first = std::find(steps.begin(), steps.end(), std::string("create ") + kJournal);
+  ASSERT_NE(first, steps.end());
+  const Outcome outcome = meanwhile(
+      static_cast<int>(first - steps.begin()) + 1,
+      "dd if=/dev/zero of=/tmp/copies/copy.db bs=4096 seek=1 count=900 conv=notrunc status=none",
+      command);
+  EXPECT_THAT(outcome, ExitsWith(cli::kOk));
+  EXPECT_EQ(contentOf(), checked);
+}
+
 TEST_F(Restore, OfACopyWithSqlitesOwnStatistics) {
   execute(kCopy, "ANALYZE");
   EXPECT_THAT(restore(), ExitsWith(cli::kOk));

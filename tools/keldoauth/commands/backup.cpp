@@ -149,16 +149,24 @@ void requireNoStranger(DatabaseFile& copy, const std::string& path) {
                 "it would work on in the store; a copy of the file without it can be restored");
 }
 
+/// What is checked is what is restored: a file may change meanwhile, whatever
+/// locks are on it.
+void readInto(DatabaseFile& copy, const std::string& path) {
+  DatabaseFile file(path, DatabaseFile::Use::kRead);
+  file.requireStore();
+  file.copyTo(copy);
+  copy.requireStore();
+  requireNoStranger(copy, path);
+}
+
 Answer restore(const Arguments& arguments) {
   const std::string& path = *arguments.file;
   requireReadableFile(path);
   if (isSameFile(path, names::kDatabaseFile)) {
     throw Failure(kRefused, path + " is the database itself");
   }
-  DatabaseFile copy(path, DatabaseFile::Use::kRead);
-  copy.holdStill();
-  copy.requireStore();
-  requireNoStranger(copy, path);
+  DatabaseFile copy(path, DatabaseFile::Use::kMemory);
+  readInto(copy, path);
   confirm(arguments, "Replace everything in the store by " + printable(path) + "?");
 
   const MaintenanceLock lock;

@@ -120,7 +120,8 @@ void DatabaseFile::CloseConnection::operator()(sqlite3* db) const {
 }
 
 DatabaseFile::DatabaseFile(const std::string& path, Use use) : path_(path), use_(use) {
-  open(path, use == Use::kRead ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE, nullptr);
+  open(use == Use::kMemory ? ":memory:" : path,
+       use == Use::kRead ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE, nullptr);
   if (use == Use::kWrite) execute("PRAGMA synchronous=EXTRA");
 }
 
@@ -135,10 +136,6 @@ void DatabaseFile::open(const std::string& name, int flags, const char* vfs) {
   db_.reset(raw);  // a failed open may hand out a handle, too
   if (result != SQLITE_OK) throw failure();
   sqlite3_busy_handler(raw, waitForLock, nullptr);
-}
-
-void DatabaseFile::holdStill() {
-  execute("BEGIN");
 }
 
 void DatabaseFile::requireStore() {
@@ -167,7 +164,7 @@ void DatabaseFile::copyTo(DatabaseFile& target) {
 }
 
 std::string DatabaseFile::stranger() {
-  DatabaseFile model(":memory:", Use::kWrite);
+  DatabaseFile model("an empty store", Use::kMemory);
   model.execute(schema::kCreateMeta);
   for (const schema::Step& step : schema::kSteps) model.execute(step.statement);
   const std::map<std::string, std::string> own = model.schemaEntries();

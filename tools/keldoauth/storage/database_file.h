@@ -21,8 +21,9 @@ class DatabaseFile {
  public:
   /// kRead never writes, so that it refuses a file that a crash left in need of
   /// a roll-back. What kWrite commits is on the disk, its journal's removal
-  /// included, when the call returns.
-  enum class Use { kRead, kWrite };
+  /// included, when the call returns. kMemory is no file: empty at first, private,
+  /// gone with the object, and `path` only names it in messages.
+  enum class Use { kRead, kWrite, kMemory };
 
   /// Opens an existing file; statements wait up to 30 seconds for locks.
   /// Throws Failure.
@@ -32,9 +33,6 @@ class DatabaseFile {
   explicit DatabaseFile(const Draft& draft);
   DatabaseFile(const DatabaseFile&) = delete;
   DatabaseFile& operator=(const DatabaseFile&) = delete;
-
-  /// From here to the end all is read as of one moment. Throws.
-  void holdStill();
 
   /// Throws kRefused unless SQLite finds the file whole and every table of the
   /// store is in it with its columns.
