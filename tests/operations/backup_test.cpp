@@ -321,6 +321,7 @@ TEST_F(Backup, OfADamagedStoreIsNotKept) {
   const Outcome outcome = backUp();
   EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
   EXPECT_THAT(outcome.err, HasSubstr("the database is no whole store: "));
+  EXPECT_THAT(outcome.err, HasSubstr("malformed"));
   EXPECT_THAT(filesIn(kCopies), IsEmpty());
 }
 

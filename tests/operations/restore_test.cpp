@@ -276,7 +276,7 @@ constexpr char kAdvice[] = "\nhint: 'keldoauth backup' makes copies that are who
 
 TEST_F(Restore, OfWhatIsNoDatabase) {
   writeFile("/tmp/copies/text", std::string(10000, 'x'));
-  expectRefused("/tmp/copies/text", std::string("/tmp/copies/text is no database") + kAdvice);
+  expectRefused("/tmp/copies/text", std::string("/tmp/copies/text is not a database") + kAdvice);
 }
 
 TEST_F(Restore, OfAnEmptyFile) {
@@ -372,7 +372,7 @@ TEST_F(Restore, OfADamagedPage) {
   const auto state = filesIn(kStateDir);
   const Outcome outcome = restore();
   EXPECT_THAT(outcome, ExitsWith(cli::kRefused));
-  EXPECT_THAT(outcome.err, HasSubstr("/tmp/copies/copy.db is damaged\n"));
+  EXPECT_THAT(outcome.err, HasSubstr("/tmp/copies/copy.db is malformed\n"));
   EXPECT_EQ(filesIn(kStateDir), state);
 }
 
@@ -380,7 +380,7 @@ TEST_F(Restore, OfACopyThatWasCutOff) {
   fs::resize_file(kCopy, 4096 * 2);
   const Outcome outcome = restore();
   EXPECT_THAT(outcome, ExitsWith(cli::kRefused));
-  EXPECT_THAT(outcome.err, HasSubstr("/tmp/copies/copy.db is damaged\n"));
+  EXPECT_THAT(outcome.err, HasSubstr("/tmp/copies/copy.db is malformed\n"));
   EXPECT_EQ(contentOf(), now_);
 }
 

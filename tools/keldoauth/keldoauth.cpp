@@ -120,7 +120,7 @@ ExitCode run(const std::string& name, const Invocation& invocation) {
     }
     return answer.exit;
   } catch (const Failure& failure) {
-    return report(name, withCause(failure), asJson);
+    return report(name, failure, asJson);
   } catch (const std::exception& error) {
     return report(name, Failure(kUnavailable, error.what()), asJson);
   }

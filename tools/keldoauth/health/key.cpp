@@ -10,10 +10,8 @@
 #include "core/oauth_errors.h"
 #include "tools/keldoauth/console/clock.h"
 #include "tools/keldoauth/console/output.h"
-#include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/health/health.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
-#include "tools/keldoauth/storage/presence.h"
 #include "tools/keldoauth/storage/stores.h"
 #include "utils/oauth_names.h"
 
@@ -53,15 +51,11 @@ bool holdsEncrypted(const Json::Value& tables) {
   return false;
 }
 
-/// Reading decrypts; what cannot be decrypted comes back as it is in the file.
 void checkClients(Problems& problems) try {
-  constexpr std::size_t kIdentifierBytes = 64;
   Clients clients;
   Json::ArrayIndex unreadable = 0;
   for (const Json::Value& row : allRows(clients)) {
-    if (withoutDoubledQuotes(row[names::kClientId].asString()).size() != kIdentifierBytes) {
-      ++unreadable;
-    }
+    if (!isDecrypted(row[names::kClientId].asString())) ++unreadable;
   }
   if (unreadable == 0) return;
   problems.add(names::kClientInfoTable, counted(unreadable, "identifier") + " cannot be decrypted",
@@ -93,11 +87,11 @@ void inspectKeyFiles(Problems& problems) {
 
 void inspectCipher(const Json::Value& tables, Problems& problems) {
   const bool works = canEncrypt();
-  if (works || !missingKey()) {
+  if (works || absenceOfKey().empty()) {
     if (!works) reportUselessCipher(problems);
     checkClients(problems);
   } else if (holdsEncrypted(tables)) {
-    problems.add("key", *missingKey() + " is missing",
+    problems.add("key", keyFiles().current + " is missing",
                  "what is encrypted cannot be read without it; put it back");
   }
 }

@@ -103,9 +103,9 @@ int waitForLock(void* /*unused*/, int waits) {
 const char* faultOfCopy(int extendedCode) {
   switch (extendedCode) {
     case SQLITE_NOTADB:
-      return " is no database";
+      return " is not a database";
     case SQLITE_CORRUPT:
-      return " is damaged";
+      return " is malformed";
     case SQLITE_READONLY_ROLLBACK:
       return " is not complete without the journal beside it";
     default:
@@ -140,7 +140,7 @@ void DatabaseFile::open(const std::string& name, int flags, const char* vfs) {
 
 void DatabaseFile::requireStore() {
   if (text("PRAGMA integrity_check(1)") != "ok") {
-    throw Failure(kRefused, path_ + " is damaged");
+    throw Failure(kRefused, path_ + " is malformed");
   }
   for (const Table& table : kTables) {
     const std::string sql = std::string("SELECT ") + table.columns + " FROM " + table.name;

@@ -6,9 +6,10 @@
 #include <cerrno>
 #include <filesystem>
 #include <memory>
+#include <string>
 
-#include "core/oauth_errors.h"
-#include "tools/keldoauth/storage/encrypted_values.h"
+#include "tools/keldoauth/console/failure.h"
+#include "tools/keldoauth/storage/key_files.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
@@ -43,16 +44,6 @@ bool lacksTables() {
   return sqlite3_exec(raw, sql.c_str(), noteRow, &isFound, nullptr) == SQLITE_OK && !isFound;
 }
 
-bool isAbsent(const std::string& path) {
-  struct stat status {};
-  return lstat(path.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR);
-}
-
-std::optional<std::string>& keyFoundMissing() {
-  static std::optional<std::string> path;
-  return path;
-}
-
 }  // namespace
 
 Presence databasePresence() {
@@ -77,20 +68,8 @@ void requireDatabase() {
 }
 
 void makeNoKey() {
-  const std::string path = keyFiles().current;
-  if (!isAbsent(path)) return;
-  keyFoundMissing() = path;
-  useKey(path + "/");  // below a file that is not there nothing can be made
-}
-
-std::optional<std::string> missingKey() {
-  return keyFoundMissing();
-}
-
-Failure withCause(const Failure& failure) {
-  if (failure.code != errors::kEncryptFailed.code || !missingKey()) return failure;
-  return {failure.exit, failure.what(), "the key file " + *missingKey() + " is missing",
-          failure.code};
+  if (absenceOfKey().empty()) return;
+  useKey(keyFiles().current + "/");  // below a file that is not there nothing can be made
 }
 
 }  // namespace tool

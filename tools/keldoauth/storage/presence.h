@@ -6,11 +6,6 @@
 #ifndef KELDOAUTH_TOOLS_PRESENCE_H
 #define KELDOAUTH_TOOLS_PRESENCE_H
 
-#include <optional>
-#include <string>
-
-#include "tools/keldoauth/console/failure.h"
-
 namespace tool {
 
 enum class Presence {
@@ -29,14 +24,6 @@ void requireDatabase();
 /// From now on the stand-in cipher of this process makes no key: without one it
 /// fails.
 void makeNoKey();
-
-/// The path of the stand-in cipher's key when makeNoKey() found none there. The
-/// appliance's own cipher works without.
-std::optional<std::string> missingKey();
-
-/// `failure` as it is, with a missing key named as its cause if it is one of
-/// the cipher.
-Failure withCause(const Failure& failure);
 
 }  // namespace tool
 
