@@ -152,8 +152,6 @@ void PrintTo(const DefaultAcl& acl, std::ostream* out) {
   *out << acl.name;
 }
 
-constexpr __u32 kNobody = 65534;
-
 class DefaultAclTest : public CreationTest, public ::testing::WithParamInterface<DefaultAcl> {
  protected:
   void SetUp() override {
@@ -163,7 +161,7 @@ class DefaultAclTest : public CreationTest, public ::testing::WithParamInterface
       std::array<posix_acl_xattr_entry, 5> entries;
     } acl{{POSIX_ACL_XATTR_VERSION},
           {{{1, GetParam().owner, ~0U},  // ACL_USER_OBJ and so on, in their order
-            {2, 7, kNobody},
+            {2, 7, geteuid()},           // one that a namespace of one user knows, too
             {4, GetParam().others, ~0U},
             {16, 7, ~0U},
             {32, GetParam().others, ~0U}}}};
