@@ -182,7 +182,7 @@ TEST_F(SettingsTest, FifoIsAbsentAndNotWaitedFor) {
 
 TEST_F(SettingsTest, FifoThatStaysOpenIsAbsentAndNotWaitedFor) {
   ASSERT_EQ(mkfifo(kSettings, 0600), 0);
-  const int descriptor = open(kSettings, O_RDWR);
+  const int descriptor = open(kSettings, O_RDWR | O_NONBLOCK);
   const std::string text = R"({"token_max": 500})";
   ASSERT_EQ(write(descriptor, text.data(), text.size()), static_cast<ssize_t>(text.size()));
   EXPECT_EQ(tokenMax(), kDefaultRows);
