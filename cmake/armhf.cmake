@@ -1,5 +1,5 @@
-# Cross-building for the target: 32-bit ARM, hard-float, 64-bit time and file
-# offsets, against the sysroot that scripts/armhf-sysroot makes.
+# Cross-building for the target: 32-bit ARM, hard-float, against the
+# sysroot that scripts/armhf-sysroot makes.
 set(CMAKE_SYSTEM_NAME Linux)
 set(CMAKE_SYSTEM_PROCESSOR armv7l)
 set(CMAKE_LIBRARY_ARCHITECTURE arm-linux-gnueabihf)
@@ -21,8 +21,8 @@ set(ENV{PKG_CONFIG_LIBDIR}
   ${CMAKE_SYSROOT}/usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}/pkgconfig:${CMAKE_SYSROOT}/usr/share/pkgconfig)
 set(ENV{PKG_CONFIG_SYSROOT_DIR} ${CMAKE_SYSROOT})
 
-set(CMAKE_C_FLAGS_INIT "-D_FILE_OFFSET_BITS=64 -D_TIME_BITS=64 -Wno-psabi")
-set(CMAKE_CXX_FLAGS_INIT "-D_FILE_OFFSET_BITS=64 -D_TIME_BITS=64 -Wno-psabi")
+set(CMAKE_C_FLAGS_INIT "-Wno-psabi")
+set(CMAKE_CXX_FLAGS_INIT "-Wno-psabi")
 
 # One word, so that tests can hand it on.
 get_filename_component(CMAKE_CROSSCOMPILING_EMULATOR

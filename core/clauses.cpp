@@ -5,6 +5,7 @@
 #include "core/log_lines.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {

@@ -9,6 +9,7 @@
 
 #include "core/privilege.h"
 #include "utils/oauth_names.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {

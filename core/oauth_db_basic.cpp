@@ -21,6 +21,7 @@
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
 #include "utils/sql_text.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {

@@ -8,6 +8,8 @@
 #include <cstring>
 
 #include "core/log_lines.h"
+#include "utils/error_text.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {
@@ -24,7 +26,7 @@ using SetIds = int (*)(id_t, id_t, id_t);
 bool switchEffective(const char* source, const char* name, SetIds set, id_t id) {
   if (set(kUnchanged, id, kUnchanged) != 0) {
     std::array<char, 1024> text{};
-    const char* reason = strerror_r(errno, text.data(), text.size());
+    const char* reason = errorText(strerror_r(errno, text.data(), text.size()), text.data());
     syslog(kFailurePriority, "%s:%d ERROR: set%s(%d, %d, %d) [%s]", source, line::kSetIdsFailed,
            name, -1, static_cast<int>(id), -1, reason);
     return false;

@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "utils/oauth_names.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {

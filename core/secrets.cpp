@@ -9,6 +9,7 @@
 #include "platform/keldcore.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {

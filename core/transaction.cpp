@@ -2,6 +2,8 @@
 
 #include <string>
 
+#include "utils/wide_time.h"
+
 namespace KELDOAUTHSERVER {
 
 Transaction::Transaction(OAUTHDBBasic& store) : store_(store) {}

@@ -8,6 +8,7 @@
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 #include "utils/sql_text.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {

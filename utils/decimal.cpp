@@ -2,6 +2,8 @@
 
 #include <cstdlib>
 
+#include "utils/wide_time.h"
+
 namespace KELDOAUTHSERVER {
 
 long long decimalValue(const Json::Value& value) {

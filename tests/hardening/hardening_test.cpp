@@ -4,10 +4,12 @@
 #include <gtest/gtest.h>
 #include <json/reader.h>
 
+#include <array>
 #include <cctype>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -36,6 +38,9 @@ std::vector<BuiltFile> builtFiles() {
   for (const char* path : {HARDENING_PROGRAMS}) files.push_back({Kind::kProgram, path});
   return files;
 }
+
+/// libkeldoauth is the first of them.
+const char* const kLibrary = std::array{HARDENING_LIBRARIES}[0];
 
 class HardeningTest : public ::testing::TestWithParam<BuiltFile> {
  protected:
@@ -124,6 +129,49 @@ TEST(StackProtectorTest, GuardsTheBuffersOfLibraryCipherAndTool) {
   for (const char* path : {HARDENING_WITH_BUFFERS}) {
     EXPECT_TRUE(ElfFile(path).imports("__stack_chk_fail")) << path;
   }
+}
+
+// Time ----------------------------------------------------------------------------
+
+/// Whatever toolchain file the build uses.
+TEST(WideTimeTest, EverySourceIsCompiledForTimeAndFilesOf64Bits) {
+  std::ifstream file(HARDENING_COMPILE_COMMANDS);
+  Json::Value commands;
+  file >> commands;
+  for (const Json::Value& command : commands) {
+    const std::string line = command["command"].asString();
+    EXPECT_THAT(line, HasSubstr(" -D_TIME_BITS=64"));
+    EXPECT_THAT(line, HasSubstr(" -D_FILE_OFFSET_BITS=64"));
+  }
+  EXPECT_GT(commands.size(), 20U);
+}
+
+/// What a 32-bit C library keeps for programs with a short time.
+TEST(WideTimeTest, LibraryCallsNothingWithATimeOf32Bits) {
+  if (sizeof(long) > 4) GTEST_SKIP() << "no such functions here";
+  const ElfFile library(kLibrary);
+  for (const char* name : {"time", "stat", "lstat", "fstat", "stat64", "lstat64", "fstat64",
+                           "clock_gettime", "nanosleep", "open", "mknod64"}) {
+    EXPECT_FALSE(library.imports(name)) << name;
+  }
+  for (const char* name :
+       {"__time64", "__stat64_time64", "__fstat64_time64", "__clock_gettime64"}) {
+    EXPECT_TRUE(library.imports(name)) << name;
+  }
+}
+
+TEST(WideTimeTest, EverySourceOfTheLibraryRefusesAShortTime) {
+  for (const char* path : {HARDENING_SOURCES}) {
+    std::ifstream file(path);
+    const std::string text{std::istreambuf_iterator<char>(file), {}};
+    EXPECT_THAT(text, HasSubstr("\n#include \"utils/wide_time.h\"\n")) << path;
+  }
+}
+
+// Unloading -----------------------------------------------------------------------
+
+TEST(UnloadingTest, LibraryAsksToStayLoaded) {
+  EXPECT_NE(ElfFile(kLibrary).number(DT_FLAGS_1) & DF_1_NODELETE, 0U);
 }
 
 // Installed files -----------------------------------------------------------------

@@ -252,9 +252,9 @@ INSTANTIATE_TEST_SUITE_P(
 
 // Clocks ----------------------------------------------------------------------------
 
-/// Where time_t has 32 bits, the clock itself ends in 2038.
-constexpr long long kLateClock = sizeof(time_t) > 4 ? 4294967296LL + 1000 : 2147483647LL;
-constexpr long long kVeryLateClock = sizeof(time_t) > 4 ? 253402300799LL : 2147483646LL;
+constexpr long long kLastOf32Bits = 2147483647;
+constexpr long long kIn2106 = 4294967296 + 1000;
+constexpr long long kEndOf9999 = 253402300799;
 
 class LateClockTest : public VerifyTest, public ::testing::WithParamInterface<long long> {};
 
@@ -283,6 +283,6 @@ TEST_P(LateClockTest, RevokedCodeExpiresNow) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Clocks, LateClockTest,
-                         ::testing::Values(2147483647LL, kLateClock, kVeryLateClock));
+                         ::testing::Values(kLastOf32Bits, kIn2106, kEndOf9999));
 
 }  // namespace
