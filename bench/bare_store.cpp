@@ -48,9 +48,10 @@ const std::string& clientIdCipher() {
   return cipher;
 }
 
-BareStore::BareStore() {
+BareStore::BareStore(Sync sync) : sync_(sync) {
   require(sqlite3_open(names::kDatabaseFile, &db_), db_, "open");
   sqlite3_busy_timeout(db_, 5000);
+  if (sync == Sync::kExtra) run(schema::kSyncFolderToo);
   select("SELECT * FROM sqlite_master WHERE name='oauth_meta' and type='table';");
   for (const schema::Step& step : schema::kSteps) run(step.statement);
 }
@@ -68,7 +69,7 @@ void BareStore::select(const std::string& sql) {
 }
 
 void BareStore::registerClient(long long serial) {
-  BareStore log;
+  BareStore log(sync_);
   select("SELECT COUNT(*) FROM oauth_clientInfo;");
   run("INSERT INTO oauth_clientInfo (client_id, client_secret, display_name, enable, id, "
       "redirect_uri, scope) VALUES('" +

@@ -10,6 +10,7 @@
 #include <filesystem>
 #include <fstream>
 #include <string>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -108,16 +109,15 @@ void coldVerify(benchmark::State& state, const char* program) {
   state.counters["peak_kib"] = peakKibibytes(command);
 }
 
-void eightWriters(benchmark::State& state, const char* program) {
+void eightWriters(benchmark::State& state, const char* program, const char* verb) {
   install({});
-  measure(state, 8, Command(program, "issue", "100"));
+  measure(state, 8, Command(program, verb, "100"));
 }
 
-using Body = void (*)(benchmark::State&, const char*);
-
+template <typename Body, typename... Arguments>
 benchmark::internal::Benchmark* add(const std::string& name, const char* side, Body body,
-                                    const char* program) {
-  return benchmark::RegisterBenchmark((name + "/" + side).c_str(), body, program)
+                                    Arguments... arguments) {
+  return benchmark::RegisterBenchmark((name + "/" + side).c_str(), body, arguments...)
       ->Unit(benchmark::kMicrosecond)
       ->UseManualTime();
 }
@@ -131,9 +131,11 @@ int main(int argc, char** argv) {
         std::pair{"links only", "process_links"}}) {
     bench::add("B9 cold verification", side, bench::coldVerify, program)->Iterations(25);
   }
-  for (const auto& [side, program] :
-       {std::pair{"library", "process_library"}, std::pair{"bare", "process_bare"}}) {
-    bench::add("B10 eight writers of 100 tokens", side, bench::eightWriters, program)
+  for (const auto& [side, program, verb] :
+       {std::tuple{"library", "process_library", "issue"},
+        std::tuple{"bare", "process_bare", "issue"},
+        std::tuple{"bare at FULL", "process_bare", "issue-full"}}) {
+    bench::add("B10 eight writers of 100 tokens", side, bench::eightWriters, program, verb)
         ->Iterations(1)
         ->Repetitions(20);
   }

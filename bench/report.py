@@ -57,7 +57,7 @@ def load(path):
         if run["run_type"] != "iteration":
             continue
         name = re.sub(r"/(iterations:\d+|real_time|manual_time|repeats:\d+)", "", run["run_name"])
-        match = re.match(r"(.*?)/(library|bare|links only)(/\d+)?$", name)
+        match = re.match(r"(.*?)/(library|bare at FULL|bare|links only)(/\d+)?$", name)
         key = match[1] + (match[3] or "")
         if run.get("error_occurred"):
             failures.append(f"{key} ({match[2]}): {run['error_message']}")
@@ -68,8 +68,8 @@ def load(path):
     return times, peaks, failures
 
 
-def ratio_of(times, name):
-    ours, theirs = times[(name, "library")], times[(name, "bare")]
+def ratio_of(times, name, side="bare"):
+    ours, theirs = times[(name, "library")], times[(name, side)]
     rounds = sorted(a / b for a, b in zip(ours, theirs))
     return statistics.median(ours) / statistics.median(theirs), rounds[0], rounds[-1]
 
@@ -93,7 +93,15 @@ def rows(times, medium):
         theirs = statistics.median(times[(name, "bare")])
         mark = MARKS.get((name, medium))
         yield (f"| {name} | {medium} | {duration(ours)} | {duration(theirs)} | "
-               f"{ratio:.2f} ({low:.2f}–{high:.2f}) | {verdict(ratio, mark)} |")
+               f"{ratio:.2f} ({low:.2f}–{high:.2f}) | {verdict(ratio, mark)} | {at_full(times, name)} |")
+
+
+def at_full(times, name):
+    """The baseline that syncs what SQLite syncs by default, where there is one."""
+    side = "bare at FULL"
+    if (name, side) not in times:
+        return "–"
+    return f"{duration(statistics.median(times[(name, side)]))}, {ratio_of(times, name, side)[0]:.2f}"
 
 
 def sort_key(name):
@@ -107,7 +115,7 @@ def growth_lines(times, medium):
         grown = [statistics.median(times[(f"{name}/{large}", side)]) /
                  statistics.median(times[(f"{name}/{small}", side)]) for side in ("library", "bare")]
         yield (f"| {name}: {large} rows against {small} | {medium} | {grown[0]:.2f} × | "
-               f"{grown[1]:.2f} × | | {verdict(grown[0], mark)} |")
+               f"{grown[1]:.2f} × | | {verdict(grown[0], mark)} | |")
 
 
 def write_growth(path, media):
@@ -125,8 +133,9 @@ def write_growth(path, media):
 
 def main():
     folder = pathlib.Path(sys.argv[1])
-    print("| Work | Medium | Library | Baseline | Ratio (lowest–highest round) | Mark |")
-    print("|---|---|---|---|---|---|")
+    print("| Work | Medium | Library | Baseline | Ratio (lowest–highest round) | Mark | "
+          "Baseline at FULL, ratio |")
+    print("|---|---|---|---|---|---|---|")
     media, notes = {}, []
     for medium in ("disk", "tmpfs"):
         for kind in ("stores", "process"):

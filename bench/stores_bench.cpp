@@ -1,6 +1,7 @@
 // The library beside bare SQLite, operation by operation. Every measurement
-// has a twin under the same name with "/bare"; scripts/bench runs both in the
-// same process, interleaved, and gives their ratio.
+// has a twin under the same name with "/bare", and where it writes a second one
+// with "/bare at FULL"; scripts/bench runs all in the same process, interleaved,
+// and gives their ratios.
 
 #include <benchmark/benchmark.h>
 #include <json/value.h>
@@ -47,9 +48,9 @@ void registerLibrary(benchmark::State& state) {
   }
 }
 
-void registerBare(benchmark::State& state) {
+void registerBare(benchmark::State& state, Sync sync) {
   install({});
-  BareStore store;
+  BareStore store(sync);
   for (auto _ : state) store.registerClient(nextSerial());
 }
 
@@ -66,9 +67,9 @@ void issueLibrary(benchmark::State& state) {
   }
 }
 
-void issueBare(benchmark::State& state) {
+void issueBare(benchmark::State& state, Sync sync) {
   install({static_cast<int>(state.range(0)), 0, 0});
-  BareStore store;
+  BareStore store(sync);
   for (auto _ : state) store.issueToken(nextSerial());
 }
 
@@ -112,13 +113,14 @@ void refreshBare(benchmark::State& state) {
 // B5 ------------------------------------------------------------------------
 
 /// One purge per iteration: the rows are put back outside the measurement.
-template <typename Store>
-void purge(benchmark::State& state, const std::function<bool(Store&)>& work) {
+template <typename Store, typename... Arguments>
+void purge(benchmark::State& state, const std::function<bool(Store&)>& work,
+           Arguments... arguments) {
   const int rows = static_cast<int>(state.range(0));
   for (auto _ : state) {
     state.PauseTiming();
     install({rows, rows / 2, 0});
-    Store store = Store();
+    Store store(arguments...);
     state.ResumeTiming();
     require(state, work(store));
   }
@@ -132,21 +134,23 @@ void purgeLibrary(benchmark::State& state) {
   purge<TokenStore>(state, [](TokenStore& store) { return store.Purge(); });
 }
 
-void purgeBare(benchmark::State& state) {
-  purge<BareStore>(state, [](BareStore& store) {
+void purgeBare(benchmark::State& state, Sync sync) {
+  const auto work = [](BareStore& store) {
     store.run("DELETE FROM oauth_token WHERE CAST(expired_time AS INTEGER) < 2000;");
     return true;
-  });
+  };
+  purge<BareStore>(state, work, sync);
 }
 
-void purgeRowByRow(benchmark::State& state) {
+void purgeRowByRow(benchmark::State& state, Sync sync) {
   const long long expired = state.range(0) / 2;
-  purge<BareStore>(state, [expired](BareStore& store) {
+  const auto work = [expired](BareStore& store) {
     for (long long id = 1; id <= expired; ++id) {
       store.run("DELETE FROM oauth_token WHERE id='" + std::to_string(id) + "';");
     }
     return true;
-  });
+  };
+  purge<BareStore>(state, work, sync);
 }
 
 // B6 ------------------------------------------------------------------------
@@ -158,10 +162,10 @@ void auditLibrary(benchmark::State& state) {
   for (auto _ : state) require(state, log.Add("Token revoked[alice]") != 0);
 }
 
-void auditBare(benchmark::State& state) {
+void auditBare(benchmark::State& state, Sync sync) {
   const int rows = static_cast<int>(state.range(0));
   install({0, 0, rows}, rows);
-  BareStore store;
+  BareStore store(sync);
   for (auto _ : state) store.writeAuditEntry("Token revoked[alice]", rows);
 }
 
@@ -197,37 +201,53 @@ void constructLibrary(benchmark::State& state) {
   for (auto _ : state) OAUTHDBToken tokens(names::kTokenTable);
 }
 
-void constructBare(benchmark::State& state) {
+void constructBare(benchmark::State& state, Sync sync) {
   install({1000, 0, 0});
-  for (auto _ : state) BareStore store;
+  for (auto _ : state) BareStore store(sync);
 }
 
 // ---------------------------------------------------------------------------
 
 using Body = void (*)(benchmark::State&);
+using SyncedBody = void (*)(benchmark::State&, Sync);
 
-void add(const std::string& name, Body library, Body bare, int iterations,
-         std::initializer_list<int> sizes) {
-  for (const auto& [suffix, body] : {std::pair{"/library", library}, std::pair{"/bare", bare}}) {
-    auto* entry = benchmark::RegisterBenchmark((name + suffix).c_str(), body);
-    entry->Unit(benchmark::kMicrosecond)->UseRealTime();
-    if (iterations > 0) entry->Iterations(iterations);
-    for (const int size : sizes) entry->Arg(size);
-  }
+/// How often a measurement runs, 0 for as often as it takes, and for which rows.
+struct Runs {
+  int iterations;
+  std::initializer_list<int> sizes;
+};
+
+void add(const std::string& name, const Runs& runs,
+         const std::function<void(benchmark::State&)>& body) {
+  auto* entry = benchmark::RegisterBenchmark(name.c_str(), body);
+  entry->Unit(benchmark::kMicrosecond)->UseRealTime();
+  if (runs.iterations > 0) entry->Iterations(runs.iterations);
+  for (const int size : runs.sizes) entry->Arg(size);
+}
+
+void add(const std::string& name, Body library, Body bare, const Runs& runs) {
+  add(name + "/library", runs, library);
+  add(name + "/bare", runs, bare);
+}
+
+void add(const std::string& name, Body library, SyncedBody bare, const Runs& runs) {
+  add(name + "/library", runs, library);
+  add(name + "/bare", runs, [bare](benchmark::State& state) { bare(state, Sync::kExtra); });
+  add(name + "/bare at FULL", runs, [bare](benchmark::State& state) { bare(state, Sync::kFull); });
 }
 
 /// Writing operations run a fixed number of times, so that the tables stay near
 /// the size that their names say.
 const bool registered = [] {
-  add("B1 register a client", registerLibrary, registerBare, 50, {});
-  add("B2 issue a token pair", issueLibrary, issueBare, 50, {10, 100, 900, 9900});
-  add("B3 verify an access token", verifyLibrary, verifyBare, 0, {10, 100, 1000, 10000});
-  add("B4 look up a refresh token", refreshLibrary, refreshBare, 0, {10, 100, 1000, 10000});
-  add("B5 purge half of the rows", purgeLibrary, purgeBare, 3, {20, 200, 2000, 10000});
-  add("B5 purge, beside row by row", purgeLibrary, purgeRowByRow, 1, {2000});
-  add("B6 audit entry with rotation", auditLibrary, auditBare, 50, {1000, 10000});
-  add("B7 getRandomStr(64)", randomLibrary, randomBare, 0, {});
-  add("B8 construct and destroy", constructLibrary, constructBare, 0, {});
+  add("B1 register a client", registerLibrary, registerBare, {50, {}});
+  add("B2 issue a token pair", issueLibrary, issueBare, {50, {10, 100, 900, 9900}});
+  add("B3 verify an access token", verifyLibrary, verifyBare, {0, {10, 100, 1000, 10000}});
+  add("B4 look up a refresh token", refreshLibrary, refreshBare, {0, {10, 100, 1000, 10000}});
+  add("B5 purge half of the rows", purgeLibrary, purgeBare, {3, {20, 200, 2000, 10000}});
+  add("B5 purge, beside row by row", purgeLibrary, purgeRowByRow, {1, {2000}});
+  add("B6 audit entry with rotation", auditLibrary, auditBare, {50, {1000, 10000}});
+  add("B7 getRandomStr(64)", randomLibrary, randomBare, {0, {}});
+  add("B8 construct and destroy", constructLibrary, constructBare, {0, {}});
   return true;
 }();
 
