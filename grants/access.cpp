@@ -1,0 +1,272 @@
+#include "grants/access.h"
+
+#include <map>
+#include <utility>
+
+#include "grants/rows/checks.h"
+#include "grants/rows/digest.h"
+#include "grants/rows/notes.h"
+#include "grants/rows/quotes.h"
+#include "grants/rows/read_rows.h"
+#include "grants/rows/room_rules.h"
+#include "grants/rows/store.h"
+#include "utils/oauth_names.h"
+
+namespace KELDOAUTHSERVER::grants {
+namespace {
+
+using rows::CodeRow;
+using rows::TokenRow;
+
+/// So many subjects of one operation get entries of their own in the log.
+constexpr std::size_t kMostSubjects = 16;
+
+// Entries -----------------------------------------------------------------------
+
+/// What a row is known by: of a login its family, which refreshing keeps.
+std::string markOf(const CodeRow& code) {
+  return rows::hexDigest(code.storedCode);
+}
+
+std::string markOf(const TokenRow& token) {
+  const bool hasFamily = token.isOurs() && !token.state->family.empty();
+  return rows::hexDigest(hasFamily ? token.state->family : token.storedAccess);
+}
+
+using Names = std::map<std::string, ApplicationName>;
+
+Names namesIn(Store& store) {
+  Names names;
+  for (const Json::Value& row : Store::rowsWhere(store.applications, "")) {
+    Application application = rows::applicationOf(row).shown;
+    names.emplace(application.identifier.text(), std::move(application.name));
+  }
+  return names;
+}
+
+std::optional<ApplicationName> nameOf(const Names& names, const std::string& application) {
+  const auto found = names.find(application);
+  return found == names.end() ? std::nullopt : std::optional<ApplicationName>(found->second);
+}
+
+bool isLive(const CodeRow& code, long long now) {
+  return code.expires > now && !code.isSpent();
+}
+
+bool isLive(const TokenRow& token, const Policy& policy, long long now) {
+  return token.ends(policy) >= now || token.expires >= now;
+}
+
+AccessEntry entryOf(const CodeRow& code, const Names& names, long long now) {
+  const bool isOurs = code.isOurs();
+  return {{AccessHandle::Table::kCodes, code.row, markOf(code)},
+          code.isSpent() ? AccessEntry::Kind::kSpent : AccessEntry::Kind::kCode,
+          User(code.user),
+          ApplicationId(code.application),
+          nameOf(names, code.application),
+          Scope(code.scope),
+          isOurs ? code.state->issued : 0,
+          isOurs ? code.state->issued : 0,
+          code.expires,
+          code.expires,
+          PeerAddress(code.from),
+          "",
+          CallerText(isOurs ? code.state->text : rows::undoubled(code.storedState)),
+          code.expires <= now,
+          !isOurs};
+}
+
+AccessEntry entryOf(const TokenRow& token, const Names& names, const Policy& policy,
+                    long long now) {
+  const bool isOurs = token.isOurs();
+  return {{AccessHandle::Table::kTokens, token.row, markOf(token)},
+          token.isOwn() ? AccessEntry::Kind::kOwn : AccessEntry::Kind::kLogin,
+          token.isOwn() ? std::optional<User>() : User(token.user),
+          ApplicationId(token.application),
+          nameOf(names, token.application),
+          Scope(token.loginScope()),
+          isOurs ? token.state->login : 0,
+          isOurs ? token.state->issued : 0,
+          token.expires,
+          token.ends(policy),
+          PeerAddress(token.from),
+          token.flow,
+          CallerText(isOurs ? token.state->text : rows::undoubled(token.storedState)),
+          !isLive(token, policy, now),
+          !isOurs};
+}
+
+// Conditions of SQL ---------------------------------------------------------------
+
+struct Conditions {
+  std::string codes;
+  std::string tokens;
+};
+
+constexpr char kEveryRow[] = "1";
+
+std::string isIts(const ApplicationId& application) {
+  return std::string(names::kClientId) + "=" + rows::literal(Store::sealed(application.text()));
+}
+
+Conditions conditionsOf(const std::optional<User>& user,
+                        const std::optional<ApplicationId>& application) {
+  Conditions conditions{kEveryRow, kEveryRow};
+  if (application) {
+    conditions.codes += " AND " + isIts(*application);
+    conditions.tokens += " AND " + isIts(*application);
+  }
+  if (user) {
+    const std::string isTheirs =
+        " AND " + rows::isOneOf(names::kUsername, rows::spellings(user->text()));
+    conditions.codes += isTheirs;
+    conditions.tokens += isTheirs + " AND NOT " + rows::isOwnToken();
+  }
+  return conditions;
+}
+
+bool canBe(const std::optional<User>& user, const std::optional<ApplicationId>& application) {
+  return (!user || !rows::hasNul(user->text())) &&
+         (!application || rows::isWithin(application->text(), bounds::kIdentifier)) &&
+         (!application || !rows::hasNul(application->text()));
+}
+
+// Ending ------------------------------------------------------------------------
+
+Ended liveOf(Store& store, const Conditions& conditions) {
+  const long long now = currentTime();
+  const std::vector<long long> live = store.numbers(
+      "SELECT (SELECT COUNT(*) FROM " + std::string(names::kGrantCodeTable) + " WHERE " +
+      conditions.codes + " AND NOT " + rows::isDeadCode(now) + " AND NOT " + rows::isSpentCode() +
+      "),(SELECT COUNT(*) FROM " + names::kTokenTable + " WHERE " + conditions.tokens +
+      " AND NOT " + rows::isDeadToken(store.policy, now) + ")");
+  return {static_cast<int>(live[0]), static_cast<int>(live[1])};
+}
+
+/// All of it in one transaction, with `entry` in the log when some of it was
+/// live.
+Ended endAll(Store& store, const Conditions& conditions, const std::string& entry) {
+  Whole whole(store);
+  const Ended ended = liveOf(store, conditions);
+  store.run("DELETE FROM " + std::string(names::kGrantCodeTable) + " WHERE " + conditions.codes);
+  store.run("DELETE FROM " + std::string(names::kTokenTable) + " WHERE " + conditions.tokens);
+  if (ended.codes + ended.tokens > 0) rows::note(store, entry);
+  whole.commit();
+  return ended;
+}
+
+std::string wordOf(Store& store, const ApplicationId& application) {
+  const auto found = rows::findApplication(store, application.text());
+  return rows::applicationWord(
+      found ? std::optional<ApplicationName>(found->shown.name) : std::nullopt, application.text());
+}
+
+/// Whose access ended, for the log: application and user.
+using Subjects = std::map<std::pair<std::string, std::optional<std::string>>, int>;
+
+void noteEach(Store& store, const Subjects& subjects, const Actor& by) {
+  std::size_t written = 0;
+  for (const auto& [subject, count] : subjects) {
+    if (++written > kMostSubjects) break;
+    rows::note(store, "Access ended" + wordOf(store, ApplicationId(subject.first)) +
+                          rows::userWord(subject.second) + rows::actorWord(by));
+  }
+  if (subjects.size() <= kMostSubjects) return;
+  rows::note(store, "Access ended of " + std::to_string(subjects.size() - kMostSubjects) + " more" +
+                        rows::actorWord(by));
+}
+
+void endCode(Store& store, const AccessHandle& handle, Ended& ended, Subjects& subjects) {
+  const auto code = rows::findCode(store, names::kId, std::to_string(handle.row));
+  if (!code || markOf(*code) != handle.mark) return;
+  rows::erase(store, *code);
+  if (!isLive(*code, currentTime())) return;
+  ++ended.codes;
+  ++subjects[{code->application, code->user}];
+}
+
+void endToken(Store& store, const AccessHandle& handle, Ended& ended, Subjects& subjects) {
+  const auto token = rows::findToken(store, names::kId, std::to_string(handle.row));
+  if (!token || markOf(*token) != handle.mark) return;
+  rows::erase(store, *token);
+  if (!isLive(*token, store.policy, currentTime())) return;
+  ++ended.tokens;
+  ++subjects[{token->application,
+              token->isOwn() ? std::nullopt : std::optional<std::string>(token->user)}];
+}
+
+}  // namespace
+
+std::vector<AccessEntry> Access::list(const AccessFilter& filter) const {
+  if (!canBe(filter.user, filter.application)) return {};
+  const long long now = currentTime();
+  const Conditions conditions = conditionsOf(filter.user, filter.application);
+  const Names names = namesIn(store_);
+  std::vector<AccessEntry> entries;
+  const auto add = [&](AccessEntry entry) {
+    if (entry.isDead && !filter.withDead) return;
+    if (entry.kind == AccessEntry::Kind::kSpent && !filter.withSpent) return;
+    entries.push_back(std::move(entry));
+  };
+  for (const Json::Value& row : Store::rowsWhere(store_.codes, conditions.codes)) {
+    add(entryOf(rows::codeOf(row), names, now));
+  }
+  for (const Json::Value& row : Store::rowsWhere(store_.tokens, conditions.tokens)) {
+    add(entryOf(rows::tokenOf(row), names, store_.policy, now));
+  }
+  return entries;
+}
+
+std::optional<AccessEntry> Access::find(const Code& code) const {
+  const auto found = rows::findShownCode(store_, code.text());
+  if (!found) return {};
+  return entryOf(*found, namesIn(store_), currentTime());
+}
+
+std::optional<AccessEntry> Access::find(const AnyToken& token) const {
+  const auto found = rows::findShownToken(store_, token.text());
+  if (!found) return {};
+  return entryOf(*found, namesIn(store_), store_.policy, currentTime());
+}
+
+Ended Access::end(const AccessHandle& handle, const Actor& by) {
+  return end(std::vector<AccessHandle>{handle}, by);
+}
+
+Ended Access::end(const std::vector<AccessHandle>& handles, const Actor& by) {
+  Whole whole(store_);
+  Ended ended{0, 0};
+  Subjects subjects;
+  for (const AccessHandle& handle : handles) {
+    const bool isCode = handle.table == AccessHandle::Table::kCodes;
+    (isCode ? endCode : endToken)(store_, handle, ended, subjects);
+  }
+  noteEach(store_, subjects, by);
+  whole.commit();
+  return ended;
+}
+
+Ended Access::endUser(const User& user, const Actor& by) {
+  if (!canBe(user, {})) return {0, 0};
+  return endAll(store_, conditionsOf(user, {}),
+                "All access ended" + rows::userWord(user.text()) + rows::actorWord(by));
+}
+
+Ended Access::endUserWith(const User& user, const ApplicationId& application, const Actor& by) {
+  if (!canBe(user, application)) return {0, 0};
+  return endAll(store_, conditionsOf(user, application),
+                "Access ended" + wordOf(store_, application) + rows::userWord(user.text()) +
+                    rows::actorWord(by));
+}
+
+Ended Access::endApplication(const ApplicationId& application, const Actor& by) {
+  if (!canBe({}, application)) return {0, 0};
+  return endAll(store_, conditionsOf({}, application),
+                "All access ended" + wordOf(store_, application) + rows::actorWord(by));
+}
+
+Ended Access::endEverything(const Actor& by) {
+  return endAll(store_, conditionsOf({}, {}), "All access ended" + rows::actorWord(by));
+}
+
+}  // namespace KELDOAUTHSERVER::grants

@@ -1,0 +1,54 @@
+#include "grants/room.h"
+
+#include <string>
+
+#include "grants/rows/room_rules.h"
+#include "grants/rows/store.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+
+namespace KELDOAUTHSERVER::grants {
+namespace {
+
+/// Rows, and how many of them meet each condition.
+std::vector<long long> countIn(Store& store, const char* table, const std::string& first,
+                               const std::string& second = "0") {
+  return store.numbers("SELECT COUNT(*),IFNULL(SUM(" + first + "),0),IFNULL(SUM(" + second +
+                       "),0) FROM " + table);
+}
+
+}  // namespace
+
+RoomCount Room::count() const {
+  const long long now = currentTime();
+  const std::string deadCode = rows::isDeadCode(now);
+  const auto applications = countIn(store_, names::kClientInfoTable, "0");
+  const auto codes = countIn(store_, names::kGrantCodeTable, deadCode,
+                             "(NOT " + deadCode + " AND " + rows::isSpentCode() + ")");
+  const auto tokens = countIn(store_, names::kTokenTable, rows::isDeadToken(store_.policy, now));
+  const auto log = countIn(store_, names::kLogTable, "0");
+  return {{applications[0], getTableRowMax(names::kClientInfoMax), 0},
+          {codes[0], getTableRowMax(names::kGrantCodeMax), codes[1]},
+          codes[2],
+          {tokens[0], getTableRowMax(names::kTokenMax), tokens[1]},
+          {log[0], getTableRowMax(names::kLogMax), 0}};
+}
+
+Purged Room::purgeable(long long grace) const {
+  const long long now = currentTime();
+  return {countIn(store_, names::kGrantCodeTable, rows::isDeadCode(now, grace))[1],
+          countIn(store_, names::kTokenTable, rows::isDeadToken(store_.policy, now, grace))[1]};
+}
+
+Purged Room::purge(long long grace) {
+  const long long now = currentTime();
+  Whole whole(store_);
+  const Purged purged{store_.run("DELETE FROM " + std::string(names::kGrantCodeTable) + " WHERE " +
+                                 rows::isDeadCode(now, grace)),
+                      store_.run("DELETE FROM " + std::string(names::kTokenTable) + " WHERE " +
+                                 rows::isDeadToken(store_.policy, now, grace))};
+  whole.commit();
+  return purged;
+}
+
+}  // namespace KELDOAUTHSERVER::grants

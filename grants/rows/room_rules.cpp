@@ -1,0 +1,190 @@
+#include "grants/rows/room_rules.h"
+
+#include <syslog.h>
+
+#include <algorithm>
+
+#include "core/oauth_errors.h"
+#include "grants/rows/digest.h"
+#include "grants/rows/quotes.h"
+#include "grants/rows/registry_words.h"
+#include "grants/rows/state.h"
+#include "grants/texts.h"
+#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
+
+namespace KELDOAUTHSERVER::grants::rows {
+namespace {
+
+constexpr char kSource[] = "grants";
+constexpr int kFullLine = 10;
+
+/// Ids above are another program's doing; ours stay where the next is free.
+constexpr char kOrdinaryId[] = "4611686018427387904";
+
+std::string expiry() {
+  return "CAST(" + std::string(names::kExpiredTime) + " AS INTEGER)";
+}
+
+/// What an insertion asks of its table, in conditions of SQL.
+struct Claim {
+  const char* table;
+  const char* limitKey;
+  OAUTHError whenFull;
+  std::string isDead;
+  std::string isOfPair;  // one user with one application
+  std::string isOfUser;
+  std::string isOfApplication;
+  std::string order;   // what of one's own goes first
+  std::string yields;  // what of anybody's goes when the table is full
+  int pairBound;
+};
+
+struct Crowd {
+  long long rows;
+  long long ofPair;
+  long long ofUser;
+  long long ofApplication;
+  long long nextId;
+};
+
+std::string sumOf(const Claim& claim, const std::string& condition) {
+  return ",IFNULL(SUM(NOT " + claim.isDead + " AND " + condition + "),0)";
+}
+
+Crowd count(Store& store, const Claim& claim) {
+  const std::vector<long long> sums = store.numbers(
+      "SELECT COUNT(*)" + sumOf(claim, claim.isOfPair) + sumOf(claim, claim.isOfUser) +
+      sumOf(claim, claim.isOfApplication) + ",IFNULL(MAX(CASE WHEN id<" + kOrdinaryId +
+      " THEN id END),0)+1 FROM " + claim.table);
+  return {sums[0], sums[1], sums[2], sums[3], sums[4]};
+}
+
+/// Removes the first `most` of the rows that meet `condition`; how many went.
+long long evict(Store& store, const Claim& claim, const std::string& condition, long long most) {
+  return store.run("DELETE FROM " + std::string(claim.table) + " WHERE id IN (SELECT id FROM " +
+                   claim.table + " WHERE " + condition + " ORDER BY " + claim.order + " LIMIT " +
+                   std::to_string(most) + ")");
+}
+
+/// Whether something of the claimant's own had to go.
+bool evictBeyond(Store& store, const Claim& claim, const std::string& condition, long long found,
+                 long long bound) {
+  const long long most = std::max(bound, 1LL);
+  if (found < most) return false;
+  evict(store, claim, "NOT " + claim.isDead + " AND " + condition, found - most + 1);
+  return true;
+}
+
+bool evictOwn(Store& store, const Claim& claim, const Crowd& crowd, long long limit) {
+  const Policy& policy = store.policy;
+  return evictBeyond(store, claim, claim.isOfPair, crowd.ofPair, claim.pairBound) ||
+         evictBeyond(store, claim, claim.isOfUser, crowd.ofUser,
+                     limit / std::max(policy.userPart, 1)) ||
+         evictBeyond(store, claim, claim.isOfApplication, crowd.ofApplication,
+                     limit / std::max(policy.applicationPart, 1));
+}
+
+[[noreturn]] void fail(const OAUTHError& whenFull) {
+  syslog(LOG_ERR, "%s:%d %s", kSource, kFullLine, whenFull.message);
+  throw Trouble(whenFull.code, whenFull.message);
+}
+
+void clearDead(Store& store, const Claim& claim, long long rows, long long limit) {
+  rows -= store.run("DELETE FROM " + std::string(claim.table) + " WHERE " + claim.isDead);
+  if (rows < limit) return;
+  if (claim.yields.empty()) fail(claim.whenFull);
+  const long long needed = rows - limit + 1;
+  if (evict(store, claim, claim.yields, needed) < needed) fail(claim.whenFull);
+}
+
+long long makeRoom(Store& store, const Claim& claim) {
+  const long long limit = getTableRowMax(claim.limitKey);
+  Crowd crowd = count(store, claim);
+  while (evictOwn(store, claim, crowd, limit)) crowd = count(store, claim);
+  if (crowd.rows >= limit) clearDead(store, claim, crowd.rows, limit);
+  return crowd.nextId;
+}
+
+std::string isOf(const std::string& application) {
+  return "(" + std::string(names::kClientId) + "=" + literal(Store::sealed(application)) + ")";
+}
+
+Claim tokenClaim(const Store& store, const std::string& application, long long now) {
+  Claim claim{names::kTokenTable, names::kTokenMax, errors::kTokenFull, "", "", "", "", "", "", 1};
+  claim.isDead = isDeadToken(store.policy, now);
+  claim.isOfApplication = isOf(application);
+  claim.order = expiry() + ",id";
+  return claim;
+}
+
+}  // namespace
+
+std::string isDeadCode(long long now, long long grace) {
+  return "(" + expiry() + "<=" + std::to_string(now - grace) + ")";
+}
+
+std::string isSpentCode() {
+  return "(substr(" + std::string(names::kState) + ",1,2)='" + kSpentStart + "' AND substr(" +
+         names::kCode + ",1,7)='sha256:')";
+}
+
+std::string isDeadToken(const Policy& policy, long long now, long long grace) {
+  return "(" + expiry() + "<" + std::to_string(now - grace) + "-CASE WHEN " + isOwnToken() +
+         " THEN 0 ELSE " + std::to_string(policy.idle) + " END)";
+}
+
+std::string isOwnToken() {
+  return "(" + std::string(names::kFlowType) + "='client_credentials')";
+}
+
+void makeRoomForCode(Store& store, const std::string& user, const std::string& application,
+                     long long now) {
+  const std::string isOfUser = isOneOf(names::kUsername, spellings(user));
+  const std::string isOfApplication = isOf(application);
+  makeRoom(store,
+           {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull, isDeadCode(now),
+            "(NOT " + isSpentCode() + " AND " + isOfUser + " AND " + isOfApplication + ")",
+            isOfUser, isOfApplication, isSpentCode() + " DESC," + expiry() + ",id", isSpentCode(),
+            store.policy.codesOfOne});
+}
+
+long long makeRoomForLogin(Store& store, const std::string& user, const std::string& application,
+                           long long now) {
+  Claim claim = tokenClaim(store, application, now);
+  claim.isOfUser =
+      "(" + isOneOf(names::kUsername, spellings(user)) + " AND NOT " + isOwnToken() + ")";
+  claim.isOfPair = "(" + claim.isOfUser + " AND " + claim.isOfApplication + ")";
+  claim.pairBound = store.policy.sessionsOfOne;
+  return makeRoom(store, claim);
+}
+
+long long makeRoomForOwnToken(Store& store, const std::string& application, long long now) {
+  Claim claim = tokenClaim(store, application, now);
+  claim.isOfUser = "0";
+  claim.isOfPair = "(" + isOwnToken() + " AND " + claim.isOfApplication + ")";
+  claim.pairBound = store.policy.tokensOfItself;
+  return makeRoom(store, claim);
+}
+
+void makeRoomForApplication(Store& store, bool registersItself, long long now) {
+  const long long limit = getTableRowMax(names::kClientInfoMax);
+  const std::vector<long long> found = store.numbers(
+      "SELECT COUNT(*),IFNULL(SUM(" + selfCondition() + "),0) FROM " + names::kClientInfoTable);
+  const long long part = std::max(limit / std::max(store.policy.selfRegisteredPart, 1), 1LL);
+  const bool isBeyond = registersItself && found[1] >= part;
+  if (!isBeyond && found[0] < limit) return;
+  if (!isBeyond) fail(errors::kClientInfoFull);
+
+  // An application that nobody uses: neither a code to redeem nor a token.
+  const std::string live = " AND client_id NOT IN (SELECT client_id FROM ";
+  const long long gone = store.run(
+      "DELETE FROM " + std::string(names::kClientInfoTable) + " WHERE id IN (SELECT id FROM " +
+      names::kClientInfoTable + " WHERE " + selfCondition() + live + names::kGrantCodeTable +
+      " WHERE NOT " + isDeadCode(now) + " AND NOT " + isSpentCode() + ")" + live +
+      names::kTokenTable + " WHERE NOT " + isDeadToken(store.policy, now) + ") ORDER BY id LIMIT " +
+      std::to_string(found[1] - part + 1) + ")");
+  if (gone == 0 || found[0] - gone >= limit) fail(errors::kClientInfoFull);
+}
+
+}  // namespace KELDOAUTHSERVER::grants::rows

@@ -1,0 +1,42 @@
+// Who may take how much of the tables, and what goes when there is no room.
+
+#ifndef KELDOAUTH_GRANTS_ROWS_ROOM_RULES_H
+#define KELDOAUTH_GRANTS_ROWS_ROOM_RULES_H
+
+#include <string>
+
+#include "grants/rows/store.h"
+
+namespace KELDOAUTHSERVER::grants::rows {
+
+// Conditions of SQL. `grace` seconds ago the row was dead already.
+
+/// A code is good before its expiry; one that is spent is remembered until its
+/// login has to end, which is its expiry then.
+std::string isDeadCode(long long now, long long grace = 0);
+std::string isSpentCode();
+
+/// An application's own token is good until its expiry, included; a login can
+/// be refreshed for the policy's idle time after it.
+std::string isDeadToken(const Policy& policy, long long now, long long grace = 0);
+
+/// Of an application that acts for itself.
+std::string isOwnToken();
+
+// Within the transaction of an operation that will insert a row: make the room
+// that its owner is due. Throws Trouble (kFull), with one line in the system
+// log, when there is none.
+
+void makeRoomForCode(Store& store, const std::string& user, const std::string& application,
+                     long long now);
+
+/// Both give the id that the row gets.
+long long makeRoomForLogin(Store& store, const std::string& user, const std::string& application,
+                           long long now);
+long long makeRoomForOwnToken(Store& store, const std::string& application, long long now);
+
+void makeRoomForApplication(Store& store, bool registersItself, long long now);
+
+}  // namespace KELDOAUTHSERVER::grants::rows
+
+#endif  // KELDOAUTH_GRANTS_ROWS_ROOM_RULES_H

@@ -1,0 +1,134 @@
+#include "grants/rows/state.h"
+
+#include <charconv>
+#include <limits>
+#include <system_error>
+#include <vector>
+
+#include "utils/oauth_bounds.h"
+
+namespace KELDOAUTHSERVER::grants::rows {
+namespace {
+
+constexpr char kCodeStart[] = "c1";
+constexpr char kTokenStart[] = "t1";
+constexpr std::size_t kStart = 2;
+constexpr std::size_t kCodeFields = 6;
+constexpr std::size_t kSpentFields = 9;
+constexpr std::size_t kTokenFields = 8;
+
+using Fields = std::vector<std::string>;
+
+std::string joined(const char* start, const Fields& fields) {
+  std::string text = start;
+  for (const std::string& field : fields) {
+    text += std::to_string(field.size()) + ":" + field;
+  }
+  return text;
+}
+
+/// Reads decimal digits, and only those that to_string writes.
+template <typename Number>
+std::optional<Number> numberOf(std::string_view text) {
+  Number number = 0;
+  const char* const end = text.data() + text.size();
+  const auto [stop, error] = std::from_chars(text.data(), end, number);
+  if (error != std::errc() || stop != end || std::to_string(number) != text) return {};
+  return number;
+}
+
+/// Exactly so many fields and nothing behind them.
+std::optional<Fields> split(std::string_view text, std::size_t count) {
+  Fields fields;
+  while (!text.empty() && fields.size() < count) {
+    const std::size_t colon = text.find(':');
+    if (colon == std::string_view::npos) return {};
+    const std::optional<std::size_t> size = numberOf<std::size_t>(text.substr(0, colon));
+    text.remove_prefix(colon + 1);
+    if (!size || *size > text.size()) return {};
+    fields.emplace_back(text.substr(0, *size));
+    text.remove_prefix(*size);
+  }
+  if (!text.empty() || fields.size() != count) return {};
+  return fields;
+}
+
+bool readSpent(const Fields& fields, CodeState& state) {
+  const std::optional<long long> time = numberOf<long long>(fields[kCodeFields]);
+  const std::optional<long long> row = numberOf<long long>(fields[kCodeFields + 1]);
+  if (!time || !row) return false;
+  state.spent = Spent{*time, *row, fields[kCodeFields + 2]};
+  return true;
+}
+
+bool isInColumn(const std::string& text) {
+  return text.size() <= static_cast<std::size_t>(bounds::kState.max);
+}
+
+/// A number with as many digits as there can be.
+constexpr long long kLongest = std::numeric_limits<long long>::min();
+
+/// A mark of the length of them all.
+std::string anyMark() {
+  return std::string(kIdentifierLength, '0');
+}
+
+}  // namespace
+
+std::string pack(const CodeState& state) {
+  Fields fields{state.redirect,  state.isNamed ? "1" : "0",    state.method,
+                state.challenge, std::to_string(state.issued), state.text};
+  if (!state.spent) return joined(kCodeStart, fields);
+  fields.push_back(std::to_string(state.spent->time));
+  fields.push_back(std::to_string(state.spent->tokenRow));
+  fields.push_back(state.spent->family);
+  return joined(kSpentStart, fields);
+}
+
+std::string pack(const TokenState& state) {
+  return joined(kTokenStart, {std::to_string(state.login), std::to_string(state.redeemed),
+                              std::to_string(state.issued), state.family, state.refreshBefore,
+                              state.accessBefore, state.loginScope, state.text});
+}
+
+std::optional<CodeState> unpackCode(std::string_view text) {
+  const std::string_view start = text.substr(0, kStart);
+  const bool isSpent = start == kSpentStart;
+  if (!isSpent && start != kCodeStart) return {};
+  const std::optional<Fields> fields =
+      split(text.substr(kStart), isSpent ? kSpentFields : kCodeFields);
+  if (!fields || ((*fields)[1] != "1" && (*fields)[1] != "0")) return {};
+
+  const std::optional<long long> issued = numberOf<long long>((*fields)[4]);
+  if (!issued) return {};
+  CodeState state{(*fields)[0], (*fields)[1] == "1", (*fields)[2], (*fields)[3],
+                  *issued,      (*fields)[5]};
+  if (isSpent && !readSpent(*fields, state)) return {};
+  return state;
+}
+
+std::optional<TokenState> unpackToken(std::string_view text) {
+  if (text.substr(0, kStart) != kTokenStart) return {};
+  const std::optional<Fields> fields = split(text.substr(kStart), kTokenFields);
+  if (!fields) return {};
+  const std::optional<long long> login = numberOf<long long>((*fields)[0]);
+  const std::optional<long long> redeemed = numberOf<long long>((*fields)[1]);
+  const std::optional<long long> issued = numberOf<long long>((*fields)[2]);
+  if (!login || !redeemed || !issued) return {};
+  return TokenState{*login,       *redeemed,    *issued,      (*fields)[3],
+                    (*fields)[4], (*fields)[5], (*fields)[6], (*fields)[7]};
+}
+
+bool fitsEver(const CodeState& state, const std::string& scope) {
+  CodeState spent = state;
+  spent.spent = Spent{kLongest, kLongest, anyMark()};
+  return isInColumn(pack(spent)) &&
+         fitsEver(TokenState{kLongest, kLongest, kLongest, "", "", "", "", state.text}, scope);
+}
+
+bool fitsEver(const TokenState& state, const std::string& scope) {
+  return isInColumn(pack(TokenState{kLongest, kLongest, kLongest, anyMark(), anyMark(), anyMark(),
+                                    scope, state.text}));
+}
+
+}  // namespace KELDOAUTHSERVER::grants::rows

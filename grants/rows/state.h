@@ -1,0 +1,71 @@
+// What the columns do not hold rides in `state`, the one column whose text is
+// ours. A text begins with what it is and its version, and then has one field
+// after the other, each as its length, a colon and its bytes as they are:
+//
+//   c1  a code: redirect address, whether it was named (1 or 0), method of the
+//       challenge (S or P; empty without), challenge, when issued, caller's text
+//   s1  a code that was spent: the same, then when it was spent, its token's
+//       row and the family's mark
+//   t1  a token: when its code was issued, redeemed, when the present pair was
+//       issued, mark of the family, marks of the refresh and access token
+//       before, scope of the login where the row has a narrower one, caller's
+//       text
+//
+// Nothing else in the library or above it reads or writes these texts.
+
+#ifndef KELDOAUTH_GRANTS_ROWS_STATE_H
+#define KELDOAUTH_GRANTS_ROWS_STATE_H
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace KELDOAUTHSERVER::grants::rows {
+
+struct Spent {
+  long long time;
+  long long tokenRow;
+  std::string family;  // mark
+};
+
+struct CodeState {
+  std::string redirect;
+  bool isNamed;
+  std::string method;
+  std::string challenge;
+  long long issued;
+  std::string text;
+  std::optional<Spent> spent = {};
+};
+
+struct TokenState {
+  long long login;
+  long long redeemed;
+  long long issued;
+  std::string family;
+  std::string refreshBefore;
+  std::string accessBefore;
+  std::string loginScope;  // empty: the row's own
+  std::string text;
+};
+
+/// How the text of a spent code begins.
+inline constexpr char kSpentStart[] = "s1";
+
+std::string pack(const CodeState& state);
+std::string pack(const TokenState& state);
+
+/// Nothing for a text that `pack` did not write.
+std::optional<CodeState> unpackCode(std::string_view text);
+std::optional<TokenState> unpackToken(std::string_view text);
+
+/// Whether everything that the grant can ever need fits in the column: the
+/// code redeemed, and its login refreshed with a narrower scope than `scope`.
+bool fitsEver(const CodeState& state, const std::string& scope);
+
+/// The same for a token that has no code.
+bool fitsEver(const TokenState& state, const std::string& scope);
+
+}  // namespace KELDOAUTHSERVER::grants::rows
+
+#endif  // KELDOAUTH_GRANTS_ROWS_STATE_H

@@ -1,0 +1,86 @@
+// The stores on one connection, and what every operation does with them: read
+// rows, change them, and hold several steps together. The one place above the
+// stores that writes request documents and runs statements. Everything that
+// could not be done is thrown as Trouble, so that "no row" means no row.
+
+#ifndef KELDOAUTH_GRANTS_ROWS_STORE_H
+#define KELDOAUTH_GRANTS_ROWS_STORE_H
+
+#include <json/value.h>
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "core/transaction.h"
+#include "grants/policy.h"
+#include "grants/trouble.h"
+#include "stores/oauth_clientInfo.h"
+#include "stores/oauth_grantCode.h"
+#include "stores/oauth_log.h"
+#include "stores/oauth_token.h"
+
+namespace KELDOAUTHSERVER::grants {
+
+class Store {
+ public:
+  /// Throws Trouble when the store is not ready.
+  explicit Store(const Policy& policy);
+
+  const Policy policy;
+  OAUTHDBClientInfo applications;  // whose connection it is
+  OAUTHDBGrantCode codes;
+  OAUTHDBToken tokens;
+  OAUTHDBLog log;
+
+  // Reading -------------------------------------------------------------------
+
+  /// The rows that meet `condition`, a member a column.
+  static Json::Value rowsBy(OAUTHDBBasic& table, const Json::Value& condition);
+
+  /// The rows that meet a condition of SQL, all without one; `tail` is ORDER BY
+  /// and the like.
+  static Json::Value rowsWhere(OAUTHDBBasic& table, const std::string& condition,
+                               const std::string& tail = "");
+
+  /// The columns of the one row that `select` gives, as numbers.
+  std::vector<long long> numbers(const std::string& select);
+
+  // Changing ------------------------------------------------------------------
+
+  static void insert(OAUTHDBBasic& table, Json::Value row);
+  /// Whether there was such a row.
+  static bool change(OAUTHDBBasic& table, const Json::Value& condition,
+                     const Json::Value& modified);
+  static bool erase(OAUTHDBBasic& table, const Json::Value& condition);
+  /// A statement that gives no rows; how many it changed.
+  long long run(const std::string& statement);
+
+  /// An application's identifier as the columns "client_id" hold it.
+  static std::string sealed(const std::string& identifier);
+
+ private:
+  void requireReady();
+};
+
+/// Several steps as one: all of them when `commit` returns, none otherwise.
+/// Takes the write lock at once. Throws Trouble.
+class Whole {
+ public:
+  explicit Whole(Store& store);
+  void commit();
+
+ private:
+  Store& store_;
+  Transaction transaction_;
+};
+
+/// The decimal number at the start of a column's text; 0 without one.
+long long numberIn(const Json::Value& column);
+
+/// Unix seconds, once for each operation.
+long long currentTime();
+
+}  // namespace KELDOAUTHSERVER::grants
+
+#endif  // KELDOAUTH_GRANTS_ROWS_STORE_H
