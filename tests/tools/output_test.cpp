@@ -2,6 +2,8 @@
 // in JSON.
 
 #include <algorithm>
+#include <cstdlib>
+#include <filesystem>
 
 #include "tests/tools/cli.h"
 
@@ -75,6 +77,17 @@ INSTANTIATE_TEST_SUITE_P(
         Shown{"Wide", "日本語", "日本語"}, Shown{"Combining", "e\u0301t\u00e9", "e\u0301t\u00e9"},
         Shown{"Emoji", "👨\u200D👩", "👨\u200D👩"}),
     [](const auto& test) { return test.param.what; });
+
+TEST_F(Output, AKeyFilesNameInAWarning) {
+  addClient();
+  std::filesystem::remove("/tmp/copy.db");
+  run({"backup", "/tmp/copy.db"});
+  ::setenv("KELDCORE_KEY_FILE", "/tmp/\x1b\x7f\xc2\x9b/key", 1);
+  const Outcome outcome = run({"restore", "/tmp/copy.db", "--yes"});
+  ::unsetenv("KELDCORE_KEY_FILE");
+  EXPECT_THAT(outcome, ExitsWith(kUnhealthy));
+  EXPECT_THAT(outcome.err, HasSubstr("the key file /tmp/\\x1b\\x7f\\u{9b}/key is missing"));
+}
 
 // JSON ----------------------------------------------------------------------------
 

@@ -139,7 +139,7 @@ void warnOfKey(const Json::Value& fits) {
   } else if (!missing.empty()) {
     warning = missing;
   }
-  std::cerr << "keldoauth: restore: " + warning + "\nhint: " + hint + "\n";
+  std::cerr << "keldoauth: restore: " + printable(warning) + "\nhint: " + printable(hint) + "\n";
 }
 
 void requireNoStranger(DatabaseFile& copy, const std::string& path) {
