@@ -61,7 +61,7 @@ std::string nameOf(int descriptor) {
 void note(const std::string& step) {
   const char* record = std::getenv("KELDOAUTH_STEPS");
   if (record == nullptr) return;
-  static const auto openRecord = ORIGINAL(open);
+  static const auto openRecord = ORIGINAL(open64);
   const int file = openRecord(record, O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0600);
   const std::string line = step + "\n";
   static const auto put = ORIGINAL(write);
@@ -151,18 +151,9 @@ ssize_t write(int file, const void* bytes, size_t size) {
   return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part); });
 }
 
-ssize_t pwrite(int file, const void* bytes, size_t size, off_t at) {
-  static const auto put = ORIGINAL(pwrite);
-  return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part, at); });
-}
-
 ssize_t pwrite64(int file, const void* bytes, size_t size, off64_t at) {
   static const auto put = ORIGINAL(pwrite64);
   return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part, at); });
-}
-
-int ftruncate(int file, off_t size) noexcept {
-  return step("truncate " + nameOf(file), [=] { return ORIGINAL(ftruncate)(file, size); });
 }
 
 int ftruncate64(int file, off64_t size) noexcept {
@@ -194,20 +185,39 @@ int rename(const char* from, const char* to) noexcept {
   return step(std::string("rename ") + to, [=] { return ORIGINAL(rename)(from, to); });
 }
 
-int open(const char* path, int flags, ...) {
-  GET_MODE;
-  return stepOfOpening(path, flags, [=] { return ORIGINAL(open)(path, flags, mode); });
-}
-
 int open64(const char* path, int flags, ...) {
   GET_MODE;
   return stepOfOpening(path, flags, [=] { return ORIGINAL(open64)(path, flags, mode); });
+}
+
+int openat64(int folder, const char* path, int flags, ...) {
+  GET_MODE;
+  return stepOfOpening(path, flags, [=] { return ORIGINAL(openat64)(folder, path, flags, mode); });
+}
+
+// Where offsets have 64 bits anyway, these are other names of the same.
+#ifndef __USE_FILE_OFFSET64
+
+ssize_t pwrite(int file, const void* bytes, size_t size, off_t at) {
+  static const auto put = ORIGINAL(pwrite);
+  return stepOfWriting(file, size, [=](size_t part) { return put(file, bytes, part, at); });
+}
+
+int ftruncate(int file, off_t size) noexcept {
+  return step("truncate " + nameOf(file), [=] { return ORIGINAL(ftruncate)(file, size); });
+}
+
+int open(const char* path, int flags, ...) {
+  GET_MODE;
+  return stepOfOpening(path, flags, [=] { return ORIGINAL(open)(path, flags, mode); });
 }
 
 int openat(int folder, const char* path, int flags, ...) {
   GET_MODE;
   return stepOfOpening(path, flags, [=] { return ORIGINAL(openat)(folder, path, flags, mode); });
 }
+
+#endif
 
 int getentropy(void* bytes, size_t size) {
   return step("draw", [=] { return ORIGINAL(getentropy)(bytes, size); });
