@@ -1,5 +1,5 @@
-// The power fails right after backup, restore or rekey has said that it is
-// done, on ext4 (see tests/faults/ext4_medium.h).
+// The power fails right after backup, restore, rekey or the first registration
+// has said that it is done, on ext4 (see tests/faults/ext4_medium.h).
 
 #include <filesystem>
 #include <optional>
@@ -59,6 +59,18 @@ class PowerCut : public Operations {
   std::optional<Ext4Medium> state_;
   std::optional<Ext4Medium> copies_;
 };
+
+/// Database and key are made within it.
+TEST_F(PowerCut, FindsTheFirstApplication) {
+  again([this] {
+    for (const char* path : {kDatabase, kKey}) ASSERT_TRUE(fs::remove(path));
+    cutAfter({"client", "add", "--redirect-uri", "app:/back", "--scope", "read", "--name", "One"});
+    const Json::Value clients = json({"client", "list"})["clients"];
+    ASSERT_EQ(clients.size(), 1U);
+    EXPECT_EQ(clients[0]["client_id"].asString().size(), 64U);
+    expectPrivate(kStateDir);
+  });
+}
 
 TEST_F(PowerCut, FindsTheFinishedBackup) {
   again([this] {
