@@ -32,7 +32,7 @@ constexpr std::string_view kTablesWithSecrets[] = {names::kClientInfoTable, name
 
 // The format ------------------------------------------------------------------------
 
-constexpr std::string_view kMagic("SQLite format 3", 16);
+constexpr char kMagic[] = "SQLite format 3";  // its terminator included
 constexpr std::size_t kFileHeader = 100;
 constexpr std::size_t kPageSizeAt = 16;
 constexpr std::size_t kWriteVersionAt = 18;
@@ -113,13 +113,13 @@ class StoreFile {
   StoredValues values() {
     std::array<std::uint8_t, kFileHeader> header{};
     if (!read(0, header.data(), header.size()) ||
-        std::memcmp(header.data(), kMagic.data(), kMagic.size()) != 0) {
+        std::memcmp(header.data(), kMagic, sizeof kMagic) != 0) {
       return StoredValues::kUnknown;
     }
     pageSize_ = Reader(header.data() + kPageSizeAt, 2).number(2);
     isWal_ = header[kWriteVersionAt] == kWalVersion;
     if (pageSize_ < kSmallestPage || pageSize_ > kLargestPage) return StoredValues::kUnknown;
-    return inSchema(kRootOfSchema, true);
+    return inSchema();
   }
 
   [[nodiscard]] bool isWal() const { return isWal_; }
@@ -139,28 +139,52 @@ class StoreFile {
     return number > 0 && number <= UINT32_MAX && read((number - 1) * pageSize_, bytes, size);
   }
 
-  /// Of the tables that this page of the schema, and those below it, name. Its
-  /// some ten entries need no more than two floors.
-  StoredValues inSchema(std::uint64_t number, bool isRoot) {
-    Page page;
-    if (!readPage(number, page.data(), pageSize_)) return StoredValues::kUnknown;
-    const std::size_t headerAt = isRoot ? kFileHeader : 0;
-    const std::uint8_t* const header = page.data() + headerAt;
-    const bool isLeaf = header[0] == kLeafPage;
-    if (!isLeaf && !(isRoot && header[0] == kInteriorPage)) return StoredValues::kUnknown;
+  /// Of the tables that the schema names. Its some ten entries need no more than
+  /// two floors of pages.
+  StoredValues inSchema() {
+    Page root;
+    if (!readPage(kRootOfSchema, root.data(), pageSize_)) return StoredValues::kUnknown;
+    if (root[kFileHeader] == kLeafPage) return inLeaf(root, kFileHeader);
+    if (root[kFileHeader] != kInteriorPage) return StoredValues::kUnknown;
 
-    Reader pointers(header + (isLeaf ? kLeafHeader : kInteriorHeader),
-                    pageSize_ - headerAt - kInteriorHeader);
-    const std::uint64_t cells = Reader(header + kCellCountAt, 2).number(2);
-    for (std::uint64_t i = 0; i < cells; ++i) {
-      const auto cell = static_cast<std::size_t>(pointers.number(2));
-      if (!pointers.isGood() || cell >= pageSize_) return StoredValues::kUnknown;
-      Reader reader(page.data() + cell, pageSize_ - cell);
-      const StoredValues found = isLeaf ? inEntry(reader) : inSchema(reader.number(4), false);
+    const std::uint8_t* const lastChild = root.data() + kFileHeader + kRightChildAt;
+    StoredValues found = inChild(Reader(lastChild, 4).number(4));
+    for (std::uint64_t i = 0; i < cellCount(root, kFileHeader); ++i) {
       if (found != StoredValues::kNone) return found;
+      Reader cell = cellAt(root, kFileHeader + kInteriorHeader, i);
+      found = inChild(cell.number(4));
     }
-    return isLeaf ? StoredValues::kNone
-                  : inSchema(Reader(header + kRightChildAt, 4).number(4), false);
+    return found;
+  }
+
+  StoredValues inChild(std::uint64_t number) {
+    Page page;
+    const bool isLeaf = readPage(number, page.data(), pageSize_) && page[0] == kLeafPage;
+    return isLeaf ? inLeaf(page, 0) : StoredValues::kUnknown;
+  }
+
+  StoredValues inLeaf(const Page& page, std::size_t headerAt) {
+    StoredValues found = StoredValues::kNone;
+    for (std::uint64_t i = 0; i < cellCount(page, headerAt); ++i) {
+      if (found != StoredValues::kNone) return found;
+      Reader cell = cellAt(page, headerAt + kLeafHeader, i);
+      found = inEntry(cell);
+    }
+    return found;
+  }
+
+  static std::uint64_t cellCount(const Page& page, std::size_t headerAt) {
+    return Reader(page.data() + headerAt + kCellCountAt, 2).number(2);
+  }
+
+  /// From the start of a cell to the end of its page; empty for one that lies
+  /// outside.
+  [[nodiscard]] Reader cellAt(const Page& page, std::size_t pointersAt, std::uint64_t index) const {
+    const auto pointerAt = static_cast<std::size_t>(pointersAt + 2 * index);
+    if (pointerAt + 2 > pageSize_) return {page.data(), 0};
+    const auto cell = static_cast<std::size_t>(Reader(page.data() + pointerAt, 2).number(2));
+    if (cell >= pageSize_) return {page.data(), 0};
+    return {page.data() + cell, pageSize_ - cell};
   }
 
   /// One row of the schema: type, name, table, root page and text.
@@ -210,7 +234,7 @@ int openDescriptorOn(const struct stat& file) {
   if (folder == nullptr) return -1;
   int found = -1;
   while (const dirent* const entry = readdir(folder)) {
-    const int descriptor = std::atoi(entry->d_name);
+    const int descriptor = static_cast<int>(std::strtol(entry->d_name, nullptr, 10));
     struct stat status {};
     if (entry->d_name[0] == '.' || fstat(descriptor, &status) != 0) continue;
     if (status.st_dev != file.st_dev || status.st_ino != file.st_ino) continue;

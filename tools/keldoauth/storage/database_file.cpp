@@ -5,6 +5,7 @@
 #include <ctime>
 #include <functional>
 #include <string_view>
+#include <utility>
 
 #include "core/schema.h"
 #include "tools/keldoauth/storage/descriptor_vfs.h"
@@ -39,8 +40,8 @@ constexpr Table kTables[] = {
 class Statement {
  public:
   /// `error` makes what is thrown when SQLite refuses.
-  Statement(sqlite3* db, const std::string& sql, const std::function<Failure()>& error)
-      : error_(error) {
+  Statement(sqlite3* db, const std::string& sql, std::function<Failure()> error)
+      : error_(std::move(error)) {
     const int result = sqlite3_prepare_v2(db, sql.c_str(), -1, &statement_, nullptr);
     if (result != SQLITE_OK) throw error_();
   }

@@ -7,7 +7,6 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <string_view>
 #include <vector>
 
 namespace tool {
@@ -58,11 +57,11 @@ int writeAll(int descriptor, const char* from, std::size_t size, off_t at) {
 /// The two bytes of the first page that tell how the file is to be written and
 /// read: 1 is by a journal, 2 by a write-ahead log.
 int writeFile(sqlite3_file* file, const void* bytes, int size, sqlite3_int64 at) {
-  constexpr std::string_view kMagic("SQLite format 3", 16);
+  constexpr char kMagic[] = "SQLite format 3";  // its terminator included
   constexpr std::size_t kVersionsAt = 18;
   const auto count = static_cast<std::size_t>(size);
   std::vector<char> page(static_cast<const char*>(bytes), static_cast<const char*>(bytes) + count);
-  if (at == 0 && std::string_view(page.data(), count).substr(0, kMagic.size()) == kMagic) {
+  if (at == 0 && count > kVersionsAt + 1 && std::memcmp(bytes, kMagic, sizeof kMagic) == 0) {
     page.at(kVersionsAt) = page.at(kVersionsAt + 1) = 1;
   }
   return writeAll(descriptorOf(file), page.data(), count, static_cast<off_t>(at));
@@ -129,7 +128,7 @@ int openFile(sqlite3_vfs* /*vfs*/, const char* name, sqlite3_file* file, int fla
   file->pMethods = nullptr;
   if ((flags & SQLITE_OPEN_MAIN_DB) == 0 || name == nullptr) return SQLITE_CANTOPEN;
   file->pMethods = &methods;
-  reinterpret_cast<File*>(file)->descriptor = std::atoi(name);
+  reinterpret_cast<File*>(file)->descriptor = static_cast<int>(std::strtol(name, nullptr, 10));
   if (outFlags != nullptr) *outFlags = flags;
   return SQLITE_OK;
 }

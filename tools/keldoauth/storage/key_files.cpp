@@ -72,7 +72,7 @@ std::string absenceOfKey() {
 }
 
 std::string adviceOnCipher() {
-  const std::string missing = absenceOfKey();
+  std::string missing = absenceOfKey();
   if (missing.empty()) {
     return "the platform's cipher or its key cannot be used; the system log says more";
   }
@@ -88,9 +88,10 @@ void drawKey(const std::string& path) {
                        getentropy(key.bytes.data(), key.bytes.size()) == 0 &&
                        writeAll(file.get(), key) && fsync(file.get()) == 0;
   if (isWhole) return;
-  const Failure failure = systemFailure(path);
+  const int error = errno;
   unlink(path.c_str());
-  throw failure;
+  errno = error;
+  throw systemFailure(path);
 }
 
 void removeKeyDrafts(const std::string& path) {
