@@ -1,7 +1,7 @@
 // The library beside bare SQLite, operation by operation. Every measurement
 // has a twin under the same name with "/bare", and where it writes a second one
-// with "/bare at FULL"; scripts/bench runs all in the same process, interleaved,
-// and gives their ratios.
+// with "/bare at FULL"; scripts/bench runs all in the same process,
+// interleaved, and gives their ratios.
 
 #include <benchmark/benchmark.h>
 #include <json/value.h>
@@ -211,7 +211,8 @@ void constructBare(benchmark::State& state, Sync sync) {
 using Body = void (*)(benchmark::State&);
 using SyncedBody = void (*)(benchmark::State&, Sync);
 
-/// How often a measurement runs, 0 for as often as it takes, and for which rows.
+/// How often a measurement runs, 0 for as often as it takes, and for how many
+/// rows.
 struct Runs {
   int iterations;
   std::initializer_list<int> sizes;

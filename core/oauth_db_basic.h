@@ -35,9 +35,9 @@ class OAUTHDBBasic {
   /// 0600) and any missing table, and keeps the connection for life. A
   /// statement that meets another process's lock waits up to 5 seconds for it.
   /// When the file cannot be opened: SQLite's code, "Open DB failed!!". When it
-  /// is no database or stays locked: SQLite's code and text. When a table cannot
-  /// be created: -1, "Create table failed". In each case the object is not ready
-  /// and refuses every later operation; there is no reopen.
+  /// is no database or stays locked: SQLite's code and text. When a table
+  /// cannot be created: -1, "Create table failed". In each case the object is
+  /// not ready and refuses every later operation; there is no reopen.
   OAUTHDBBasic();
 
   /// Closes the connection, again with raised privileges, unless it is lent.

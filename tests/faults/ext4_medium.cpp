@@ -19,7 +19,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-constexpr off_t kSize = 16 * 1024 * 1024;
+constexpr off_t kSize = off_t{16} * 1024 * 1024;
 constexpr char kOptions[] = "commit=300";
 constexpr int kMostTries = 100;
 
