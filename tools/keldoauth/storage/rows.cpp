@@ -111,7 +111,7 @@ bool isExpiredToken(long long expiry, long long now) {
 }
 
 std::string readableIdentifier(const Json::Value& row) {
-  const std::string identifier = row[names::kClientId].asString();
+  std::string identifier = row[names::kClientId].asString();
   if (isDecrypted(identifier)) return identifier;
   throw Failure(kUnavailable,
                 "client " + row[names::kId].asString() + ": its identifier cannot be decrypted",
