@@ -50,7 +50,8 @@ void completeOwnersRights(const char* path) {
 
   const mode_t mode = file.st_mode & ~static_cast<mode_t>(S_IFMT);
   if (mode == kOwnersAlone || (mode & ~kOwnersAlone) != 0) return;
-  fchmodat(AT_FDCWD, path, kOwnersAlone, AT_SYMLINK_NOFOLLOW);
+  // Where this is refused, so is the opening that follows, and says so.
+  [[maybe_unused]] const int result = fchmodat(AT_FDCWD, path, kOwnersAlone, AT_SYMLINK_NOFOLLOW);
 }
 
 /// Whether the way to the file is closed, so that SQLite cannot create one.
