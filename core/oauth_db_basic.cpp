@@ -274,6 +274,10 @@ int OAUTHDBBasic::Execute(const std::string& sql, RowCallback callback, Json::Va
   return 0;
 }
 
+bool OAUTHDBBasic::InTransaction() const {
+  return db_ != nullptr && sqlite3_get_autocommit(db_) == 0;
+}
+
 int OAUTHDBBasic::TabCountCallback(void* arg, int count, char** values, char** columns) {
   return runAlone(kOwnCallbacks[0], arg, count, values, columns);
 }
@@ -536,10 +540,6 @@ bool OAUTHDBBasic::RunChange(const std::string& sql, int& changed) {
   if (DBCmd(sql, nullptr, nullptr) == 0) return false;
   changed = sqlite3_changes(db_);
   return changed > 0;
-}
-
-bool OAUTHDBBasic::InTransaction() const {
-  return db_ != nullptr && sqlite3_get_autocommit(db_) == 0;
 }
 
 // Encryption ------------------------------------------------------------------

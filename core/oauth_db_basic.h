@@ -73,6 +73,11 @@ class OAUTHDBBasic {
   /// The same without the check for readiness: start-up runs through it.
   int DBCmdRun(const std::string& sql, RowCallback callback, Json::Value* arg);
 
+  /// True between a BEGIN, by whichever object on the connection, and the end of
+  /// its transaction, which need not be a COMMIT: a statement that meets an I/O
+  /// error, a full medium or no memory makes SQLite roll back by itself.
+  bool InTransaction() const;
+
   // The library's own callbacks. `arg` is a Json::Value, an array (an object
   // for the second) or null; DBCmd refuses another one, or none, before the
   // statement: 0, -2 "Bad parameters". Called by hand they always return 0, and
@@ -197,11 +202,6 @@ class OAUTHDBBasic {
 
  private:
   friend class Transaction;
-
-  /// True between a BEGIN and the end of its transaction, which need not be a
-  /// COMMIT: a statement that meets an I/O error, a full medium or no memory
-  /// makes SQLite roll back by itself.
-  bool InTransaction() const;
 
   // The bodies of the public operations that start-up must see fail: they
   // throw.

@@ -1,6 +1,7 @@
 #include "core/transaction.h"
 
 #include <string>
+#include <utility>
 
 #include "utils/wide_time.h"
 
@@ -36,15 +37,16 @@ bool Transaction::Commit() {
   return true;
 }
 
-/// A failed COMMIT may have ended the transaction, too. The reason why it is
-/// taken back stays on the store.
+/// A failed COMMIT may have ended the transaction, too. Not through DBCmd: an
+/// object that is no longer ready must not leave the connection locked. The
+/// reason why it is taken back stays on the store.
 void Transaction::RollBack() {
   if (open_ && store_.InTransaction()) {
-    const int code = store_.GetErrCode();
-    const std::string message = store_.GetErrMsg();
-    store_.DBCmd("ROLLBACK", nullptr, nullptr);
-    store_.SetErrCode(code);
-    store_.SetErrMsg(message);
+    const int code = store_.errCode_;
+    std::string message = std::move(store_.errMsg_);
+    store_.DBCmdRun("ROLLBACK", nullptr, nullptr);
+    store_.errCode_ = code;
+    store_.errMsg_ = std::move(message);
   }
   open_ = false;
 }

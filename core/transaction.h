@@ -32,17 +32,17 @@ class Transaction {
   /// statements that follow would each stand for itself: SQLite's code and text
   /// are on the store, 5 "database is locked" when another process held the
   /// lock for the whole wait, 1 when the connection is in a transaction
-  /// already; no code when the store is not ready. Once per object.
+  /// already; no code when the store is not ready. While this transaction is
+  /// open it is false, too, and changes nothing.
   bool Begin();
 
-  /// True between a successful Begin and Commit, or the end of the scope.
+  /// True between a successful Begin and the next Commit, whatever comes of it.
   bool IsOpen() const;
 
-  /// True between a successful Begin and the end of the scope when SQLite has
-  /// ended the transaction by itself and taken everything back, as it does
-  /// after an I/O error, on a full medium and without memory. The store whose
-  /// statement failed carries the reason. Statements that run now stand each
-  /// for itself: stop.
+  /// True while it is open, but SQLite has ended it by itself and taken
+  /// everything back, as it does after an I/O error, on a full medium and
+  /// without memory. The store whose statement failed carries the reason.
+  /// Statements that run now stand each for itself: stop.
   bool IsLost() const;
 
   /// True when everything is done and on disk. False when nothing was begun, or

@@ -46,20 +46,20 @@ bool beginPurge(Transaction& transaction, OAUTHDBBasic& store);
 
 /// Calls `remove(id)` for each of `ids` in order. Several removals share one
 /// transaction of `store`; where it is refused they run one by one (but see
-/// beginPurge), and where it is lost nothing is removed. True unless a removal
-/// or the commit failed.
+/// beginPurge). Where a transaction is lost, be it the caller's, nothing is
+/// removed. True unless a removal or the commit failed.
 template <typename Remove>
 bool removeAll(OAUTHDBBasic& store, const std::vector<long long>& ids, Remove remove) {
   Transaction transaction(store);
   if (ids.size() > 1 && !beginPurge(transaction, store)) return false;
 
-  const bool together = transaction.IsOpen();
+  const bool together = store.InTransaction();
   bool done = true;
   for (const long long id : ids) {
-    if (transaction.IsLost()) break;
     if (!remove(id)) done = false;
+    if (together && !store.InTransaction()) return false;
   }
-  return (!together || transaction.Commit()) && done;
+  return (!transaction.IsOpen() || transaction.Commit()) && done;
 }
 
 }  // namespace KELDOAUTHSERVER

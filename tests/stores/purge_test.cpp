@@ -322,6 +322,55 @@ TEST_P(PurgeTest, WritersLockEndsItAtTheBegin) {
   EXPECT_THAT(ids(table()), ElementsAre("1", "2"));
 }
 
+/// Whoever waits for the whole limit at every row waits for hours.
+TEST_P(PurgeTest, MeetsAWritersLockOnceWhateverTheNumberOfRows) {
+  insertExpiringAt(std::vector<long long>(24, 5));
+  Lock lock(kDatabase);
+  lock.write();
+  purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
+  EXPECT_EQ(Statements::waits(), 1);
+}
+
+TEST_P(PurgeTest, OfOneRowMeetsAWritersLockOnce) {
+  insertExpiringAt({5});
+  Lock lock(kDatabase);
+  lock.write();
+  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
+  EXPECT_TRUE(failed(outcome, 5, "database is locked"));
+  EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("database is locked", 5), deleteFailed()));
+  EXPECT_EQ(Statements::waits(), 1);
+}
+
+TEST_P(PurgeTest, BeginRefusedForAnotherReasonRunsOneByOneWithTheErrorAsItWas) {
+  insertExpiringAt({5, 6, kNow});
+  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseBegins(); });
+  EXPECT_TRUE(succeeded(outcome));
+  EXPECT_THAT(outcome.statements, ElementsAre(select(), deletion(1), deletion(2)));
+  EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("not authorized", 23)));
+  EXPECT_THAT(ids(table()), ElementsAre("3"));
+}
+
+TEST_P(PurgeTest, OneByOneARefusedDeletionIsTheReasonKept) {
+  insertExpiringAt({5, 6, 7});
+  refuseDeletion(2, "ABORT");
+  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseBegins(); });
+  EXPECT_TRUE(failed(outcome, 19, "kept"));
+  EXPECT_THAT(ids(table()), ElementsAre("2"));
+}
+
+/// A deletion after it would stand although the caller has taken all back.
+TEST_P(PurgeTest, CallersTransactionThatIsLostEndsThePurge) {
+  insertExpiringAt({5, 6, 7});
+  const std::vector<Row> before = everything();
+  refuseDeletion(2, "ROLLBACK");
+  const Outcome outcome = purge(begin);
+  EXPECT_TRUE(failed(outcome, 19, "kept"));
+  EXPECT_THAT(outcome.statements,
+              ElementsAre("BEGIN;", select(), "BEGIN IMMEDIATE", deletion(1), deletion(2)));
+  sql("DROP TRIGGER refuse;");
+  EXPECT_EQ(everything(), before);
+}
+
 // COMMIT that is refused --------------------------------------------------------------
 
 TEST_P(PurgeTest, ReadersLockRefusesTheCommitAndEveryRowIsBack) {

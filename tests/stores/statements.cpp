@@ -13,6 +13,7 @@ struct State {
   std::function<void(const std::string&)> hook;
   bool refusesCommits = false;
   sqlite3* newest = nullptr;
+  int waits = 0;
 };
 State state;
 
@@ -27,6 +28,17 @@ int onStatement(unsigned /*event*/, void* /*unused*/, void* /*statement*/, void*
 
 int onCommit(void* /*unused*/) {
   return state.refusesCommits ? 1 : 0;
+}
+
+int onLock(void* /*unused*/, int /*tries*/) {
+  ++state.waits;
+  return 0;
+}
+
+int onAction(void* /*unused*/, int action, const char* operation, const char* /*unused*/,
+             const char* /*unused*/, const char* /*unused*/) {
+  const bool begins = action == SQLITE_TRANSACTION && std::string(operation) == "BEGIN";
+  return begins ? SQLITE_DENY : SQLITE_OK;
 }
 
 int onOpen(sqlite3* db, char** /*error*/, const struct sqlite3_api_routines* /*unused*/) {
@@ -55,7 +67,14 @@ void Statements::refuseCommits(bool refuse) {
   state.refusesCommits = refuse;
 }
 void Statements::dontWaitForLocks() {
-  sqlite3_busy_handler(state.newest, nullptr, nullptr);
+  state.waits = 0;
+  sqlite3_busy_handler(state.newest, onLock, nullptr);
+}
+int Statements::waits() {
+  return state.waits;
+}
+void Statements::refuseBegins() {
+  sqlite3_set_authorizer(state.newest, onAction, nullptr);
 }
 void Statements::limitStatementsTo(int bytes) {
   sqlite3_limit(state.newest, SQLITE_LIMIT_SQL_LENGTH, bytes);

@@ -26,6 +26,10 @@ class Statements {
   // The connection opened last
   /// gives up at the first lock that it meets;
   static void dontWaitForLocks();
+  /// how many statements have met one since;
+  static int waits();
+  /// is not authorised to begin a transaction;
+  static void refuseBegins();
   /// takes statements, and texts, of at most so many bytes.
   static void limitStatementsTo(int bytes);
   static void limitTextsTo(int bytes);
