@@ -8,6 +8,8 @@
 
 namespace KELDOAUTHSERVER::line {
 
+inline constexpr char kSource[] = "oauth_db_basic";
+
 /// "Entry" is the trace that an operation writes when it is called, "Threw" its
 /// "Unexpected failure".
 enum CoreLine : int {
@@ -26,6 +28,8 @@ enum CoreLine : int {
   kDBCmdRunEntry = 143,
   kRunCommandFailed = 144,
   kDBCmdRunThrew = 145,
+
+  // row_callbacks.cpp
   kTabCountEntry = 151,
   kTabCountThrew = 152,
   kIsTabExistEntry = 153,

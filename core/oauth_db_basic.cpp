@@ -3,20 +3,18 @@
 #include <sqlite3.h>
 #include <syslog.h>
 
-#include <algorithm>
-#include <array>
 #include <cstdint>
 #include <exception>
 #include <string>
-#include <utility>
 
 #include "core/clauses.h"
 #include "core/connection.h"
 #include "core/log_lines.h"
 #include "core/oauth_errors.h"
-#include "core/rows.h"
+#include "core/row_callbacks.h"
 #include "core/schema.h"
 #include "core/secrets.h"
+#include "core/unexpected.h"
 #include "utils/decimal.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
@@ -26,9 +24,7 @@
 namespace KELDOAUTHSERVER {
 namespace {
 
-constexpr char kSource[] = "oauth_db_basic";
-
-// Row callbacks -------------------------------------------------------------
+using line::kSource;
 
 /// What SQLite is given to carry to runRowCallback.
 struct RowCall {
@@ -46,94 +42,6 @@ int runRowCallback(void* arg, int count, char** values, char** columns) {
     call.thrown = std::current_exception();
     return SQLITE_ABORT;
   }
-}
-
-void dumpRow(int number, int count, char** values, char** columns) {
-  if (!isTraced(kRowDump)) return;
-  const int readable = readableColumns(count, values, columns);
-  for (int i = 0; i < readable; ++i) {
-    syslog(LOG_ERR, "%s:%d ##### [%d][%s = %s]", kSource, number, i, textOf(columns[i]),
-           textOf(values[i]));
-  }
-}
-
-// What the public callbacks do. These throw: within a statement an exception has
-// to end it.
-
-int appendCount(void* arg, int count, char** values, char** /*columns*/) {
-  traceEntry(kCoreTrace, kSource, line::kTabCountEntry, "TabCountCallback");
-  if (count < 1 || values == nullptr) return 0;
-  static_cast<Json::Value*>(arg)->append(textOf(values[0]));
-  return 0;
-}
-
-int noteTable(void* arg, int count, char** values, char** columns) {
-  traceEntry(kCoreTrace, kSource, line::kIsTabExistEntry, "IsTabExistCallback");
-  dumpRow(line::kIsTabExistDump, count, values, columns);
-  (*static_cast<Json::Value*>(arg))[names::kExist] = true;
-  return 0;
-}
-
-int appendRow(void* arg, int count, char** values, char** columns) {
-  traceEntry(kCoreTrace, kSource, line::kTabGetEntry, "TabGetCallback");
-  dumpRow(line::kTabGetDump, count, values, columns);
-
-  Json::Value row = rowDocument(count, values, columns);
-  if (!decryptSecrets(kSource, row)) {
-    syslog(LOG_ERR, "%s:%d Decrypt data failed", kSource, line::kDecryptDataFailed);
-  }
-  static_cast<Json::Value*>(arg)->append(std::move(row));
-  return 0;
-}
-
-void logUnexpected(const char* source, int number, const char* what) {
-  syslog(LOG_ERR, "%s:%d Unexpected failure[%s]", source, number, what);
-}
-
-/// The end of a static operation that has no object to keep an error.
-int failWithoutObject(int number) noexcept {
-  try {
-    throw;
-  } catch (const std::exception& thrown) {
-    logUnexpected(kSource, number, thrown.what());
-  } catch (...) {
-    logUnexpected(kSource, number, "unknown");
-  }
-  return 0;
-}
-
-/// A public callback, and what stands behind it.
-struct OwnCallback {
-  OAUTHDBBasic::RowCallback callback;
-  OAUTHDBBasic::RowCallback body;
-  Json::ValueType fills;  // the document that it adds to, when that is not null
-  int threwLine;
-};
-
-constexpr std::array<OwnCallback, 3> kOwnCallbacks{{
-    {OAUTHDBBasic::TabCountCallback, appendCount, Json::arrayValue, line::kTabCountThrew},
-    {OAUTHDBBasic::IsTabExistCallback, noteTable, Json::objectValue, line::kIsTabExistThrew},
-    {OAUTHDBBasic::TabGetCallback, appendRow, Json::arrayValue, line::kTabGetThrew},
-}};
-
-bool canFill(const OwnCallback& own, const void* arg) {
-  const auto* const doc = static_cast<const Json::Value*>(arg);
-  return doc != nullptr && (doc->isNull() || doc->type() == own.fills);
-}
-
-/// Null for a callback of the caller's own.
-const OwnCallback* findOwn(OAUTHDBBasic::RowCallback callback) {
-  const auto* const found =
-      std::find_if(kOwnCallbacks.begin(), kOwnCallbacks.end(),
-                   [callback](const OwnCallback& own) { return own.callback == callback; });
-  return found != kOwnCallbacks.end() ? found : nullptr;
-}
-
-/// A public callback as somebody calls it by himself.
-int runAlone(const OwnCallback& own, void* arg, int count, char** values, char** columns) try {
-  return canFill(own, arg) ? own.body(arg, count, values, columns) : 0;
-} catch (...) {
-  return failWithoutObject(own.threwLine);
 }
 
 }  // namespace
@@ -276,18 +184,6 @@ int OAUTHDBBasic::Execute(const std::string& sql, RowCallback callback, Json::Va
 
 bool OAUTHDBBasic::InTransaction() const {
   return db_ != nullptr && sqlite3_get_autocommit(db_) == 0;
-}
-
-int OAUTHDBBasic::TabCountCallback(void* arg, int count, char** values, char** columns) {
-  return runAlone(kOwnCallbacks[0], arg, count, values, columns);
-}
-
-int OAUTHDBBasic::IsTabExistCallback(void* arg, int count, char** values, char** columns) {
-  return runAlone(kOwnCallbacks[1], arg, count, values, columns);
-}
-
-int OAUTHDBBasic::TabGetCallback(void* arg, int count, char** values, char** columns) {
-  return runAlone(kOwnCallbacks[2], arg, count, values, columns);
 }
 
 // Schema ----------------------------------------------------------------------

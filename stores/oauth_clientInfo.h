@@ -33,7 +33,8 @@ class OAUTHDBClientInfo : public OAUTHDBBasic {
   /// "Application registed[<display_name>]", on a connection of its own, or, if
   /// this object works on another's, on that one and in its transaction. (So an
   /// object that has a connection of its own and a transaction open registers
-  /// without an entry: the entry waits for the transaction's lock.) Lengths in bytes:
+  /// without an entry: the entry waits for the transaction's lock, in vain.)
+  /// Lengths in bytes:
   ///   client_id      64, not yet registered
   ///   client_secret  64
   ///   redirect_uri   3 to 2048 after one leading "https://" or "http://" is
@@ -43,7 +44,9 @@ class OAUTHDBClientInfo : public OAUTHDBBasic {
   ///   enable         "1" or "0"
   /// `out` receives "client_id" and "client_secret" as soon as the arguments
   /// are accepted, so also when the insert then fails; nothing before that.
-  /// Non-zero when the row was stored, whatever became of the audit entry.
+  /// Non-zero when the row was stored, whatever became of the audit entry. (An
+  /// entry that ends the caller's transaction takes the row with it and leaves
+  /// no code here: Transaction::IsLost says so.)
   /// 0: -5 "ClientInfo Table is full" when names::kClientInfoMax rows are
   /// there, whatever the arguments; -2 "Bad parameters"; else as DBAdd.
   int Add(const std::string& client_id, const std::string& client_secret,

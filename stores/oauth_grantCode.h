@@ -92,7 +92,9 @@ class OAUTHDBGrantCode : public OAUTHDBBasic {
   /// could not be read; else 0, without an error code when another process had
   /// removed a row first. Several removals are one transaction: when it cannot
   /// be committed, 0 with SQLite's code, and every row is back. When it cannot
-  /// be begun, they run one by one.
+  /// be begun because another process held the lock for the whole wait, 0 with
+  /// 5 "database is locked", and nothing is removed; for another reason (a
+  /// transaction of the caller's, say), they run one by one.
   int Purge();
 
   // Look-ups ----------------------------------------------------------------

@@ -15,6 +15,7 @@
 #include "examples/cgi/settings.h"
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_log.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -23,7 +24,7 @@ namespace {
 using namespace service;
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxUser = 256;
+constexpr std::size_t kMaxUser = bounds::kUsername.max;
 constexpr std::size_t kChallengeBytes = 43;
 
 [[noreturn]] void refuseWithPage(int status, const std::string& why) {

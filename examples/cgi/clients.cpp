@@ -5,15 +5,13 @@
 #include "examples/cgi/answer.h"
 #include "examples/cgi/encoding.h"
 #include "stores/oauth_clientInfo.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 
 namespace service {
 namespace {
 
 using namespace KELDOAUTHSERVER;
-
-constexpr std::size_t kIdentifierBytes = 64;
-constexpr std::size_t kMaxName = 64;
 
 struct Credentials {
   std::string identifier;
@@ -72,7 +70,10 @@ std::string undoubled(const Json::Value& text) {
 
 std::string faultOfName(const std::string& name) {
   const auto isControl = [](unsigned char byte) { return byte < ' ' || byte == 0x7f; };
-  if (name.size() > kMaxName) return "The name is too long: 64 bytes at most.";
+  constexpr std::size_t kMost = bounds::kDisplayName.max;
+  if (name.size() > kMost) {
+    return "The name is too long: " + std::to_string(kMost) + " bytes at most.";
+  }
   if (name.find_first_not_of(' ') == std::string::npos) return "The application needs a name.";
   if (!isUtf8(name) || std::any_of(name.begin(), name.end(), isControl)) {
     return "The name has characters that cannot be shown.";
@@ -88,7 +89,7 @@ Client clientOf(const Json::Value& row) {
 }
 
 std::optional<Client> findClient(const std::string& identifier) {
-  if (identifier.size() != kIdentifierBytes) return std::nullopt;
+  if (identifier.size() != kIdentifierLength) return std::nullopt;
   OAUTHDBClientInfo clients(names::kClientInfoTable);
   Json::Value rows;
   if (clients.Get(identifier, &rows) == 0) throw Unavailable{};

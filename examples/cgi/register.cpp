@@ -16,6 +16,7 @@
 #include "examples/cgi/scopes.h"
 #include "examples/cgi/settings.h"
 #include "stores/oauth_clientInfo.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 
 namespace {
@@ -23,7 +24,7 @@ namespace {
 using namespace service;
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxRedirects = 2048;
+constexpr std::size_t kMaxRedirects = bounds::kRedirectUri.max;
 constexpr char kDefaultScope[] = "profile";
 constexpr char kDefaultMethod[] = "client_secret_basic";
 

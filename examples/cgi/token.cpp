@@ -12,6 +12,7 @@
 #include "examples/cgi/tokens.h"
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_token.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -20,7 +21,6 @@ namespace {
 using namespace service;
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kCodeBytes = 64;
 constexpr std::size_t kLeastVerifier = 43;
 constexpr std::size_t kMostVerifier = 128;
 /// Two requests with one code or refresh token so close together are a client
@@ -67,7 +67,7 @@ struct Code {
 };
 
 std::optional<Code> findCode(const std::string& text) {
-  if (text.size() != kCodeBytes) return std::nullopt;
+  if (text.size() != kIdentifierLength) return std::nullopt;
   OAUTHDBGrantCode codes(names::kGrantCodeTable);
   Json::Value rows;
   if (codes.Get(text, &rows) == 0) throw Unavailable{};

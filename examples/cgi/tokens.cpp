@@ -9,6 +9,7 @@
 #include "examples/cgi/clients.h"
 #include "examples/cgi/encoding.h"
 #include "stores/oauth_token.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -17,7 +18,6 @@ namespace {
 
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kTokenBytes = 64;
 /// 60 random bits name a family; the other three quarters are the secret.
 constexpr std::size_t kFamilyBytes = 16;
 
@@ -25,7 +25,7 @@ using LookUp = bool (OAUTHDBToken::*)(const std::string&, Json::Value*);
 
 std::optional<Token> find(LookUp lookUp, const std::string& text) {
   // The store would call another length a failure; here it is an unknown token.
-  if (text.size() != kTokenBytes) return std::nullopt;
+  if (text.size() != kIdentifierLength) return std::nullopt;
   OAUTHDBToken tokens(names::kTokenTable);
   Json::Value rows;
   if (!(tokens.*lookUp)(text, &rows)) throw Unavailable{};
@@ -83,7 +83,7 @@ std::optional<Token> findRefreshToken(const std::string& text) {
 }
 
 std::optional<Token> verifiedToken(const std::string& text) {
-  if (text.size() != kTokenBytes) return std::nullopt;
+  if (text.size() != kIdentifierLength) return std::nullopt;
   OAUTHDBToken tokens(names::kTokenTable);
   Json::Value holder;
   if (!tokens.Verify(text, holder)) {
@@ -108,8 +108,8 @@ bool removeToken(const Token& token) {
 }
 
 Pair nextPair(const std::string& refresh) {
-  return {getRandomStr(kTokenBytes),
-          refresh.substr(0, kFamilyBytes) + getRandomStr(kTokenBytes).substr(kFamilyBytes)};
+  return {getRandomStr(kIdentifierLength),
+          refresh.substr(0, kFamilyBytes) + getRandomStr(kIdentifierLength).substr(kFamilyBytes)};
 }
 
 void removeTokensOfCode(const std::string& clientId, const std::string& codeDigest,
@@ -122,7 +122,7 @@ void removeTokensOfCode(const std::string& clientId, const std::string& codeDige
 
 void removeTokensOfFamily(const std::string& clientId, const std::string& refresh,
                           long long before) {
-  if (refresh.size() != kTokenBytes) return;
+  if (refresh.size() != kIdentifierLength) return;
   removeTokens([&](const Token& token) {
     return token.clientId == clientId && token.state.issued < before &&
            token.refresh.compare(0, kFamilyBytes, refresh, 0, kFamilyBytes) == 0;

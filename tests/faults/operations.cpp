@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "core/oauth_errors.h"
+#include "core/transaction.h"
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_log.h"
@@ -290,6 +291,25 @@ std::vector<Operation> tokenChanges() {
   };
 }
 
+/// A code for tokens, as one, on the connection of the codes.
+std::vector<Operation> transactions() {
+  using Store = OAUTHDBGrantCode;
+  const auto redeem = [](Store& codes) {
+    OAUTHDBToken tokens(tableOf<OAUTHDBToken>(), codes);
+    Transaction transaction(codes);
+    Json::Value out;
+    if (!transaction.Begin() || codes.Del(2) == 0) return false;
+    if (tokens.Add(with().user, with().a, with().scope, with().eighth, with().ninth, with().expiry,
+                   with().flow, with().state, with().ip4, out)) {
+      return transaction.Commit();
+    }
+    codes.SetErrCode(tokens.GetErrCode());
+    codes.SetErrMsg(tokens.GetErrMsg());
+    return false;
+  };
+  return {change<Store>("RedeemCode", 1, redeem)};
+}
+
 std::vector<Operation> tokenLookUps() {
   using Store = OAUTHDBToken;
   const auto byAccess = [](Store& store, Json::Value& rows) {
@@ -428,8 +448,9 @@ bool isReady(OAUTHDBBasic& store) {
 
 std::vector<Operation> everyOperation() {
   std::vector<Operation> all;
-  for (auto part : {constructions, coreOperations, registrations, clientChanges, clientLookUps,
-                    codeChanges, codeLookUps, tokenChanges, tokenLookUps, logOperations}) {
+  for (auto part :
+       {constructions, coreOperations, registrations, clientChanges, clientLookUps, codeChanges,
+        codeLookUps, tokenChanges, tokenLookUps, transactions, logOperations}) {
     for (Operation& operation : part()) all.push_back(std::move(operation));
   }
   return all;

@@ -311,8 +311,41 @@ std::string inserted(const Json::Value& row) {
   return " (" + columns + ") VALUES(" + values + ")";
 }
 
+/// No statement runs with this text.
+void expectRefused(Case& test, const std::string& text) {
+  for (const std::string head : {"DELETE FROM ", "UPDATE ", "INSERT INTO ", "SELECT * FROM "}) {
+    for (const char* verb : {"", " WHERE ", " SET "}) {
+      const std::string statement = head + test.table + verb + text + ";";
+      expect(test.store.DBCmd(statement, nullptr, nullptr) == 0, "a foreign clause", statement);
+    }
+  }
+}
+
+/// Of a document that no store builds. An empty array is an empty condition.
+void checkForeignClauses(Case& test) {
+  const auto isEmptyArray = [](const Json::Value& value) {
+    return value.isArray() && value.empty();
+  };
+  Json::Value pairs = test.document;
+  nameColumns(pairs);
+  if (!isPairs(pairs)) expectRefused(test, test.store.GetInsertParam(pairs));
+  if (!isPairs(pairs) && !isEmptyArray(pairs)) {
+    expectRefused(test, test.store.ConcateParam(pairs, ", "));
+    expectRefused(test, test.store.GetConditionParam(pairs));
+  }
+
+  Json::Value request = test.document;
+  nameEverything(request);
+  const std::string update = test.store.GetUpdateParam(request);
+  if (!request.isNull() && !request.isObject()) return expectRefused(test, update);
+  const Json::Value& condition = at(request, names::kCondition);
+  const bool isForeign = !isPairs(at(request, names::kModified)) || !isPairs(condition);
+  if (isForeign && !isEmptyArray(condition)) expectRefused(test, update);
+}
+
 /// Whatever the shape, a text comes out; of the stores' own shapes, this one.
 void checkClauses(Case& test) {
+  checkForeignClauses(test);
   const Json::Value document = test.document;
   const std::string row = test.store.GetInsertParam(document);
   const std::string list = test.store.ConcateParam(document, ", ");

@@ -338,6 +338,36 @@ TEST_F(ConstructionMemoryTest, OverAnExistingFile) {
   failEach<OAUTHDBLog>(names::kLogTable, removeNothing);
 }
 
+/// The copy of the name is all that it needs memory for.
+template <typename Store>
+void lendWithoutMemory(OAUTHDBBasic& owner) {
+  const std::string table = "a_table_name_of_more_than_fifteen_bytes";
+  std::optional<Store> lent;
+  const int failures = failEachAllocation(
+      [&] { lent.emplace(table, owner); },
+      [&](int nth) {
+        EXPECT_EQ(lent->DBCmd("SELECT 1;", nullptr, nullptr), 0) << nth;
+        EXPECT_EQ(lent->GetErrCode(), kNoMemory) << nth;
+        EXPECT_EQ(lent->GetErrMsg(), "out of memory") << nth;
+        EXPECT_EQ(SystemLog::count(kUnexpected), 1) << nth;
+        SystemLog::clear();
+      });
+  EXPECT_EQ(failures, 1);
+  EXPECT_EQ(lent->GetTabName(), table);
+  EXPECT_EQ(lent->GetErrCode(), 255);
+  EXPECT_NE(lent->DBCmd("SELECT 1;", nullptr, nullptr), 0);
+}
+
+TEST_F(ConstructionMemoryTest, OnAnothersConnectionLeavesTheOwnerAlone) {
+  OAUTHDBToken owner(names::kTokenTable);
+  lendWithoutMemory<OAUTHDBClientInfo>(owner);
+  lendWithoutMemory<OAUTHDBGrantCode>(owner);
+  lendWithoutMemory<OAUTHDBToken>(owner);
+  lendWithoutMemory<OAUTHDBLog>(owner);
+  EXPECT_EQ(owner.GetErrCode(), 255);
+  EXPECT_NE(owner.DBCmd("SELECT 1;", nullptr, nullptr), 0);
+}
+
 TEST_F(ConstructionMemoryTest, OverANewFile) {
   failEach<OAUTHDBToken>(names::kTokenTable, [] { std::remove(kDatabase); });
 }

@@ -10,6 +10,7 @@
 #include "tools/keldoauth/storage/bounds.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
 #include "tools/keldoauth/storage/stores.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -17,8 +18,6 @@ using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
-
-constexpr unsigned int kGeneratedLength = 64;
 
 constexpr Columns kListColumns{
     {"ID", names::kId},
@@ -68,10 +67,10 @@ Json::Value storedRow(Clients& clients, const Json::Value& credentials) {
 }
 
 Answer add(const Arguments& arguments) {
-  const std::string identifier = arguments.clientId.value_or(getRandomStr(kGeneratedLength));
+  const std::string identifier = arguments.clientId.value_or(getRandomStr(kIdentifierLength));
   const std::string secret = arguments.secretFile
                                  ? readSecret(*arguments.secretFile, "Client secret")
-                                 : getRandomStr(kGeneratedLength);
+                                 : getRandomStr(kIdentifierLength);
   Clients clients;
   requireKeyOf(clients);
   Json::Value credentials;

@@ -9,6 +9,7 @@
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/bounds.h"
 #include "tools/keldoauth/storage/stores.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -16,8 +17,6 @@ using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
-
-constexpr unsigned int kCodeLength = 64;
 
 constexpr Columns kListColumns{
     {"ID", names::kId},
@@ -57,7 +56,7 @@ bool addTo(Codes& codes, const Arguments& given, const std::string& client, Json
   if (!given.expiresIn) {
     return codes.Add(*given.username, client, *given.scope, *given.state, ip, issued) != 0;
   }
-  return codes.Add(*given.username, client, *given.scope, getRandomStr(kCodeLength),
+  return codes.Add(*given.username, client, *given.scope, getRandomStr(kIdentifierLength),
                    expiryIn(*given.expiresIn), *given.state, ip, issued) != 0;
 }
 

@@ -4,6 +4,7 @@
 #include "tools/keldoauth/console/terminal.h"
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/bounds.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -12,18 +13,16 @@ using namespace KELDOAUTHSERVER;
 namespace tool {
 namespace {
 
-constexpr unsigned int kTokenLength = 64;
-
 /// The new row. Without a lifetime the one in the settings applies.
 Answer issueTo(Tokens& tokens, const Grant& grant, const std::string& flowType,
                const std::string& ip, const Arguments::Number& lifetime) {
   const auto& [username, client, scope, state] = grant;
   Json::Value pair;
-  const bool isStored =
-      lifetime
-          ? tokens.Add(username, client, scope, getRandomStr(kTokenLength),
-                       getRandomStr(kTokenLength), expiryIn(*lifetime), flowType, state, ip, pair)
-          : tokens.Add(username, client, scope, flowType, state, ip, pair) != 0;
+  const bool isStored = lifetime
+                            ? tokens.Add(username, client, scope, getRandomStr(kIdentifierLength),
+                                         getRandomStr(kIdentifierLength), expiryIn(*lifetime),
+                                         flowType, state, ip, pair)
+                            : tokens.Add(username, client, scope, flowType, state, ip, pair) != 0;
   if (!isStored) throw refused(tokens, faultInToken(grant, flowType, ip));
 
   Json::Value rows(Json::arrayValue);

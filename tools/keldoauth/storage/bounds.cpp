@@ -12,7 +12,7 @@ std::string accepted(const Bounds& bounds) {
 
 std::string outOfBounds(std::initializer_list<Measured> values) {
   for (const Measured& measured : values) {
-    const std::size_t length = measured.value.size();
+    const auto length = static_cast<long long>(measured.value.size());
     if (length >= measured.bounds.min && length <= measured.bounds.max) continue;
     return std::string(measured.name) + ": " + accepted(measured.bounds) + ", not " +
            std::to_string(length);

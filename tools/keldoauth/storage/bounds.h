@@ -1,29 +1,18 @@
-// The lengths that the stores accept, to say which value a refusal is about:
-// the library itself only says "Bad parameters".
+// Which value is out of the lengths that the stores accept: the library itself
+// only says "Bad parameters".
 
 #ifndef KELDOAUTH_TOOLS_BOUNDS_H
 #define KELDOAUTH_TOOLS_BOUNDS_H
 
-#include <cstddef>
 #include <initializer_list>
 #include <string>
 
+#include "utils/oauth_bounds.h"
+
 namespace tool {
 
-struct Bounds {
-  std::size_t min;
-  std::size_t max;
-};
-
-namespace bounds {
-inline constexpr Bounds kIdentifier{64, 64};
-inline constexpr Bounds kRedirectUri{3, 2048};
-inline constexpr Bounds kScope{1, 2048};
-inline constexpr Bounds kDisplayName{1, 64};
-inline constexpr Bounds kUsername{1, 256};
-inline constexpr Bounds kState{1, 2048};
-inline constexpr Bounds kFlowType{1, 32};
-}  // namespace bounds
+using KELDOAUTHSERVER::Bounds;
+namespace bounds = KELDOAUTHSERVER::bounds;
 
 /// A value and what the user calls it.
 struct Measured {

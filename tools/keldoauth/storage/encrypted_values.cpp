@@ -5,6 +5,7 @@
 #include "tools/keldoauth/console/failure.h"
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/stores.h"
+#include "utils/oauth_bounds.h"
 
 using namespace KELDOAUTHSERVER;
 
@@ -75,8 +76,7 @@ void requireKeyOf(OAUTHDBBasic& clients) {
 }
 
 bool isDecrypted(const std::string& text) {
-  constexpr std::size_t kIdentifierBytes = 64;
-  return text.size() == kIdentifierBytes || withoutDoubledQuotes(text).size() == kIdentifierBytes;
+  return text.size() == kIdentifierLength || withoutDoubledQuotes(text).size() == kIdentifierLength;
 }
 
 }  // namespace tool

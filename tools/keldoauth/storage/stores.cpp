@@ -5,14 +5,13 @@
 #include <system_error>
 
 #include "core/oauth_errors.h"
+#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
-
-constexpr std::size_t kIdentifierBytes = 64;
 
 std::optional<long long> rowId(const std::string& text) {
   long long id = 0;
@@ -81,7 +80,7 @@ void Transaction::commit() {
 }
 
 Json::Value requireClient(Clients& clients, const std::string& text) {
-  if (text.size() == kIdentifierBytes) return rowByIdentifier(clients, text);
+  if (text.size() == kIdentifierLength) return rowByIdentifier(clients, text);
   if (const auto id = rowId(text)) return rowById(clients, *id);
   throw Failure(kUsage, "CLIENT is a row id or an identifier of 64 characters");
 }
@@ -92,7 +91,7 @@ Json::Value requireClient(const std::string& text) {
 }
 
 std::string clientIdentifier(const std::string& text) {
-  if (text.size() == kIdentifierBytes) return text;
+  if (text.size() == kIdentifierLength) return text;
   return requireClient(text)[names::kClientId].asString();
 }
 
