@@ -3,23 +3,18 @@
 #include <fcntl.h>
 #include <json/reader.h>
 #include <json/value.h>
-#include <sys/random.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
 #include <cstddef>
-#include <cstdint>
 #include <cstring>
 #include <exception>
 #include <memory>
-#include <random>
 #include <string>
-#include <system_error>
 
 #include "platform/keldcgi.h"
 #include "utils/diagnostics.h"
+#include "utils/file.h"
 #include "utils/oauth_names.h"
 #include "utils/sql_text.h"
 #include "utils/wide_time.h"
@@ -44,36 +39,6 @@ thread_local int debugFlag = kNotLookedUp;
 thread_local int logLevel = kNotLookedUp;
 
 constexpr std::size_t kAddressBytes = 1024;
-
-/// An open file that closes itself.
-class File {
- public:
-  File(const char* path, int flags) : descriptor_(open(path, flags | O_CLOEXEC)) {}
-  ~File() {
-    if (isOpen()) close(descriptor_);
-  }
-  File(const File&) = delete;
-  File& operator=(const File&) = delete;
-
-  [[nodiscard]] bool isOpen() const { return descriptor_ >= 0; }
-
-  [[nodiscard]] bool isRegular() const {
-    struct stat file {};
-    return fstat(descriptor_, &file) == 0 && S_ISREG(file.st_mode);
-  }
-
-  /// One read, taken up again when a signal interrupts it.
-  ssize_t readSome(char* buffer, std::size_t size) const {
-    ssize_t got = 0;
-    do {
-      got = read(descriptor_, buffer, size);
-    } while (got < 0 && errno == EINTR);
-    return got;
-  }
-
- private:
-  int descriptor_;
-};
 
 // Settings ------------------------------------------------------------------
 
@@ -131,62 +96,6 @@ std::string copyFormatted(const SqliteText& text) {
     return {};
   }
   return text.get();
-}
-
-// Random text ---------------------------------------------------------------
-
-constexpr std::size_t kUuidBytes = 16;
-
-[[noreturn]] void throwNoRandomness(int error) {
-  throw std::system_error(error, std::generic_category(), "system random source");
-}
-
-/// One call to the kernel; where it is not to be had, there is the device.
-void fillFromSystem(char* out, std::size_t size) {
-  for (std::size_t filled = 0; filled < size;) {
-    ssize_t got = getrandom(out + filled, size - filled, 0);
-    if (got < 0 && (errno == ENOSYS || errno == EPERM)) {
-      const File device("/dev/urandom", O_RDONLY);
-      if (!device.isOpen()) throwNoRandomness(errno);
-      got = device.readSome(out + filled, size - filled);
-    }
-    if (got < 0 && errno == EINTR) continue;
-    if (got < 0) throwNoRandomness(errno);
-    if (got == 0) throwNoRandomness(EIO);
-    filled += static_cast<std::size_t>(got);
-  }
-}
-
-/// Seeds every word of a generator's state from the system.
-struct SystemSeed {
-  using result_type = std::uint_least32_t;
-
-  void generate(result_type* first, result_type* last) const {
-    fillFromSystem(reinterpret_cast<char*>(first),
-                   static_cast<std::size_t>(last - first) * sizeof(result_type));
-  }
-};
-
-std::array<std::uint8_t, kUuidBytes> drawUuid() {
-  SystemSeed seed;
-  std::mt19937 generator(seed);
-
-  std::array<std::uint8_t, kUuidBytes> uuid{};
-  for (std::size_t i = 0; i < uuid.size(); i += 4) {
-    const std::uint_fast32_t word = generator();
-    for (std::size_t byte = 0; byte < 4; ++byte) {
-      uuid[i + byte] = static_cast<std::uint8_t>(word >> (8 * byte));
-    }
-  }
-  uuid[8] = static_cast<std::uint8_t>((uuid[8] & 0xBFU) | 0x80U);  // variant of RFC 4122
-  uuid[6] = static_cast<std::uint8_t>((uuid[6] & 0x4FU) | 0x40U);  // version 4
-  return uuid;
-}
-
-void appendHex(std::string& text, std::uint8_t byte) {
-  constexpr char kDigits[] = "0123456789abcdef";
-  text += kDigits[byte >> 4U];
-  text += kDigits[byte & 0x0FU];
 }
 
 }  // namespace
@@ -262,14 +171,6 @@ std::string getRemoteIP() try {
   return {address.data(), strnlen(address.data(), address.size())};
 } catch (const std::exception&) {
   return {};
-}
-
-std::string getRandomStr(unsigned int length) {
-  std::string text;
-  while (text.size() < length) {
-    for (const std::uint8_t byte : drawUuid()) appendHex(text, byte);
-  }
-  return text;
 }
 
 }  // namespace KELDOAUTHSERVER

@@ -3,9 +3,13 @@
 
 #include <algorithm>
 #include <array>
+#include <boost/random/mersenne_twister.hpp>
 #include <cerrno>
+#include <cstddef>
 #include <cstdint>
 #include <cstdio>
+#include <cstring>
+#include <functional>
 #include <new>
 #include <random>
 #include <set>
@@ -170,17 +174,34 @@ TEST_F(RandomTest, EveryPieceTakesAWholeStateInOneCall) {
   EXPECT_EQ(Kernel::opened(Kernel::kRandomDevice), 0);
 }
 
-/// What the system delivers is the state of a Mersenne Twister, whose first four
-/// words are the bytes of the UUID, least significant first.
-TEST_F(RandomTest, PieceIsDrawnFromAGeneratorInTheStateThatWasRead) {
-  systemDelivers(0x5a);
-  struct Words {
-    using result_type = std::uint_least32_t;
-    static void generate(result_type* first, result_type* last) {
-      std::fill(first, last, 0x5a5a5a5aU);
-    }
-  } words;
-  std::mt19937 generator(words);
+/// A state of the generator, as the system delivers it.
+using State = std::array<std::uint32_t, kStateBytes / 4>;
+
+void systemDeliversState(const State& state) {
+  Kernel::scriptGetrandom([&state](char* buffer, std::size_t size) -> ssize_t {
+    if (size != sizeof state) return 0;
+    std::memcpy(buffer, state.data(), size);
+    return static_cast<ssize_t>(size);
+  });
+}
+
+/// Hands a generator its state, word by word.
+struct Seed {
+  using result_type = std::uint_least32_t;
+  const State& state;
+  void generate(result_type* first, result_type* last) const {
+    ASSERT_EQ(last - first, static_cast<std::ptrdiff_t>(state.size()));
+    std::copy(state.begin(), state.end(), first);
+  }
+};
+
+/// The piece that a whole Mersenne Twister, seeded with `state`, gives: the bytes
+/// of its first four words, least significant first.
+template <typename Generator>
+std::string pieceOf(const State& state) {
+  Seed seed{state};
+  Generator generator;
+  generator.seed(seed);
   std::array<std::uint8_t, 16> bytes{};
   for (std::size_t word = 0; word < 4; ++word) {
     const auto drawn = static_cast<std::uint32_t>(generator());
@@ -195,22 +216,67 @@ TEST_F(RandomTest, PieceIsDrawnFromAGeneratorInTheStateThatWasRead) {
     std::snprintf(hex.data(), hex.size(), "%02x", byte);
     piece += hex.data();
   }
-  EXPECT_EQ(getRandomStr(32), piece);
-  EXPECT_EQ(getRandomStr(64), piece + piece);
+  return piece;
 }
 
-TEST_F(RandomTest, WordsOfTheWholeStateCount) {
-  systemDelivers(0);
-  const std::string zeros = getRandomStr(32);
-  // The four draws mix these words of the state, near its head and past its middle.
-  for (const std::size_t word : {1U, 2U, 3U, 4U, 397U, 398U, 399U, 400U}) {
+TEST_F(RandomTest, PieceIsWhatTheStandardGeneratorsGiveForThatState) {
+  std::mt19937 random(20261121);
+  State state{};
+  systemDeliversState(state);
+  for (int seed = 0; seed < 20000; ++seed) {
+    std::generate(state.begin(), state.end(), std::ref(random));
+    const std::string piece = getRandomStr(32);
+    ASSERT_EQ(piece, pieceOf<std::mt19937>(state)) << "seed " << seed;
+    ASSERT_EQ(piece, pieceOf<boost::random::mt19937>(state)) << "seed " << seed;
+  }
+}
+
+/// The top bit of the first word is the only one of that word which counts.
+TEST_F(RandomTest, StateOfZerosIsMendedAsTheStandardGeneratorsMendIt) {
+  State state{};
+  systemDeliversState(state);
+  for (const std::uint32_t first : {0U, 1U, 0x7fffffffU, 0x80000000U, 0xffffffffU}) {
+    state[0] = first;
+    EXPECT_EQ(getRandomStr(32), pieceOf<std::mt19937>(state)) << first;
+    EXPECT_EQ(getRandomStr(32), pieceOf<boost::random::mt19937>(state)) << first;
+  }
+}
+
+/// A lone bit, wherever it stands, keeps the state from counting as zeros.
+TEST_F(RandomTest, EveryWordOfTheStateIsLookedAt) {
+  for (std::size_t word = 0; word < kStateBytes / 4; ++word) {
+    State state{};
+    state[word] = 0x80000000U;
+    systemDeliversState(state);
+    EXPECT_EQ(getRandomStr(32), pieceOf<std::mt19937>(state)) << "word " << word;
+  }
+}
+
+TEST_F(RandomTest, EveryPieceHasAStateOfItsOwn) {
+  std::array<State, 2> states{};
+  states[0].fill(0x5a5a5a5aU);
+  states[1].fill(0xa5a5a5a5U);
+  std::size_t call = 0;
+  Kernel::scriptGetrandom([&](char* buffer, std::size_t size) {
+    std::memcpy(buffer, states.at(call++).data(), size);
+    return static_cast<ssize_t>(size);
+  });
+  EXPECT_EQ(getRandomStr(64), pieceOf<std::mt19937>(states[0]) + pieceOf<std::mt19937>(states[1]));
+}
+
+TEST_F(RandomTest, FourDrawsMixNineWordsOfTheState) {
+  systemDelivers(0x11);
+  const std::string unchanged = getRandomStr(32);
+  std::set<std::size_t> counting;
+  for (std::size_t word = 0; word < kStateBytes / 4; ++word) {
     Kernel::scriptGetrandom([word](char* buffer, std::size_t size) {
-      std::fill_n(buffer, size, '\0');
-      buffer[4 * word] = 0x11;
+      std::fill_n(buffer, size, 0x11);
+      std::fill_n(buffer + 4 * word, 4, static_cast<char>(0xee));
       return static_cast<ssize_t>(size);
     });
-    EXPECT_NE(getRandomStr(32), zeros) << "word " << word;
+    if (getRandomStr(32) != unchanged) counting.insert(word);
   }
+  EXPECT_THAT(counting, ElementsAre(0, 1, 2, 3, 4, 397, 398, 399, 400));
 }
 
 TEST_F(RandomTest, ShortAnswersAreContinued) {
