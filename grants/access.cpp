@@ -1,5 +1,6 @@
 #include "grants/access.h"
 
+#include <cctype>
 #include <map>
 #include <utility>
 
@@ -104,18 +105,22 @@ struct Conditions {
 };
 
 constexpr char kEveryRow[] = "1";
+constexpr char kNoRow[] = "0";
 
 std::string isIts(const ApplicationId& application) {
   return std::string(names::kClientId) + "=" + rows::literal(Store::sealed(application.text()));
 }
 
 Conditions conditionsOf(const std::optional<User>& user,
-                        const std::optional<ApplicationId>& application) {
-  Conditions conditions{kEveryRow, kEveryRow};
+                        const std::optional<ApplicationId>& application, Rows rows = Rows::kAll) {
+  Conditions conditions{rows == Rows::kTokens ? kNoRow : kEveryRow,
+                        rows == Rows::kCodes ? kNoRow : kEveryRow};
   if (application) {
     conditions.codes += " AND " + isIts(*application);
     conditions.tokens += " AND " + isIts(*application);
   }
+  // That a code was redeemed is remembered as long as its login lives.
+  if (rows == Rows::kCodes) conditions.codes += " AND NOT " + rows::isSpentCode();
   if (user) {
     const std::string isTheirs =
         " AND " + rows::isOneOf(names::kUsername, rows::spellings(user->text()));
@@ -159,6 +164,17 @@ std::string wordOf(Store& store, const ApplicationId& application) {
   const auto found = rows::findApplication(store, application.text());
   return rows::applicationWord(
       found ? std::optional<ApplicationName>(found->shown.name) : std::nullopt, application.text());
+}
+
+std::string endedWord(Rows rows) {
+  if (rows == Rows::kAll) return "Access ended";
+  return rows == Rows::kCodes ? "Codes ended" : "Tokens ended";
+}
+
+std::string allEndedWord(Rows rows) {
+  std::string word = endedWord(rows);
+  word.front() = static_cast<char>(std::tolower(word.front()));
+  return "All " + word;
 }
 
 /// Whose access ended, for the log: application and user.
@@ -246,27 +262,28 @@ Ended Access::end(const std::vector<AccessHandle>& handles, const Actor& by) {
   return ended;
 }
 
-Ended Access::endUser(const User& user, const Actor& by) {
+Ended Access::endUser(const User& user, const Actor& by, Rows rows) {
   if (!canBe(user, {})) return {0, 0};
-  return endAll(store_, conditionsOf(user, {}),
-                "All access ended" + rows::userWord(user.text()) + rows::actorWord(by));
+  return endAll(store_, conditionsOf(user, {}, rows),
+                allEndedWord(rows) + rows::userWord(user.text()) + rows::actorWord(by));
 }
 
-Ended Access::endUserWith(const User& user, const ApplicationId& application, const Actor& by) {
+Ended Access::endUserWith(const User& user, const ApplicationId& application, const Actor& by,
+                          Rows rows) {
   if (!canBe(user, application)) return {0, 0};
-  return endAll(store_, conditionsOf(user, application),
-                "Access ended" + wordOf(store_, application) + rows::userWord(user.text()) +
+  return endAll(store_, conditionsOf(user, application, rows),
+                endedWord(rows) + wordOf(store_, application) + rows::userWord(user.text()) +
                     rows::actorWord(by));
 }
 
-Ended Access::endApplication(const ApplicationId& application, const Actor& by) {
+Ended Access::endApplication(const ApplicationId& application, const Actor& by, Rows rows) {
   if (!canBe({}, application)) return {0, 0};
-  return endAll(store_, conditionsOf({}, application),
-                "All access ended" + wordOf(store_, application) + rows::actorWord(by));
+  return endAll(store_, conditionsOf({}, application, rows),
+                allEndedWord(rows) + wordOf(store_, application) + rows::actorWord(by));
 }
 
-Ended Access::endEverything(const Actor& by) {
-  return endAll(store_, conditionsOf({}, {}), "All access ended" + rows::actorWord(by));
+Ended Access::endEverything(const Actor& by, Rows rows) {
+  return endAll(store_, conditionsOf({}, {}, rows), allEndedWord(rows) + rows::actorWord(by));
 }
 
 }  // namespace KELDOAUTHSERVER::grants

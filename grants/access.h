@@ -57,6 +57,10 @@ struct AccessFilter {
   bool withSpent = false;  // also codes that were redeemed
 };
 
+/// Which of the two an operation is about. Codes alone are those that were not
+/// redeemed yet: the others have to be known if they come again.
+enum class Rows { kAll, kCodes, kTokens };
+
 struct Ended {
   int codes;   // that were not redeemed yet
   int tokens;  // logins and own tokens
@@ -82,13 +86,14 @@ class Access {
   /// Several in one transaction; those that are not as they were are left out.
   Ended end(const std::vector<AccessHandle>& handles, const Actor& by);
 
-  /// Codes included. A user is found in both spellings in which other programs
-  /// may have stored quotes.
-  Ended endUser(const User& user, const Actor& by);
-  Ended endUserWith(const User& user, const ApplicationId& application, const Actor& by);
+  /// Codes included, unless `rows` says otherwise. A user is found in both
+  /// spellings in which other programs may have stored quotes.
+  Ended endUser(const User& user, const Actor& by, Rows rows = Rows::kAll);
+  Ended endUserWith(const User& user, const ApplicationId& application, const Actor& by,
+                    Rows rows = Rows::kAll);
   /// Logins and own tokens; the application stays registered.
-  Ended endApplication(const ApplicationId& application, const Actor& by);
-  Ended endEverything(const Actor& by);
+  Ended endApplication(const ApplicationId& application, const Actor& by, Rows rows = Rows::kAll);
+  Ended endEverything(const Actor& by, Rows rows = Rows::kAll);
 
  private:
   Store& store_;

@@ -17,6 +17,18 @@ std::vector<long long> countIn(Store& store, const char* table, const std::strin
                        "),0) FROM " + table);
 }
 
+struct Conditions {
+  std::string codes;
+  std::string tokens;
+};
+
+Conditions deadFor(long long grace, Rows rows, const Policy& policy) {
+  const long long now = currentTime();
+  const std::string none = "0";
+  return {rows == Rows::kTokens ? none : rows::isDeadCode(now, grace),
+          rows == Rows::kCodes ? none : rows::isDeadToken(policy, now, grace)};
+}
+
 }  // namespace
 
 RoomCount Room::count() const {
@@ -34,19 +46,18 @@ RoomCount Room::count() const {
           {log[0], getTableRowMax(names::kLogMax), 0}};
 }
 
-Purged Room::purgeable(long long grace) const {
-  const long long now = currentTime();
-  return {countIn(store_, names::kGrantCodeTable, rows::isDeadCode(now, grace))[1],
-          countIn(store_, names::kTokenTable, rows::isDeadToken(store_.policy, now, grace))[1]};
+Purged Room::purgeable(long long grace, Rows rows) const {
+  const Conditions dead = deadFor(grace, rows, store_.policy);
+  return {countIn(store_, names::kGrantCodeTable, dead.codes)[1],
+          countIn(store_, names::kTokenTable, dead.tokens)[1]};
 }
 
-Purged Room::purge(long long grace) {
-  const long long now = currentTime();
+Purged Room::purge(long long grace, Rows rows) {
+  const Conditions dead = deadFor(grace, rows, store_.policy);
   Whole whole(store_);
-  const Purged purged{store_.run("DELETE FROM " + std::string(names::kGrantCodeTable) + " WHERE " +
-                                 rows::isDeadCode(now, grace)),
-                      store_.run("DELETE FROM " + std::string(names::kTokenTable) + " WHERE " +
-                                 rows::isDeadToken(store_.policy, now, grace))};
+  const Purged purged{
+      store_.run("DELETE FROM " + std::string(names::kGrantCodeTable) + " WHERE " + dead.codes),
+      store_.run("DELETE FROM " + std::string(names::kTokenTable) + " WHERE " + dead.tokens)};
   whole.commit();
   return purged;
 }

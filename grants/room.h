@@ -3,6 +3,8 @@
 #ifndef KELDOAUTH_GRANTS_ROOM_H
 #define KELDOAUTH_GRANTS_ROOM_H
 
+#include "grants/access.h"
+
 namespace KELDOAUTHSERVER::grants {
 
 class Store;
@@ -34,12 +36,12 @@ class Room {
   [[nodiscard]] RoomCount count() const;
 
   /// What `purge` would remove.
-  [[nodiscard]] Purged purgeable(long long grace = 0) const;
+  [[nodiscard]] Purged purgeable(long long grace = 0, Rows rows = Rows::kAll) const;
 
   /// Removes what has been dead for `grace` seconds (0 or more): codes that
   /// expired, logins that nobody can refresh any more, own tokens that expired.
   /// One transaction, one statement a table, and no audit entry.
-  Purged purge(long long grace = 0);
+  Purged purge(long long grace = 0, Rows rows = Rows::kAll);
 
  private:
   Store& store_;

@@ -224,6 +224,35 @@ TEST_F(AccessTest, AUsersCodesAndLoginsEndTogether) {
   EXPECT_EQ(entries().back(), "All access ended for [alice] by [admin]");
 }
 
+TEST_F(AccessTest, AUsersCodesEndAlone) {
+  issue(frame_);
+  const Pair pair = login(frame_);
+  const Ended ended = access().endUser(kAlice, kAdmin, Rows::kCodes);
+  EXPECT_EQ(ended.codes, 1);
+  EXPECT_EQ(ended.tokens, 0);
+  EXPECT_TRUE(isGood(pair));
+  EXPECT_EQ(sqlText("SELECT COUNT(*) FROM oauth_grantCode WHERE state LIKE 's1%'"), "1");
+  EXPECT_EQ(entries().back(), "All codes ended for [alice] by [admin]");
+}
+
+TEST_F(AccessTest, AUsersLoginsWithAnApplicationEndAlone) {
+  const Code code = issue(frame_);
+  const Pair pair = login(frame_);
+  EXPECT_EQ(access().endUserWith(kAlice, frame_, kAdmin, Rows::kTokens).tokens, 1);
+  EXPECT_FALSE(isGood(pair));
+  EXPECT_TRUE(grants().codes.redeem(redemption(frame_, code)));
+  EXPECT_EQ(entries().back(), "Tokens ended[Photo Frame " + brief() + "] for [alice] by [admin]");
+}
+
+TEST_F(AccessTest, CodesOfAllEndAlone) {
+  issue(frame_);
+  issue(other_, kBob);
+  const Pair pair = login(other_);
+  EXPECT_EQ(access().endApplication(frame_, kAdmin, Rows::kCodes).codes, 1);
+  EXPECT_EQ(access().endEverything(kAdmin, Rows::kCodes).codes, 1);
+  EXPECT_TRUE(isGood(pair));
+}
+
 TEST_F(AccessTest, BothSpellingsOfAUserEnd) {
   const User brien("O'Brien");
   const Pair ours = login(frame_, brien);

@@ -81,6 +81,17 @@ TEST_F(RoomTest, WhatDiedAMomentAgoCanBeKept) {
   EXPECT_EQ(room().purge(kHour).codes, 1);
 }
 
+TEST_F(RoomTest, OneTableCanBePurgedAlone) {
+  issue(frame_);
+  login(frame_);
+  support::Clock::advance(600 + 31 * kDay);
+  EXPECT_EQ(room().purgeable(0, Rows::kTokens).codes, 0);
+  const Purged tokens = room().purge(0, Rows::kTokens);
+  EXPECT_EQ(tokens.codes, 0);
+  EXPECT_EQ(tokens.tokens, 1);
+  EXPECT_EQ(room().purge(0, Rows::kCodes).codes, 1);
+}
+
 TEST_F(RoomTest, AnotherProgramsLoginIsKeptAsLong) {
   Json::Value out;
   KELDOAUTHSERVER::OAUTHDBToken(names::kTokenTable)
