@@ -11,8 +11,6 @@ namespace {
 
 using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxName = bounds::kDisplayName.max;
-
 Answer unauthenticated(const std::string& why) {
   return oauthError(401, grants::codeText(grants::Error::kInvalidClient), why)
       .with("WWW-Authenticate", R"(Basic realm="oauth", charset="UTF-8")");
@@ -48,7 +46,10 @@ Credentials readBasic(const std::string& header) {
 
 std::string faultOfName(const std::string& name) {
   const auto isControl = [](unsigned char byte) { return byte < ' ' || byte == 0x7f; };
-  if (name.size() > kMaxName) return "The name is too long: 64 bytes at most.";
+  constexpr std::size_t kMost = bounds::kDisplayName.max;
+  if (name.size() > kMost) {
+    return "The name is too long: " + std::to_string(kMost) + " bytes at most.";
+  }
   if (name.find_first_not_of(' ') == std::string::npos) return "The application needs a name.";
   if (!isUtf8(name) || std::any_of(name.begin(), name.end(), isControl)) {
     return "The name has characters that cannot be shown.";
