@@ -19,12 +19,13 @@ namespace names = KELDOAUTHSERVER::names;
 
 /// The rows of the table: what stands in the cells behind the operation's name.
 std::map<std::string, std::string> publishedTable() {
-  std::ifstream file(GRANTS_DOCUMENT);
+  std::ifstream file(PROJECT_FOLDER "/docs/grants.md");
   std::map<std::string, std::string> table;
   for (std::string line; std::getline(file, line);) {
     if (line.rfind("| `", 0) != 0) continue;
     const std::size_t end = line.find('`', 3);
-    table[line.substr(3, end - 3)] = line.substr(end + 1);
+    const std::string name = line.substr(3, end - 3);
+    if (name.find('/') == std::string::npos) table[name] = line.substr(end + 1);
   }
   return table;
 }
@@ -145,6 +146,28 @@ TEST_F(CostTest, ARefreshFindsItsRowByKey) {
   for (const std::string& text : texts) {
     EXPECT_THAT(planOf(text), ::testing::Not(::testing::HasSubstr("SCAN"))) << text;
   }
+}
+
+/// The lines of a file, without blanks at their start and without empty ones.
+std::vector<std::string> linesOf(const std::string& path) {
+  std::ifstream file(PROJECT_FOLDER "/" + path);
+  std::vector<std::string> lines;
+  for (std::string line; std::getline(file, line);) {
+    const std::size_t start = line.find_first_not_of(' ');
+    if (start != std::string::npos) lines.push_back(line.substr(start));
+  }
+  return lines;
+}
+
+TEST(ReadmeTest, ShowsTheLoginThatIsCompiled) {
+  const std::vector<std::string> example = linesOf("examples/first_login.cpp");
+  const auto first = std::find(example.begin(), example.end(), "Grants grants;");
+  const auto last = std::find_if(first, example.end(), [](const std::string& line) {
+    return line.rfind("return revoked", 0) == 0;
+  });
+  ASSERT_NE(last, example.end());
+  const std::vector<std::string> readme = linesOf("README.md");
+  EXPECT_NE(std::search(readme.begin(), readme.end(), first, last + 1), readme.end());
 }
 
 }  // namespace
