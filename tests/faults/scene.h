@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/faults/operations.h"
+#include "tests/faults/every_operation.h"
 #include "tests/support/world.h"
 
 namespace faults {

@@ -207,9 +207,9 @@ void expectCipherFailure(const Case& test, bool success, const char* message) {
 }
 
 /// The statement that the operation means ran, and with the same success.
-Database::Outcome expectSame(const Case& test, bool success, const Statement& statement,
-                             bool needsChange) {
-  Database::Outcome model;
+Database::Effect expectSame(const Case& test, bool success, const Statement& statement,
+                            bool needsChange) {
+  Database::Effect model;
   if (statement.isReached) model = World::instance().model().run(statement.sql, statement.texts);
   const bool wanted = model.ok && (!needsChange || model.changes > 0);
   expect(success == wanted, "success", statement.sql);

@@ -97,7 +97,7 @@ std::string joined(const std::vector<std::string>& texts, const char* after,
   return line;
 }
 
-Database::Outcome insertInModel(const Change& change, const StoredRow& row) {
+Database::Effect insertInModel(const Change& change, const StoredRow& row) {
   if (!row.isWhole) return {};
   std::string marks = "?";
   for (std::size_t i = 1; i < row.columns.size(); ++i) marks += ", ?";
@@ -183,7 +183,7 @@ void checkEdit(Stores& stores, const Change& change, long long id, const Texts& 
     return expectRefused(store, change.refusalCode, change.name);
   }
   StoredRow row = storedRow(change, texts);
-  Database::Outcome model;
+  Database::Effect model;
   if (row.isWhole) {
     const std::string set = joined(row.columns, "=?", ", ");
     row.texts.push_back(std::to_string(id));
@@ -211,7 +211,7 @@ void checkLookUp(Stores& stores, const LookUp& lookUp, const std::string& text) 
   }
   StoredRow row;
   row.add(lookUp.argument, text);
-  Database::Outcome model;
+  Database::Effect model;
   if (row.isWhole) {
     model = World::instance().model().run(
         "SELECT * FROM " + lookUp.table + " WHERE " + row.columns[0] + "=?", row.texts);

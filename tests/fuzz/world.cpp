@@ -102,8 +102,8 @@ void Database::runAll(const char* statements) {
   expect(result == SQLITE_OK, sqlite3_errmsg(db_), statements);
 }
 
-Database::Outcome Database::run(const std::string& sql, const std::vector<std::string>& texts) {
-  Outcome outcome;
+Database::Effect Database::run(const std::string& sql, const std::vector<std::string>& texts) {
+  Effect outcome;
   sqlite3_stmt* statement = nullptr;
   const char* rest = nullptr;
   if (sqlite3_prepare_v2(db_, sql.c_str(), -1, &statement, &rest) != SQLITE_OK) return outcome;

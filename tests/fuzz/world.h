@@ -33,13 +33,13 @@ class Database {
   Database(const Database&) = delete;
   Database& operator=(const Database&) = delete;
 
-  struct Outcome {
+  struct Effect {
     bool ok = false;
     int changes = 0;
     std::vector<Row> rows;  // NULL reads as the empty text
   };
   /// Runs one statement with `texts` in the place of its question marks.
-  Outcome run(const std::string& sql, const std::vector<std::string>& texts = {});
+  Effect run(const std::string& sql, const std::vector<std::string>& texts = {});
   void runAll(const char* statements);
 
   /// Every row of every table. Read again only when something was committed.

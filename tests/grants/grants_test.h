@@ -34,7 +34,6 @@ class GrantsTest : public support::World {
   void SetUp() override;
 
   Grants& grants() { return *grants_; }
-  void close() { grants_.reset(); }
   /// Another connection, with another policy.
   void open(const Policy& policy);
 

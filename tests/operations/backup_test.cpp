@@ -12,7 +12,7 @@
 #include <iterator>
 
 #include "tests/faults/small_medium.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 
 namespace operations {
 namespace {

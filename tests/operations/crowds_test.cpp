@@ -20,7 +20,7 @@
 #include "stores/oauth_grantCode.h"
 #include "stores/oauth_log.h"
 #include "tests/load/processes.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 #include "tests/support/long_form.h"
 #include "utils/oauth_names.h"
 

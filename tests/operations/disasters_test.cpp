@@ -6,7 +6,7 @@
 #include <filesystem>
 
 #include "tests/faults/small_medium.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 
 namespace operations {
 namespace {

@@ -6,7 +6,7 @@
 
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_token.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 #include "utils/oauth_names.h"
 
 namespace operations {

@@ -5,7 +5,7 @@
 #include <optional>
 
 #include "tests/faults/ext4_medium.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 #include "tests/support/long_form.h"
 
 namespace operations {

@@ -13,7 +13,7 @@
 
 #include "platform/keldcore.h"
 #include "tests/faults/small_medium.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 
 namespace operations {
 namespace {

@@ -8,7 +8,7 @@
 #include <filesystem>
 
 #include "tests/faults/small_medium.h"
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 #include "tests/support/case_name.h"
 
 namespace operations {

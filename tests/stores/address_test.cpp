@@ -8,7 +8,7 @@
 #include <random>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using namespace KELDOAUTHSERVER;
 using support::id64;
@@ -28,10 +28,10 @@ class AddressTest : public StoreTest {
   }
 
   static void expectRefused(const std::string& ip) {
-    const Outcome code = addCode({{"ip", ip}});
+    const Aftermath code = addCode({{"ip", ip}});
     EXPECT_TRUE(failedSilently(code)) << ip;
     EXPECT_THAT(code.lines, ElementsAre("oauth_grantCode:61 Bad IP address[Invalid argument]"));
-    const Outcome token = addToken({{"ip", ip}});
+    const Aftermath token = addToken({{"ip", ip}});
     EXPECT_TRUE(failedSilently(token)) << ip;
     EXPECT_THAT(token.lines, ElementsAre("oauth_token:65 Bad IP address[Invalid argument]"));
     EXPECT_EQ(rowCount("oauth_grantCode"), 0);

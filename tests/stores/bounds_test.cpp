@@ -6,7 +6,7 @@
 #include <regex>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using support::Row;
 using ::testing::ElementsAre;
@@ -29,7 +29,7 @@ class BoundsTest : public OperationsTest, public ::testing::WithParamInterface<O
   static void expectAccepted(const std::string& text) {
     startAfresh();
     Json::Value out;
-    const Outcome outcome = operation().run({{argument().name, text}}, out);
+    const Aftermath outcome = operation().run({{argument().name, text}}, out);
     EXPECT_THAT(outcome.lines, IsEmpty()) << text.size();
     EXPECT_EQ(outcome.code, kCodeBefore) << text.size();
     if (!operation().row.empty()) {
@@ -41,7 +41,7 @@ class BoundsTest : public OperationsTest, public ::testing::WithParamInterface<O
     startAfresh();
     const std::vector<Row> before = everything();
     Json::Value out;
-    const Outcome outcome = operation().run({{argument().name, text}}, out);
+    const Aftermath outcome = operation().run({{argument().name, text}}, out);
     EXPECT_TRUE(failed(outcome, operation().refusalCode, operation().refusalMessage()))
         << text.size();
     EXPECT_THAT(outcome.lines, ElementsAre(operation().refusal)) << text.size();

@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using support::Row;
 using ::testing::IsEmpty;
@@ -55,9 +55,9 @@ class HostileTextTest : public OperationsTest,
   static const Operation& operation() { return GetParam().operation; }
   static const Argument& argument() { return GetParam().argument; }
 
-  static Outcome runWith(const std::string& text) {
+  static Aftermath runWith(const std::string& text) {
     Json::Value out;
-    const Outcome outcome = operation().run({{argument().name, text}}, out);
+    const Aftermath outcome = operation().run({{argument().name, text}}, out);
     // A registration's entry has tests of its own.
     sql("DELETE FROM oauth_log WHERE id > 2;");
     return outcome;
@@ -84,7 +84,7 @@ TEST_P(HostileTextTest, StaysAText) {
     startAfresh();
     const std::vector<Row> before = others();
     const std::string text = fitted(hostile, argument());
-    const Outcome outcome = runWith(text);
+    const Aftermath outcome = runWith(text);
     EXPECT_THAT(outcome.lines, IsEmpty());
     EXPECT_EQ(outcome.code, kCodeBefore);
     EXPECT_EQ(others(), before);
@@ -102,7 +102,7 @@ TEST_P(HostileTextTest, EndsAtNul) {
   text[text.size() - 1] = '\0';
   const std::string head = text.substr(0, text.size() - 1);
   const std::vector<Row> before = others();
-  const Outcome outcome = runWith(text);
+  const Aftermath outcome = runWith(text);
   EXPECT_EQ(others(), before);
 
   if (argument().stored == Stored::kAsGiven && argument().name != "client_id") {

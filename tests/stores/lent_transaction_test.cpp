@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "core/transaction.h"
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using namespace KELDOAUTHSERVER;
 using support::FakeIds;
@@ -84,7 +84,7 @@ class LentTransactionTest : public StoreTest {
   std::optional<Stores> stores_;
 };
 
-// All four --------------------------------------------------------------------
+// All four ------------------------------------------------------------------------
 
 TEST_F(LentTransactionTest, CommitKeepsTheChangesOfAllWhoeverBeganIt) {
   Transaction transaction(clients());
@@ -177,12 +177,12 @@ TEST_F(LentTransactionTest, PurgeThroughABorrowerIsTakenBackWithIt) {
   EXPECT_EQ(rowCount("oauth_token"), 0);
 }
 
-// Registration ----------------------------------------------------------------
+// Registration --------------------------------------------------------------------
 
 TEST_F(LentTransactionTest, RegistrationThroughABorrowerOpensNothing) {
   FakeIds::use(1000, 1000);
   Json::Value out;
-  const Outcome outcome =
+  const Aftermath outcome =
       runOn(clients(), [&](auto& s) { return s.Add("abc", "read", "App", out); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, Each(Not(StartsWith("CREATE"))));
@@ -240,7 +240,7 @@ TEST_F(LentTransactionTest, RegistrationByAnOwnerInATransactionHasNoEntry) {
     if (text.rfind("SELECT COUNT(*)", 0) == 0) Statements::dontWaitForLocks();  // the entry's
   });
   Json::Value out;
-  const Outcome outcome = runOn(owner, [&](auto& s) { return s.Add("abc", "read", "App", out); });
+  const Aftermath outcome = runOn(owner, [&](auto& s) { return s.Add("abc", "read", "App", out); });
   EXPECT_TRUE(succeeded(outcome));
   const std::string locked = "oauth_db_basic Run Command failed!![database is locked][5]";
   EXPECT_THAT(outcome.lines, ElementsAre(locked, "oauth_db_basic Add failed[oauth_log]", locked));
@@ -256,7 +256,8 @@ TEST_F(LentTransactionTest, RegistrationThroughABorrowerThatIsNotReadyReadsAsFul
   ASSERT_EQ(tokens().DBInit(), 0);
   ASSERT_EQ(clients().DBInit(), 0);
   Json::Value out;
-  const Outcome outcome = runOn(clients(), [&](auto& s) { return s.Add("abc", "r", "App", out); });
+  const Aftermath outcome =
+      runOn(clients(), [&](auto& s) { return s.Add("abc", "r", "App", out); });
   EXPECT_TRUE(failed(outcome, -5, "ClientInfo Table is full"));
   EXPECT_THAT(outcome.statements, IsEmpty());
   EXPECT_EQ(rowCount(names::kClientInfoTable), 0);

@@ -9,7 +9,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using namespace KELDOAUTHSERVER;
 using support::id64;
@@ -57,8 +57,8 @@ TEST_F(NotReadyTest, VerifyTellsTheErrorOfTheOpening) {
 }
 
 TEST_F(NotReadyTest, PurgeHasNothingToDo) {
-  for (const Outcome& outcome : {onCodes([](auto& store) { return store.Purge(); }),
-                                 onTokens([](auto& store) { return store.Purge(); })}) {
+  for (const Aftermath& outcome : {onCodes([](auto& store) { return store.Purge(); }),
+                                   onTokens([](auto& store) { return store.Purge(); })}) {
     EXPECT_TRUE(succeeded(outcome));
     EXPECT_THAT(outcome.lines, Contains(kNotReady));
   }
@@ -66,7 +66,7 @@ TEST_F(NotReadyTest, PurgeHasNothingToDo) {
 
 /// A registration opens a log of its own, which is not ready either.
 TEST_F(NotReadyTest, RegistrationReadsAsFull) {
-  const Outcome outcome = addClient();
+  const Aftermath outcome = addClient();
   EXPECT_TRUE(failed(outcome, -5, "ClientInfo Table is full"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Open DB failed!![14]", kNotReady,
                                          "oauth_db_basic Get Row Count failed[oauth_clientInfo]",
@@ -80,7 +80,7 @@ TEST_F(NotReadyTest, IssuingReadsAsFull) {
 }
 
 TEST_F(NotReadyTest, LogAnswersNoMessage) {
-  const Outcome outcome = onLog([](auto& store) { return store.Add("hello"); });
+  const Aftermath outcome = onLog([](auto& store) { return store.Add("hello"); });
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines,
               ElementsAre(kNotReady, "oauth_db_basic Add failed[oauth_log]", kNotReady));
@@ -90,7 +90,7 @@ TEST_F(NotReadyTest, LogAnswersNoMessage) {
 
 struct RefusedCase {
   const char* name;
-  std::function<Outcome()> run;
+  std::function<Aftermath()> run;
   const char* line;
 };
 void PrintTo(const RefusedCase& c, std::ostream* out) {
@@ -100,7 +100,7 @@ void PrintTo(const RefusedCase& c, std::ostream* out) {
 class RefusedTest : public NotReadyTest, public ::testing::WithParamInterface<RefusedCase> {};
 
 TEST_P(RefusedTest, FailsWithoutACode) {
-  const Outcome outcome = GetParam().run();
+  const Aftermath outcome = GetParam().run();
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre(kNotReady, GetParam().line));
   EXPECT_THAT(outcome.statements, IsEmpty());
@@ -164,7 +164,7 @@ TEST_F(NotReadyOrderTest, BadArgumentsOfChangesAndLookUpsComeFirst) {
   for (const Operation& operation : operations()) {
     if (operation.row == "3") continue;  // adds a row
     Json::Value out;
-    const Outcome outcome = operation.run({{operation.arguments.front().name, ""}}, out);
+    const Aftermath outcome = operation.run({{operation.arguments.front().name, ""}}, out);
     EXPECT_TRUE(failed(outcome, operation.refusalCode, operation.refusalMessage()));
     EXPECT_THAT(outcome.lines, ElementsAre(operation.refusal)) << operation.name;
   }

@@ -6,7 +6,7 @@
 #include <algorithm>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using support::Row;
 using ::testing::Contains;
@@ -77,7 +77,7 @@ TEST_F(AuditTest, FailedInsertWritesNoEntry) {
 
 TEST_F(AuditTest, RefusedEntryDoesNotChangeTheResult) {
   refuseEntries();
-  const Outcome outcome = addClient();
+  const Aftermath outcome = addClient();
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Run Command failed!![no][19]",
                                          "oauth_db_basic Add failed[oauth_log]"));
@@ -151,7 +151,7 @@ TEST_F(HeldLogTest, LogThatCannotBeOpenedDoesNotChangeTheResult) {
   sql("ALTER TABLE oauth_log RENAME TO old_log;");
   sql("CREATE INDEX oauth_log ON old_log(msg);");  // the table cannot be created beside it
   Json::Value out;
-  const Outcome outcome = runOn(store, [&](auto& s) { return s.Add("abc", "r", "App", out); });
+  const Aftermath outcome = runOn(store, [&](auto& s) { return s.Add("abc", "r", "App", out); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.lines, Contains("oauth_db_basic Create Table failed!![oauth_log]"));
   EXPECT_THAT(outcome.lines, Contains("oauth_db_basic DB is not ready!!"));

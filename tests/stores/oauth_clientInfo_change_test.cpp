@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBClientInfo;
 using support::id64;
@@ -24,13 +24,13 @@ class ClientTest : public OperationsTest {
     return found.empty() ? Row() : found.front();
   }
 
-  static Outcome enable(long long id) {
+  static Aftermath enable(long long id) {
     return onClients([&](auto& store) { return store.Enable(id); });
   }
-  static Outcome disable(long long id) {
+  static Aftermath disable(long long id) {
     return onClients([&](auto& store) { return store.Disable(id); });
   }
-  static Outcome remove(long long id) {
+  static Aftermath remove(long long id) {
     return onClients([&](auto& store) { return store.Del(id); });
   }
   static Json::Value find(const std::string& clientId) {
@@ -91,7 +91,7 @@ TEST_F(ClientTest, EditToTheSameValuesIsASuccess) {
 
 TEST_F(ClientTest, EditOfAnUnknownIdFailsWithoutACode) {
   const std::vector<Row> before = everything();
-  const Outcome outcome = editClient(99);
+  const Aftermath outcome = editClient(99);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Edit failed[oauth_clientInfo]"));
   EXPECT_EQ(everything(), before);
@@ -109,7 +109,7 @@ TEST_F(ClientTest, EditWritesNoAuditEntry) {
 
 TEST_F(ClientTest, StatementThatFailsLeavesSqlitesError) {
   sql("CREATE TRIGGER t BEFORE UPDATE ON oauth_clientInfo BEGIN SELECT RAISE(ABORT, 'no'); END;");
-  const Outcome outcome = editClient(1);
+  const Aftermath outcome = editClient(1);
   EXPECT_TRUE(failed(outcome, 19, "no"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Run Command failed!![no][19]",
                                          "oauth_db_basic Edit failed[oauth_clientInfo]"));
@@ -121,7 +121,7 @@ TEST_F(ClientTest, DisableChangesOneColumn) {
   Row expected = client("1");
   expected["enable"] = "0";
   const std::vector<Row> others = everythingBut(kTable, "1");
-  const Outcome outcome = disable(1);
+  const Aftermath outcome = disable(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements,
               ElementsAre("UPDATE oauth_clientInfo SET enable='0' WHERE id='1';"));
@@ -132,7 +132,7 @@ TEST_F(ClientTest, DisableChangesOneColumn) {
 TEST_F(ClientTest, EnableTakesDisableBack) {
   const Row before = client("1");
   disable(1);
-  const Outcome outcome = enable(1);
+  const Aftermath outcome = enable(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements,
               ElementsAre("UPDATE oauth_clientInfo SET enable='1' WHERE id='1';"));
@@ -146,7 +146,7 @@ TEST_F(ClientTest, SwitchingToTheSameStateIsASuccess) {
 }
 
 TEST_F(ClientTest, SwitchingAnUnknownIdFailsWithoutACode) {
-  for (const Outcome& outcome : {enable(99), disable(99)}) {
+  for (const Aftermath& outcome : {enable(99), disable(99)}) {
     EXPECT_TRUE(failedSilently(outcome));
     EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Edit failed[oauth_clientInfo]"));
   }
@@ -161,7 +161,7 @@ TEST_F(ClientTest, DisabledApplicationIsStillFound) {
 
 TEST_F(ClientTest, DelRemovesOneRow) {
   const std::vector<Row> others = everythingBut(kTable, "1");
-  const Outcome outcome = remove(1);
+  const Aftermath outcome = remove(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("DELETE FROM oauth_clientInfo WHERE id='1';"));
   EXPECT_EQ(everything(), others);
@@ -175,7 +175,7 @@ TEST_F(ClientTest, DelLeavesCodesAndTokensOfTheApplication) {
 
 TEST_F(ClientTest, SecondDelFailsWithoutACode) {
   remove(1);
-  const Outcome outcome = remove(1);
+  const Aftermath outcome = remove(1);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Delete failed[oauth_clientInfo]"));
 }
@@ -200,7 +200,7 @@ TEST_F(ClientTest, GetDeliversTheRowInTheClear) {
 
 TEST_F(ClientTest, GetComparesCiphertext) {
   Json::Value rows;
-  const Outcome outcome = onClients([&](auto& store) { return store.Get(id64('c'), &rows); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.Get(id64('c'), &rows); });
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_clientInfo WHERE client_id='" +
                                               cipher(id64('c')) + "' ;"));
 }
@@ -237,7 +237,7 @@ TEST_F(ClientTest, RefusedGetLeavesTheResultAlone) {
 
 TEST_F(ClientTest, GetByIdDeliversTheRow) {
   Json::Value rows;
-  const Outcome outcome = onClients([&](auto& store) { return store.Get(2LL, &rows); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.Get(2LL, &rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_clientInfo WHERE id='2' ;"));
   ASSERT_EQ(rows.size(), 1U);
@@ -252,7 +252,7 @@ TEST_F(ClientTest, GetByAnUnknownIdIsAnEmptySuccess) {
 
 TEST_F(ClientTest, GetOfAllDeliversEveryRowInOrder) {
   Json::Value rows;
-  const Outcome outcome = onClients([&](auto& store) { return store.Get(&rows); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.Get(&rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_clientInfo ;"));
   ASSERT_EQ(rows.size(), 2U);
@@ -270,7 +270,7 @@ TEST_F(ClientTest, GetOfAllOfAnEmptyTableIsAnEmptySuccess) {
 TEST_F(ClientTest, RowThatCannotBeDecryptedIsDeliveredAsItIs) {
   sql("UPDATE oauth_clientInfo SET client_secret='clear' WHERE id=1;");
   Json::Value rows;
-  const Outcome outcome = onClients([&](auto& store) { return store.Get(1LL, &rows); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.Get(1LL, &rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Data Decrypt failed",
                                          "oauth_db_basic Decrypt data failed"));
@@ -281,7 +281,7 @@ TEST_F(ClientTest, RowThatCannotBeDecryptedIsDeliveredAsItIs) {
 TEST_F(ClientTest, FailedEncryptionOfTheIdentifierSaysDecrypt) {
   support::Platform::failEncryptFrom(1);
   Json::Value rows("old");
-  const Outcome outcome = onClients([&](auto& store) { return store.Get(id64('c'), &rows); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.Get(id64('c'), &rows); });
   EXPECT_TRUE(failed(outcome, -4, "Data Decrypt failed"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Data Encrypt failed"));
   EXPECT_THAT(outcome.statements, IsEmpty());
@@ -294,13 +294,13 @@ TEST_F(ClientTest, GetIndexIsTheIdOfTheRow) {
 }
 
 TEST_F(ClientTest, GetIndexOfAnUnknownIdentifierIsZeroWithoutACode) {
-  const Outcome outcome = onClients([&](auto& store) { return store.GetIndex(id64('z')); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.GetIndex(id64('z')); });
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, IsEmpty());
 }
 
 TEST_F(ClientTest, GetIndexOfAMalformedIdentifierIsZeroWithACode) {
-  const Outcome outcome = onClients([&](auto& store) { return store.GetIndex("short"); });
+  const Aftermath outcome = onClients([&](auto& store) { return store.GetIndex("short"); });
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_clientInfo:180 Bad parameters"));
 }
@@ -309,7 +309,7 @@ TEST_F(ClientTest, FailedLookUpsLeaveSqlitesError) {
   OAUTHDBClientInfo store(kTable);
   sql("DROP TABLE oauth_clientInfo;");
   Json::Value rows;
-  const Outcome outcome = runOn(store, [&](auto& s) { return s.Get(&rows); });
+  const Aftermath outcome = runOn(store, [&](auto& s) { return s.Get(&rows); });
   EXPECT_TRUE(failed(outcome, 1, "no such table: oauth_clientInfo"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Run Command failed!![no such table: "
                                          "oauth_clientInfo][1]",

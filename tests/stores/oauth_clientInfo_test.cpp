@@ -6,7 +6,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBClientInfo;
 using support::id64;
@@ -44,7 +44,7 @@ TEST_F(RegistrationTest, StoresDisabledApplication) {
 }
 
 TEST_F(RegistrationTest, RunsOneInsertWithColumnsInOrderOfTheirNames) {
-  const Outcome outcome = addClient();
+  const Aftermath outcome = addClient();
   EXPECT_THAT(
       outcome.statements,
       Contains("INSERT INTO oauth_clientInfo (client_id, client_secret, display_name, enable, id, "
@@ -112,7 +112,7 @@ class ShortAddressTest : public RegistrationTest,
                          public ::testing::WithParamInterface<ShortAddressCase> {};
 
 TEST_P(ShortAddressTest, LengthCountsWithoutScheme) {
-  const Outcome outcome = addClient({{"redirect_uri", GetParam().given}});
+  const Aftermath outcome = addClient({{"redirect_uri", GetParam().given}});
   EXPECT_EQ(outcome.ok, GetParam().accepted);
   EXPECT_EQ(rowCount(kTable), GetParam().accepted ? 1 : 0);
 }
@@ -139,7 +139,7 @@ class EnableTest : public RegistrationTest, public ::testing::WithParamInterface
 
 TEST_P(EnableTest, OnlyZeroAndOneAreAccepted) {
   Json::Value out;
-  const Outcome outcome = addClient({{"enable", GetParam()}}, out);
+  const Aftermath outcome = addClient({{"enable", GetParam()}}, out);
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_clientInfo:76 Bad parameters"));
   EXPECT_TRUE(out.isNull());
@@ -154,13 +154,13 @@ TEST_F(RegistrationTest, FullTableIsReportedEvenWhenEveryArgumentIsBad) {
   writeSettings(R"({"client_info_max": 1})");
   insertClient();
   Json::Value out;
-  const Outcome outcome = addClient({{"client_id", ""},
-                                     {"client_secret", ""},
-                                     {"redirect_uri", ""},
-                                     {"scope", ""},
-                                     {"display_name", ""},
-                                     {"enable", "maybe"}},
-                                    out);
+  const Aftermath outcome = addClient({{"client_id", ""},
+                                       {"client_secret", ""},
+                                       {"redirect_uri", ""},
+                                       {"scope", ""},
+                                       {"display_name", ""},
+                                       {"enable", "maybe"}},
+                                      out);
   EXPECT_TRUE(failed(outcome, -5, "ClientInfo Table is full"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_clientInfo:63 ClientInfo Table is full"));
   EXPECT_TRUE(out.isNull());
@@ -195,7 +195,7 @@ TEST_F(RegistrationTest, LimitsOfOtherTablesDoNotCount) {
 TEST_F(RegistrationTest, FailedCountReadsAsFull) {
   OAUTHDBClientInfo store("no_such_table");
   Json::Value out;
-  const Outcome outcome =
+  const Aftermath outcome =
       runOn(store, [&](auto& s) { return s.Add("app.example", "read", "App", out); });
   EXPECT_TRUE(failed(outcome, -5, "ClientInfo Table is full"));
   EXPECT_THAT(outcome.lines,
@@ -207,7 +207,7 @@ TEST_F(RegistrationTest, FailedCountReadsAsFull) {
 
 TEST_F(RegistrationTest, SecondUseOfAnIdentifierFailsInTheDatabase) {
   insertClient({{"client_id", cipher(id64('n'))}});
-  const Outcome outcome = addClient();
+  const Aftermath outcome = addClient();
   EXPECT_TRUE(failed(outcome, 19, "UNIQUE constraint failed: oauth_clientInfo.client_id"));
   EXPECT_THAT(outcome.lines,
               ElementsAre("oauth_db_basic Run Command failed!![UNIQUE constraint failed: "
@@ -223,7 +223,7 @@ TEST_F(RegistrationTest, SecondUseOfASecretIsNoError) {
 
 TEST_F(RegistrationTest, FailedEncryptionStoresNothing) {
   support::Platform::failEncryptFrom(1);
-  const Outcome outcome = addClient();
+  const Aftermath outcome = addClient();
   EXPECT_TRUE(failed(outcome, -4, "Data Encrypt failed"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Data Encrypt failed"));
   EXPECT_EQ(rowCount(kTable), 0);
@@ -325,7 +325,7 @@ TEST_F(RegistrationTest, EachApplicationGetsItsOwnIdentifier) {
 
 TEST_F(RegistrationTest, RefusedShortFormsRevealNothing) {
   Json::Value out;
-  const Outcome outcome = onClients([&](auto& s) { return s.Add("ab", "read", "App", out); });
+  const Aftermath outcome = onClients([&](auto& s) { return s.Add("ab", "read", "App", out); });
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_clientInfo:76 Bad parameters"));
   EXPECT_TRUE(out.isNull());

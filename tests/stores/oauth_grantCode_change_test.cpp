@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBGrantCode;
 using support::Clock;
@@ -25,10 +25,10 @@ class GrantCodeChangeTest : public OperationsTest {
     return found.empty() ? Row() : found.front();
   }
 
-  static Outcome revoke(long long id) {
+  static Aftermath revoke(long long id) {
     return onCodes([&](auto& store) { return store.Revoke(id); });
   }
-  static Outcome remove(long long id) {
+  static Aftermath remove(long long id) {
     return onCodes([&](auto& store) { return store.Del(id); });
   }
   static Json::Value find(const std::string& text) {
@@ -112,7 +112,7 @@ TEST_F(GrantCodeChangeTest, EditWithExpiryDoublesQuotesButNotThoseOfTheExpiry) {
 
 TEST_F(GrantCodeChangeTest, EditOfAnUnknownIdFailsWithoutACode) {
   const std::vector<Row> before = everything();
-  for (const Outcome& outcome : {editCode(99), editCodeAndExpiry(99)}) {
+  for (const Aftermath& outcome : {editCode(99), editCodeAndExpiry(99)}) {
     EXPECT_TRUE(failedSilently(outcome));
     EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Edit failed[oauth_grantCode]"));
   }
@@ -127,7 +127,7 @@ TEST_F(GrantCodeChangeTest, RefusedEditsSetNoCode) {
 TEST_F(GrantCodeChangeTest, FailedEncryptionChangesNothing) {
   const std::vector<Row> before = everything();
   support::Platform::failEncryptFrom(1);
-  for (const Outcome& outcome : {editCode(1, kNew), editCodeAndExpiry(1, kNew)}) {
+  for (const Aftermath& outcome : {editCode(1, kNew), editCodeAndExpiry(1, kNew)}) {
     EXPECT_TRUE(failed(outcome, -4, "Data Encrypt failed"));
     EXPECT_THAT(outcome.statements, IsEmpty());
   }
@@ -141,7 +141,7 @@ TEST_F(GrantCodeChangeTest, RevokeMovesTheExpiryToNow) {
   Row expected = code("1");
   expected["expired_time"] = "1700000000";
   const std::vector<Row> others = everythingBut(kTable, "1");
-  const Outcome outcome = revoke(1);
+  const Aftermath outcome = revoke(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements,
               ElementsAre("UPDATE oauth_grantCode SET expired_time='1700000000' WHERE id='1';"));
@@ -182,7 +182,7 @@ TEST_F(GrantCodeChangeTest, RevokeMovesAnExpiredCodeForward) {
 }
 
 TEST_F(GrantCodeChangeTest, RevokeOfAnUnknownIdFailsWithoutACode) {
-  const Outcome outcome = revoke(99);
+  const Aftermath outcome = revoke(99);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Edit failed[oauth_grantCode]"));
 }
@@ -191,7 +191,7 @@ TEST_F(GrantCodeChangeTest, RevokeOfAnUnknownIdFailsWithoutACode) {
 
 TEST_F(GrantCodeChangeTest, DelRemovesOneRow) {
   const std::vector<Row> others = everythingBut(kTable, "1");
-  const Outcome outcome = remove(1);
+  const Aftermath outcome = remove(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("DELETE FROM oauth_grantCode WHERE id='1';"));
   EXPECT_EQ(everything(), others);
@@ -206,7 +206,7 @@ TEST_F(GrantCodeChangeTest, OnlyOneDelOfACodeSucceeds) {
 }
 
 TEST_F(GrantCodeChangeTest, DelOfAnUnknownIdFailsWithoutACode) {
-  const Outcome outcome = remove(99);
+  const Aftermath outcome = remove(99);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Delete failed[oauth_grantCode]"));
 }
@@ -242,7 +242,7 @@ TEST_F(GrantCodeChangeTest, GetDoesNotFindACodeWithAQuoteAgain) {
 
 TEST_F(GrantCodeChangeTest, GetAsksForTheCodeAsGiven) {
   Json::Value rows;
-  const Outcome outcome =
+  const Aftermath outcome =
       onCodes([&](auto& store) { return store.Get(std::string(63, 'k') + "'", &rows); });
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_grantCode WHERE code='" +
                                               std::string(63, 'k') + "''' ;"));
@@ -250,7 +250,7 @@ TEST_F(GrantCodeChangeTest, GetAsksForTheCodeAsGiven) {
 
 TEST_F(GrantCodeChangeTest, RefusedGetLeavesTheResultAlone) {
   Json::Value rows("old");
-  const Outcome outcome = onCodes([&](auto& store) { return store.Get("short", &rows); });
+  const Aftermath outcome = onCodes([&](auto& store) { return store.Get("short", &rows); });
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_grantCode:194 Bad parameters"));
   EXPECT_THAT(outcome.statements, IsEmpty());
@@ -263,7 +263,8 @@ TEST_F(GrantCodeChangeTest, GetIndexIsTheIdOfTheRow) {
 }
 
 TEST_F(GrantCodeChangeTest, GetIndexOfAShortCodeIsZeroWithACode) {
-  const Outcome outcome = onCodes([](auto& store) { return store.GetIndex(std::string(63, 'g')); });
+  const Aftermath outcome =
+      onCodes([](auto& store) { return store.GetIndex(std::string(63, 'g')); });
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_grantCode:194 Bad parameters"));
 }
@@ -274,7 +275,7 @@ TEST_F(GrantCodeChangeTest, GetIndexOfAnUnknownCodeIsZeroWithoutACode) {
 
 TEST_F(GrantCodeChangeTest, GetByIdDeliversTheRow) {
   Json::Value rows;
-  const Outcome outcome = onCodes([&](auto& store) { return store.Get(2LL, &rows); });
+  const Aftermath outcome = onCodes([&](auto& store) { return store.Get(2LL, &rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_grantCode WHERE id='2' ;"));
   ASSERT_EQ(rows.size(), 1U);
@@ -289,7 +290,7 @@ TEST_F(GrantCodeChangeTest, GetByAnUnknownIdIsAnEmptySuccess) {
 
 TEST_F(GrantCodeChangeTest, GetOfAllDeliversEveryRow) {
   Json::Value rows;
-  const Outcome outcome = onCodes([&](auto& store) { return store.Get(&rows); });
+  const Aftermath outcome = onCodes([&](auto& store) { return store.Get(&rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_grantCode ;"));
   ASSERT_EQ(rows.size(), 2U);
@@ -301,7 +302,7 @@ TEST_F(GrantCodeChangeTest, FailedLookUpsLeaveSqlitesError) {
   OAUTHDBGrantCode store(kTable);
   sql("DROP TABLE oauth_grantCode;");
   Json::Value rows;
-  const Outcome outcome = runOn(store, [&](auto& s) { return s.Get(id64('g'), &rows); });
+  const Aftermath outcome = runOn(store, [&](auto& s) { return s.Get(id64('g'), &rows); });
   EXPECT_TRUE(failed(outcome, 1, "no such table: oauth_grantCode"));
   EXPECT_THAT(outcome.lines,
               ElementsAre("oauth_db_basic Run Command failed!![no such table: oauth_grantCode][1]",

@@ -6,7 +6,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBGrantCode;
 using support::Clock;
@@ -96,7 +96,7 @@ TEST_F(GrantCodeTest, FullTableComesBeforeABadAddressAndBadArguments) {
   writeSettings(R"({"grantcode_max": 1})");
   insertCode();
   Json::Value out;
-  const Outcome outcome = addCode({{"ip", "nonsense"}, {"username", ""}, {"code", ""}}, out);
+  const Aftermath outcome = addCode({{"ip", "nonsense"}, {"username", ""}, {"code", ""}}, out);
   EXPECT_TRUE(failed(outcome, -5, "GrantCode Table is full"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_grantCode:56 GrantCode Table is full"));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT COUNT(*) FROM oauth_grantCode;"));
@@ -107,7 +107,7 @@ TEST_F(GrantCodeTest, FullTableRefusesTheShortFormToo) {
   writeSettings(R"({"grantcode_max": 1})");
   insertCode();
   Json::Value out;
-  const Outcome outcome = issueCode({}, out);
+  const Aftermath outcome = issueCode({}, out);
   EXPECT_TRUE(failed(outcome, -5, "GrantCode Table is full"));
   EXPECT_TRUE(out.isNull());
 }
@@ -134,7 +134,7 @@ TEST_F(GrantCodeTest, LimitIsReadAfreshEachTime) {
 
 TEST_F(GrantCodeTest, BadAddressComesBeforeBadArguments) {
   Json::Value out;
-  const Outcome outcome = addCode({{"ip", "10.0.0.256"}, {"username", ""}}, out);
+  const Aftermath outcome = addCode({{"ip", "10.0.0.256"}, {"username", ""}}, out);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre(kBadAddress));
   EXPECT_TRUE(out.isNull());
@@ -157,7 +157,7 @@ TEST_F(GrantCodeTest, BadAddressLeavesTheErrorOfAnEarlierOperation) {
 
 TEST_F(GrantCodeTest, BadArgumentsSetNoCode) {
   Json::Value out;
-  const Outcome outcome = addCode({{"state", ""}}, out);
+  const Aftermath outcome = addCode({{"state", ""}}, out);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_grantCode:71 Bad parameters"));
   EXPECT_TRUE(out.isNull());
@@ -173,7 +173,7 @@ TEST_F(GrantCodeTest, FreshObjectStillSaysThatNothingFailed) {
 
 TEST_F(GrantCodeTest, SecondUseOfACodeFailsInTheDatabase) {
   insertCode();
-  const Outcome outcome = addCode({{"code", id64('g')}});
+  const Aftermath outcome = addCode({{"code", id64('g')}});
   EXPECT_TRUE(failed(outcome, 19, "UNIQUE constraint failed: oauth_grantCode.code"));
   EXPECT_THAT(outcome.lines,
               ElementsAre("oauth_db_basic Run Command failed!![UNIQUE constraint failed: "
@@ -244,7 +244,7 @@ TEST_F(GrantCodeTest, EachIssuedCodeIsAnother) {
 
 TEST_F(GrantCodeTest, IssueChecksTheAddress) {
   Json::Value out;
-  const Outcome outcome = issueCode({{"ip", "999.1.1.1"}}, out);
+  const Aftermath outcome = issueCode({{"ip", "999.1.1.1"}}, out);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre(kBadAddress));
   EXPECT_TRUE(out.isNull());

@@ -6,7 +6,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBLog;
 using support::Clock;
@@ -29,13 +29,13 @@ class LogTest : public StoreTest {
     Clock::setTo(kNow);
   }
 
-  static Outcome add(const std::string& msg) {
+  static Aftermath add(const std::string& msg) {
     return onLog([&](auto& store) { return store.Add(msg); });
   }
-  static Outcome get(const std::string& filter, const std::string& option, Json::Value& rows) {
+  static Aftermath get(const std::string& filter, const std::string& option, Json::Value& rows) {
     return onLog([&](auto& store) { return store.Get(filter, option, &rows); });
   }
-  static Outcome clear() {
+  static Aftermath clear() {
     return onLog([](auto& store) { return store.Del(); });
   }
 
@@ -104,7 +104,7 @@ TEST_F(LogTest, AddStoresAMegabyte) {
 TEST_F(LogTest, StatementBeyondSqlitesLimitIsRefusedByIt) {
   OAUTHDBLog store(kTable);
   Statements::limitStatementsTo(1000);
-  const Outcome outcome = runOn(store, [](auto& s) { return s.Add(textOf(1000)); });
+  const Aftermath outcome = runOn(store, [](auto& s) { return s.Add(textOf(1000)); });
   EXPECT_TRUE(failed(outcome, 18, "string or blob too big"));
   EXPECT_THAT(outcome.lines,
               ElementsAre("oauth_db_basic Run Command failed!![string or blob too big][18]",
@@ -115,7 +115,7 @@ TEST_F(LogTest, StatementBeyondSqlitesLimitIsRefusedByIt) {
 TEST_F(LogTest, TextBeyondSqlitesLimitIsRefusedByIt) {
   OAUTHDBLog store(kTable);
   Statements::limitTextsTo(1000);
-  const Outcome outcome = runOn(store, [](auto& s) { return s.Add(textOf(1001)); });
+  const Aftermath outcome = runOn(store, [](auto& s) { return s.Add(textOf(1001)); });
   EXPECT_TRUE(failed(outcome, 18, "string or blob too big"));
   EXPECT_EQ(rowCount(kTable), 0);
 }
@@ -124,7 +124,7 @@ TEST_F(LogTest, MessageThatSqliteCannotQuoteIsStoredEmpty) {
   OAUTHDBLog store(kTable);
   const std::string message = textOf(1 << 20);
   sqlite3_hard_heap_limit64(sqlite3_memory_used() + (1 << 19));
-  const Outcome outcome = runOn(store, [&](auto& s) { return s.Add(message); });
+  const Aftermath outcome = runOn(store, [&](auto& s) { return s.Add(message); });
   sqlite3_hard_heap_limit64(0);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_utils Can't transfer to SQL format"));
@@ -134,7 +134,7 @@ TEST_F(LogTest, MessageThatSqliteCannotQuoteIsStoredEmpty) {
 TEST_F(LogTest, AddUsesTheTableOfTheObject) {
   sql("CREATE TABLE other AS SELECT * FROM oauth_log;");
   OAUTHDBLog store("other");
-  const Outcome outcome = runOn(store, [](auto& s) { return s.Add("here"); });
+  const Aftermath outcome = runOn(store, [](auto& s) { return s.Add("here"); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements,
               Contains("DELETE FROM other WHERE timestamp IN (SELECT timestamp FROM other ORDER BY "
@@ -144,7 +144,7 @@ TEST_F(LogTest, AddUsesTheTableOfTheObject) {
 
 TEST_F(LogTest, RefusedInsertLeavesSqlitesError) {
   refuse("INSERT");
-  const Outcome outcome = add("login");
+  const Aftermath outcome = add("login");
   EXPECT_TRUE(failed(outcome, 19, "no"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Run Command failed!![no][19]",
                                          "oauth_db_basic Add failed[oauth_log]"));
@@ -241,7 +241,7 @@ TEST_F(RotationTest, FailureDoesNotChangeTheResult) {
   setLimit("1");
   insertLog();
   refuse("DELETE");
-  const Outcome outcome = add("login");
+  const Aftermath outcome = add("login");
   EXPECT_TRUE(outcome.ok);
   EXPECT_EQ(rowCount(kTable), 2);
 }
@@ -251,7 +251,7 @@ TEST_F(RotationTest, FailureLeavesSqlitesError) {
   setLimit("1");
   insertLog();
   refuse("DELETE");
-  const Outcome outcome = add("login");
+  const Aftermath outcome = add("login");
   EXPECT_EQ(outcome.code, 19);
   EXPECT_EQ(outcome.message, "no");
 }
@@ -356,7 +356,7 @@ TEST_F(ListingTest, StatementHasItsPartsInOrder) {
 
 TEST_F(ListingTest, QuotesInTheOptionAreDoubled) {
   Json::Value rows;
-  const Outcome outcome = get("", "LIMIT '1'", rows);
+  const Aftermath outcome = get("", "LIMIT '1'", rows);
   EXPECT_FALSE(outcome.ok);
   EXPECT_EQ(outcome.code, 1);
   EXPECT_EQ(outcome.message, "near \"1\": syntax error");
@@ -364,7 +364,7 @@ TEST_F(ListingTest, QuotesInTheOptionAreDoubled) {
 
 TEST_F(ListingTest, BadOptionLeavesSqlitesError) {
   Json::Value rows("old");
-  const Outcome outcome = get("", "nonsense here", rows);
+  const Aftermath outcome = get("", "nonsense here", rows);
   EXPECT_TRUE(failed(outcome, 1, "near \"here\": syntax error"));
   EXPECT_THAT(outcome.lines,
               ElementsAre("oauth_db_basic Run Command failed!![near \"here\": syntax error][1]",
@@ -381,14 +381,14 @@ TEST_F(ListingTest, ListingChangesNothing) {
 // Clearing --------------------------------------------------------------------
 
 TEST_F(ListingTest, DelEmptiesTheTable) {
-  const Outcome outcome = clear();
+  const Aftermath outcome = clear();
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("DELETE FROM oauth_log;"));
   EXPECT_EQ(rowCount(kTable), 0);
 }
 
 TEST_F(LogTest, DelOfAnEmptyLogFailsWithoutACode) {
-  const Outcome outcome = clear();
+  const Aftermath outcome = clear();
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Delete failed[oauth_log]"));
 }

@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBToken;
 using support::id64;
@@ -24,16 +24,16 @@ class TokenChangeTest : public OperationsTest {
     return found.empty() ? Row() : found.front();
   }
 
-  static Outcome revoke(long long id) {
+  static Aftermath revoke(long long id) {
     return onTokens([&](auto& store) { return store.Revoke(id); });
   }
-  static Outcome remove(long long id) {
+  static Aftermath remove(long long id) {
     return onTokens([&](auto& store) { return store.Del(id); });
   }
-  static Outcome findAccess(const std::string& text, Json::Value& rows) {
+  static Aftermath findAccess(const std::string& text, Json::Value& rows) {
     return onTokens([&](auto& store) { return store.GetWithAccessToken(text, &rows); });
   }
-  static Outcome findRefresh(const std::string& text, Json::Value& rows) {
+  static Aftermath findRefresh(const std::string& text, Json::Value& rows) {
     return onTokens([&](auto& store) { return store.GetWithRefreshToken(text, &rows); });
   }
 
@@ -112,7 +112,7 @@ TEST_F(TokenChangeTest, EditWithExpiryDoublesQuotesButNotThoseOfTheExpiry) {
 
 TEST_F(TokenChangeTest, EditOfAnUnknownIdFailsWithoutACode) {
   const std::vector<Row> before = everything();
-  for (const Outcome& outcome : {editToken(99), editTokenAndExpiry(99)}) {
+  for (const Aftermath& outcome : {editToken(99), editTokenAndExpiry(99)}) {
     EXPECT_TRUE(failedSilently(outcome));
     EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Edit failed[oauth_token]"));
   }
@@ -122,7 +122,7 @@ TEST_F(TokenChangeTest, EditOfAnUnknownIdFailsWithoutACode) {
 TEST_F(TokenChangeTest, FailedEncryptionChangesNothing) {
   const std::vector<Row> before = everything();
   support::Platform::failEncryptFrom(1);
-  for (const Outcome& outcome : {editToken(1, kNew), editTokenAndExpiry(1, kNew)}) {
+  for (const Aftermath& outcome : {editToken(1, kNew), editTokenAndExpiry(1, kNew)}) {
     EXPECT_TRUE(failed(outcome, -4, "Data Encrypt failed"));
     EXPECT_THAT(outcome.statements, IsEmpty());
   }
@@ -138,7 +138,7 @@ TEST_F(TokenChangeTest, EditIgnoresTheRowLimit) {
 
 TEST_F(TokenChangeTest, DelRemovesOneRow) {
   const std::vector<Row> others = everythingBut(kTable, "1");
-  const Outcome outcome = remove(1);
+  const Aftermath outcome = remove(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("DELETE FROM oauth_token WHERE id='1';"));
   EXPECT_EQ(everything(), others);
@@ -146,7 +146,7 @@ TEST_F(TokenChangeTest, DelRemovesOneRow) {
 
 TEST_F(TokenChangeTest, RevokeRemovesTheRow) {
   const std::vector<Row> others = everythingBut(kTable, "1");
-  const Outcome outcome = revoke(1);
+  const Aftermath outcome = revoke(1);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("DELETE FROM oauth_token WHERE id='1';"));
   EXPECT_EQ(everything(), others);
@@ -162,7 +162,7 @@ TEST_F(TokenChangeTest, RevokedPairIsFoundByNeitherToken) {
 }
 
 TEST_F(TokenChangeTest, RemovingAnUnknownIdFailsWithoutACode) {
-  for (const Outcome& outcome : {remove(99), revoke(99)}) {
+  for (const Aftermath& outcome : {remove(99), revoke(99)}) {
     EXPECT_TRUE(failedSilently(outcome));
     EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Delete failed[oauth_token]"));
   }
@@ -180,7 +180,7 @@ TEST_F(TokenChangeTest, OnlyOneRevokeOfAPairSucceeds) {
 
 TEST_F(TokenChangeTest, GetWithAccessTokenDeliversTheRowInTheClear) {
   Json::Value rows;
-  const Outcome outcome = findAccess(id64('a'), rows);
+  const Aftermath outcome = findAccess(id64('a'), rows);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements,
               ElementsAre("SELECT * FROM oauth_token WHERE access_token='" + id64('a') + "' ;"));
@@ -194,7 +194,7 @@ TEST_F(TokenChangeTest, GetWithAccessTokenDeliversTheRowInTheClear) {
 
 TEST_F(TokenChangeTest, GetWithRefreshTokenDeliversTheRow) {
   Json::Value rows;
-  const Outcome outcome = findRefresh(id64('q'), rows);
+  const Aftermath outcome = findRefresh(id64('q'), rows);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements,
               ElementsAre("SELECT * FROM oauth_token WHERE refresh_token='" + id64('q') + "' ;"));
@@ -238,7 +238,7 @@ TEST_F(TokenChangeTest, TokensWithQuotesAreFoundAgain) {
 
 TEST_F(TokenChangeTest, RefusedLookUpsLeaveTheResultAlone) {
   Json::Value rows("old");
-  const Outcome access = findAccess("short", rows);
+  const Aftermath access = findAccess("short", rows);
   EXPECT_TRUE(failed(access, -2, "Bad parameters"));
   EXPECT_THAT(access.statements, IsEmpty());
   EXPECT_TRUE(failed(findRefresh("short", rows), -2, "Bad parameters"));
@@ -251,20 +251,20 @@ TEST_F(TokenChangeTest, GetIndexIsTheIdOfTheRow) {
 }
 
 TEST_F(TokenChangeTest, GetIndexOfAnUnknownTokenIsZeroWithoutACode) {
-  const Outcome outcome = onTokens([](auto& store) { return store.GetIndex(id64('z')); });
+  const Aftermath outcome = onTokens([](auto& store) { return store.GetIndex(id64('z')); });
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, IsEmpty());
 }
 
 TEST_F(TokenChangeTest, GetIndexOfAMalformedTokenIsZeroWithACode) {
-  const Outcome outcome = onTokens([](auto& store) { return store.GetIndex("short"); });
+  const Aftermath outcome = onTokens([](auto& store) { return store.GetIndex("short"); });
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_token:212 Bad parameters"));
 }
 
 TEST_F(TokenChangeTest, GetByIdDeliversTheRow) {
   Json::Value rows;
-  const Outcome outcome = onTokens([&](auto& store) { return store.Get(2LL, &rows); });
+  const Aftermath outcome = onTokens([&](auto& store) { return store.Get(2LL, &rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_token WHERE id='2' ;"));
   ASSERT_EQ(rows.size(), 1U);
@@ -279,7 +279,7 @@ TEST_F(TokenChangeTest, GetByAnUnknownIdIsAnEmptySuccess) {
 
 TEST_F(TokenChangeTest, GetOfAllDeliversEveryRow) {
   Json::Value rows;
-  const Outcome outcome = onTokens([&](auto& store) { return store.Get(&rows); });
+  const Aftermath outcome = onTokens([&](auto& store) { return store.Get(&rows); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT * FROM oauth_token ;"));
   ASSERT_EQ(rows.size(), 2U);
@@ -291,7 +291,7 @@ TEST_F(TokenChangeTest, FailedLookUpsLeaveSqlitesError) {
   OAUTHDBToken store(kTable);
   sql("DROP TABLE oauth_token;");
   Json::Value rows;
-  const Outcome outcome =
+  const Aftermath outcome =
       runOn(store, [&](auto& s) { return s.GetWithRefreshToken(id64('r'), &rows); });
   EXPECT_TRUE(failed(outcome, 1, "no such table: oauth_token"));
   EXPECT_THAT(outcome.lines,

@@ -6,7 +6,7 @@
 
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBToken;
 using support::Clock;
@@ -100,7 +100,7 @@ TEST_F(TokenIssueTest, FullTableComesBeforeABadAddressAndBadArguments) {
   writeSettings(R"({"token_max": 1})");
   insertToken();
   Json::Value out;
-  const Outcome outcome = addToken({{"ip", "999.1.1.1"}, {"username", ""}, {"state", ""}}, out);
+  const Aftermath outcome = addToken({{"ip", "999.1.1.1"}, {"username", ""}, {"state", ""}}, out);
   EXPECT_TRUE(failed(outcome, -5, "Token Table is full"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_token:60 Token Table is full"));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT COUNT(*) FROM oauth_token;"));
@@ -130,7 +130,7 @@ TEST_F(TokenIssueTest, LimitIsReadAfreshEachTime) {
 TEST_F(TokenIssueTest, FailedCountReadsAsFull) {
   OAUTHDBToken store("no_such_table");
   Json::Value out;
-  const Outcome outcome = runOn(
+  const Aftermath outcome = runOn(
       store, [&](auto& s) { return s.Add("alice", id64('n'), "read", "flow", "x", "bad", out); });
   EXPECT_TRUE(failed(outcome, -5, "Token Table is full"));
   EXPECT_THAT(outcome.lines,
@@ -142,7 +142,7 @@ TEST_F(TokenIssueTest, FailedCountReadsAsFull) {
 
 TEST_F(TokenIssueTest, BadAddressComesBeforeBadArguments) {
   Json::Value out;
-  const Outcome outcome = addToken({{"ip", "999.1.1.1"}, {"username", ""}}, out);
+  const Aftermath outcome = addToken({{"ip", "999.1.1.1"}, {"username", ""}}, out);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre(kBadAddress));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT COUNT(*) FROM oauth_token;"));
@@ -152,7 +152,7 @@ TEST_F(TokenIssueTest, BadAddressComesBeforeBadArguments) {
 
 TEST_F(TokenIssueTest, BadArgumentsSetTheCode) {
   Json::Value out;
-  const Outcome outcome = addToken({{"expired_time", std::string(129, '9')}}, out);
+  const Aftermath outcome = addToken({{"expired_time", std::string(129, '9')}}, out);
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_token:80 Bad parameters"));
   EXPECT_THAT(outcome.statements, ElementsAre("SELECT COUNT(*) FROM oauth_token;"));
@@ -161,7 +161,7 @@ TEST_F(TokenIssueTest, BadArgumentsSetTheCode) {
 
 TEST_F(TokenIssueTest, SecondUseOfAnAccessTokenFailsInTheDatabase) {
   insertToken();
-  const Outcome outcome = addToken({{"access_token", id64('a')}});
+  const Aftermath outcome = addToken({{"access_token", id64('a')}});
   EXPECT_TRUE(failed(outcome, 19, "UNIQUE constraint failed: oauth_token.access_token"));
   EXPECT_THAT(outcome.lines,
               ElementsAre("oauth_db_basic Run Command failed!![UNIQUE constraint failed: "
@@ -173,7 +173,7 @@ TEST_F(TokenIssueTest, SecondUseOfAnAccessTokenFailsInTheDatabase) {
 TEST_F(TokenIssueTest, FailedEncryptionStoresNothing) {
   support::Platform::failEncryptFrom(1);
   Json::Value out;
-  const Outcome outcome = addToken({}, out);
+  const Aftermath outcome = addToken({}, out);
   EXPECT_TRUE(failed(outcome, -4, "Data Encrypt failed"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_db_basic Data Encrypt failed"));
   EXPECT_EQ(rowCount(kTable), 0);
@@ -243,7 +243,7 @@ TEST_F(TokenIssueTest, EachIssuedPairIsAnother) {
 
 TEST_F(TokenIssueTest, IssueChecksTheAddress) {
   Json::Value out;
-  const Outcome outcome = issueToken({{"ip", "10.0.0.256"}}, out);
+  const Aftermath outcome = issueToken({{"ip", "10.0.0.256"}}, out);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre(kBadAddress));
   EXPECT_TRUE(out.isNull());

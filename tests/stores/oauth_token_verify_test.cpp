@@ -6,7 +6,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using KELDOAUTHSERVER::OAUTHDBToken;
 using support::Clock;
@@ -28,10 +28,10 @@ class VerifyTest : public StoreTest {
     Clock::setTo(kNow);
   }
 
-  static Outcome verify(const std::string& token, Json::Value& result) {
+  static Aftermath verify(const std::string& token, Json::Value& result) {
     return onTokens([&](auto& store) { return store.Verify(token, result); });
   }
-  static Outcome verify(const std::string& token = id64('a')) {
+  static Aftermath verify(const std::string& token = id64('a')) {
     Json::Value result;
     return verify(token, result);
   }
@@ -45,7 +45,7 @@ class VerifyTest : public StoreTest {
 TEST_F(VerifyTest, ValidTokenTellsUserScopeAndState) {
   insertToken({{"username", "bob"}, {"scope", "write"}, {"state", "abc"}});
   Json::Value result;
-  const Outcome outcome = verify(id64('a'), result);
+  const Aftermath outcome = verify(id64('a'), result);
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.lines, IsEmpty());
   EXPECT_THAT(result.getMemberNames(), ElementsAre("scope", "state", "username"));
@@ -117,7 +117,7 @@ TEST_F(VerifyTest, ClockIsReadOnce) {
 TEST_F(VerifyTest, ExpiredTokenIsReportedInTheResultAlone) {
   insertTokenExpiring(std::to_string(kNow - 1));
   Json::Value result;
-  const Outcome outcome = verify(id64('a'), result);
+  const Aftermath outcome = verify(id64('a'), result);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, IsEmpty());
   EXPECT_THAT(result.getMemberNames(), ElementsAre("err_code", "err_msg"));
@@ -128,7 +128,7 @@ TEST_F(VerifyTest, ExpiredTokenIsReportedInTheResultAlone) {
 
 TEST_F(VerifyTest, UnknownTokenReadsAsExpired) {
   Json::Value result;
-  const Outcome outcome = verify(id64('z'), result);
+  const Aftermath outcome = verify(id64('z'), result);
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, IsEmpty());
   EXPECT_EQ(result["err_code"].asInt(), -3);
@@ -168,7 +168,7 @@ TEST_F(VerifyTest, UnknownTokenIsNotExpiredAtTheStartOfTime) {
 
 TEST_F(VerifyTest, TokenOfAnotherLengthIsReportedTwice) {
   Json::Value result;
-  const Outcome outcome = verify("ten bytes!", result);
+  const Aftermath outcome = verify("ten bytes!", result);
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.lines, ElementsAre("oauth_token:212 Bad parameters"));
   EXPECT_TRUE(result["err_code"].isInt());
@@ -180,7 +180,7 @@ TEST_F(VerifyTest, StatementThatFailsIsReportedTwice) {
   OAUTHDBToken store(kTable);
   sql("DROP TABLE oauth_token;");
   Json::Value result;
-  const Outcome outcome = runOn(store, [&](auto& s) { return s.Verify(id64('a'), result); });
+  const Aftermath outcome = runOn(store, [&](auto& s) { return s.Verify(id64('a'), result); });
   EXPECT_TRUE(failed(outcome, 1, "no such table: oauth_token"));
   EXPECT_EQ(result["err_code"].asInt(), 1);
   EXPECT_EQ(result["err_msg"].asString(), "no such table: oauth_token");
@@ -213,7 +213,7 @@ class ExpiryTextTest : public VerifyTest, public ::testing::WithParamInterface<E
 
 TEST_P(ExpiryTextTest, IsReadByVerify) {
   insertTokenExpiring(GetParam().text);
-  const Outcome outcome = verify();
+  const Aftermath outcome = verify();
   EXPECT_EQ(outcome.ok, GetParam().valid);
   EXPECT_EQ(outcome.code, kCodeBefore);
 }

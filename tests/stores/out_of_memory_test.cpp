@@ -10,7 +10,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 #include "tests/support/allocations.h"
 
 using namespace KELDOAUTHSERVER;
@@ -343,15 +343,15 @@ template <typename Store>
 void lendWithoutMemory(OAUTHDBBasic& owner) {
   const std::string table = "a_table_name_of_more_than_fifteen_bytes";
   std::optional<Store> lent;
-  const int failures = failEachAllocation(
-      [&] { lent.emplace(table, owner); },
-      [&](int nth) {
-        EXPECT_EQ(lent->DBCmd("SELECT 1;", nullptr, nullptr), 0) << nth;
-        EXPECT_EQ(lent->GetErrCode(), kNoMemory) << nth;
-        EXPECT_EQ(lent->GetErrMsg(), "out of memory") << nth;
-        EXPECT_EQ(SystemLog::count(kUnexpected), 1) << nth;
-        SystemLog::clear();
-      });
+  const int failures = failEachAllocation([&] { lent.emplace(table, owner); },
+                                          [&](int nth) {
+                                            EXPECT_EQ(lent->DBCmd("SELECT 1;", nullptr, nullptr), 0)
+                                                << nth;
+                                            EXPECT_EQ(lent->GetErrCode(), kNoMemory) << nth;
+                                            EXPECT_EQ(lent->GetErrMsg(), "out of memory") << nth;
+                                            EXPECT_EQ(SystemLog::count(kUnexpected), 1) << nth;
+                                            SystemLog::clear();
+                                          });
   EXPECT_EQ(failures, 1);
   EXPECT_EQ(lent->GetTabName(), table);
   EXPECT_EQ(lent->GetErrCode(), 255);

@@ -9,7 +9,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using namespace KELDOAUTHSERVER;
 using support::Clock;
@@ -30,14 +30,14 @@ struct Expiring {
   std::string name;
   std::string table;
   /// A purge by an object of its own, with what is done right before and after.
-  std::function<Outcome(const Step& before, const Step& after)> purge;
+  std::function<Aftermath(const Step& before, const Step& after)> purge;
 };
 void PrintTo(const Expiring& kind, std::ostream* out) {
   *out << kind.name;
 }
 
 template <typename Store>
-Outcome purgeBy(Store& store, const Step& before, const Step& after) {
+Aftermath purgeBy(Store& store, const Step& before, const Step& after) {
   return runOn(store, [&](Store& self) {
     before(self);
     const auto purged = self.Purge();
@@ -93,7 +93,7 @@ class PurgeTest : public StoreTest, public ::testing::WithParamInterface<Expirin
   }
 
   static const std::string& table() { return GetParam().table; }
-  static Outcome purge(const Step& before = nothing, const Step& after = nothing) {
+  static Aftermath purge(const Step& before = nothing, const Step& after = nothing) {
     return GetParam().purge(before, after);
   }
   static bool isCodes() { return table() == names::kGrantCodeTable; }
@@ -129,7 +129,7 @@ class PurgeTest : public StoreTest, public ::testing::WithParamInterface<Expirin
 // Which rows --------------------------------------------------------------------
 
 TEST_P(PurgeTest, OfAnEmptyTableSucceeds) {
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre(select()));
 }
@@ -182,7 +182,7 @@ TEST_P(PurgeTest, RemovesRowsThatCannotBeDecrypted) {
 
 TEST_P(PurgeTest, SucceedsWhenTheRowsCannotBeRead) {
   const std::string missing = "no such table: " + table();
-  const Outcome outcome =
+  const Aftermath outcome =
       purge([](OAUTHDBBasic& /*store*/) { sql("DROP TABLE " + table() + ";"); });
   EXPECT_TRUE(outcome.ok);
   EXPECT_EQ(outcome.code, 1);
@@ -195,14 +195,14 @@ TEST_P(PurgeTest, SucceedsWhenTheRowsCannotBeRead) {
 
 TEST_P(PurgeTest, OfOneRowNeedsNoTransaction) {
   insertExpiringAt({5, kNow});
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre(select(), deletion(1)));
 }
 
 TEST_P(PurgeTest, OfSeveralRowsIsOneTransaction) {
   insertExpiringAt({5, kNow, 6, 7});
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre(select(), "BEGIN IMMEDIATE", deletion(1), deletion(3),
                                               deletion(4), "COMMIT"));
@@ -235,7 +235,7 @@ TEST_P(PurgeTest, OfManyRowsLeavesNoneAndNoTransactionOpen) {
 TEST_P(PurgeTest, RefusedDeletionDoesNotStopTheOthers) {
   insertExpiringAt({5, 6, 7});
   refuseDeletion(2, "ABORT");
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(failed(outcome, 19, "kept"));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("kept", 19), deleteFailed()));
   EXPECT_THAT(ids(table()), ElementsAre("2"));
@@ -256,7 +256,7 @@ TEST_P(PurgeTest, RowThatAnotherRemovedFirstFailsWithoutACode) {
       sql("DELETE FROM " + table() + " WHERE id=1;");
     }
   });
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(failedSilently(outcome));
   EXPECT_THAT(outcome.lines, ElementsAre(deleteFailed()));
   EXPECT_THAT(ids(table()), IsEmpty());
@@ -268,7 +268,7 @@ TEST_P(PurgeTest, DeletionThatEndsTheTransactionEndsThePurge) {
   insertExpiringAt({5, 6, 7});
   const std::vector<Row> before = everything();
   refuseDeletion(2, "ROLLBACK");
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(failed(outcome, 19, "kept"));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("kept", 19), deleteFailed()));
   EXPECT_THAT(outcome.statements,
@@ -285,7 +285,7 @@ void begin(OAUTHDBBasic& store) {
 
 TEST_P(PurgeTest, InsideATransactionOfTheCallersRunsOneByOne) {
   insertExpiringAt({5, 6});
-  const Outcome outcome = purge(begin, [](OAUTHDBBasic& store) {
+  const Aftermath outcome = purge(begin, [](OAUTHDBBasic& store) {
     EXPECT_THAT(ids(table()), ElementsAre("1", "2"));  // not yet for others
     Statements::clear();
     store.DBCmd("COMMIT;", nullptr, nullptr);
@@ -299,7 +299,7 @@ TEST_P(PurgeTest, InsideATransactionOfTheCallersRunsOneByOne) {
 
 TEST_P(PurgeTest, RefusedBeginIsFollowedByNoCommit) {
   insertExpiringAt({5, 6});
-  const Outcome outcome = purge(begin);
+  const Aftermath outcome = purge(begin);
   EXPECT_THAT(outcome.statements,
               ElementsAre("BEGIN;", select(), "BEGIN IMMEDIATE", deletion(1), deletion(2)));
 }
@@ -315,7 +315,7 @@ TEST_P(PurgeTest, WritersLockEndsItAtTheBegin) {
   insertExpiringAt({5, 6});
   Lock lock(kDatabase);
   lock.write();
-  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
+  const Aftermath outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
   EXPECT_TRUE(failed(outcome, 5, "database is locked"));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("database is locked", 5)));
   EXPECT_EQ(outcome.statements.back(), "BEGIN IMMEDIATE");
@@ -335,7 +335,7 @@ TEST_P(PurgeTest, OfOneRowMeetsAWritersLockOnce) {
   insertExpiringAt({5});
   Lock lock(kDatabase);
   lock.write();
-  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
+  const Aftermath outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
   EXPECT_TRUE(failed(outcome, 5, "database is locked"));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("database is locked", 5), deleteFailed()));
   EXPECT_EQ(Statements::waits(), 1);
@@ -343,7 +343,7 @@ TEST_P(PurgeTest, OfOneRowMeetsAWritersLockOnce) {
 
 TEST_P(PurgeTest, BeginRefusedForAnotherReasonRunsOneByOneWithTheErrorAsItWas) {
   insertExpiringAt({5, 6, kNow});
-  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseBegins(); });
+  const Aftermath outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseBegins(); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.statements, ElementsAre(select(), deletion(1), deletion(2)));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("not authorized", 23)));
@@ -353,7 +353,7 @@ TEST_P(PurgeTest, BeginRefusedForAnotherReasonRunsOneByOneWithTheErrorAsItWas) {
 TEST_P(PurgeTest, OneByOneARefusedDeletionIsTheReasonKept) {
   insertExpiringAt({5, 6, 7});
   refuseDeletion(2, "ABORT");
-  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseBegins(); });
+  const Aftermath outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseBegins(); });
   EXPECT_TRUE(failed(outcome, 19, "kept"));
   EXPECT_THAT(ids(table()), ElementsAre("2"));
 }
@@ -363,7 +363,7 @@ TEST_P(PurgeTest, CallersTransactionThatIsLostEndsThePurge) {
   insertExpiringAt({5, 6, 7});
   const std::vector<Row> before = everything();
   refuseDeletion(2, "ROLLBACK");
-  const Outcome outcome = purge(begin);
+  const Aftermath outcome = purge(begin);
   EXPECT_TRUE(failed(outcome, 19, "kept"));
   EXPECT_THAT(outcome.statements,
               ElementsAre("BEGIN;", select(), "BEGIN IMMEDIATE", deletion(1), deletion(2)));
@@ -378,7 +378,7 @@ TEST_P(PurgeTest, ReadersLockRefusesTheCommitAndEveryRowIsBack) {
   const std::vector<Row> before = everything();
   Lock lock(kDatabase);
   lock.read(table());
-  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
+  const Aftermath outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::dontWaitForLocks(); });
   EXPECT_TRUE(failed(outcome, 5, "database is locked"));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("database is locked", 5)));
   EXPECT_EQ(outcome.statements.back(), "ROLLBACK");
@@ -387,8 +387,9 @@ TEST_P(PurgeTest, ReadersLockRefusesTheCommitAndEveryRowIsBack) {
 
 TEST_P(PurgeTest, CommitThatSqliteTurnsIntoARollbackIsAFailure) {
   insertExpiringAt({5, 6});
-  const Outcome outcome = purge([](OAUTHDBBasic& /*store*/) { Statements::refuseCommits(true); },
-                                [](OAUTHDBBasic& /*store*/) { Statements::refuseCommits(false); });
+  const Aftermath outcome =
+      purge([](OAUTHDBBasic& /*store*/) { Statements::refuseCommits(true); },
+            [](OAUTHDBBasic& /*store*/) { Statements::refuseCommits(false); });
   EXPECT_TRUE(failed(outcome, 19, "constraint failed"));
   EXPECT_THAT(outcome.lines, ElementsAre(commandFailed("constraint failed", 19)));
   EXPECT_EQ(outcome.statements.back(), "COMMIT");  // there is nothing left to take back
@@ -411,7 +412,7 @@ TEST_P(PurgeTest, PurgeAfterARefusedCommitWorks) {
 TEST_P(PurgeTest, FailedDeletionIsTheReasonKeptWhenTheCommitWorks) {
   insertExpiringAt({5, 6, 7});
   refuseDeletion(1, "FAIL");
-  const Outcome outcome = purge();
+  const Aftermath outcome = purge();
   EXPECT_TRUE(failed(outcome, 19, "kept"));
   EXPECT_EQ(outcome.statements.back(), "COMMIT");
   EXPECT_THAT(ids(table()), ElementsAre("1"));

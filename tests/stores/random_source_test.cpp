@@ -10,7 +10,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 #include "tests/utils/kernel.h"
 #include "utils/oauth_utils.h"
 
@@ -23,7 +23,7 @@ struct Generator {
   const char* name;
   const char* table;
   const char* source;
-  std::function<Outcome(Json::Value& out)> run;
+  std::function<Aftermath(Json::Value& out)> run;
   std::size_t pieces;  // of 32 characters each
 };
 void PrintTo(const Generator& generator, std::ostream* out) {
@@ -78,7 +78,7 @@ TEST_P(FailingSourceTest, StoresNothing) {
   for (std::size_t call = 1; call <= GetParam().pieces; ++call) {
     failFrom(call);
     Json::Value out;
-    const Outcome outcome = GetParam().run(out);
+    const Aftermath outcome = GetParam().run(out);
     EXPECT_TRUE(failed(outcome, 7, "out of memory")) << call;
     EXPECT_THAT(outcome.lines,
                 ElementsAre(std::string(GetParam().source) +
@@ -110,7 +110,7 @@ TEST_P(FailingSourceTest, ThatRepeatsItselfMeetsTheUniqueColumn) {
   countUp();
   EXPECT_TRUE(succeeded(GetParam().run(out)));
   countUp();
-  const Outcome outcome = GetParam().run(out);
+  const Aftermath outcome = GetParam().run(out);
   EXPECT_FALSE(outcome.ok);
   EXPECT_EQ(outcome.code, 19);
   EXPECT_EQ(rowCount(GetParam().table), 1);

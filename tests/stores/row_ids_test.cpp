@@ -7,7 +7,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using namespace KELDOAUTHSERVER;
 using support::id64;

@@ -7,7 +7,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using support::id64;
 using support::Row;
@@ -23,7 +23,7 @@ namespace {
 
 struct WriterCase {
   const char* name;
-  std::function<Outcome(Json::Value& out)> run;
+  std::function<Aftermath(Json::Value& out)> run;
 };
 void PrintTo(const WriterCase& writer, std::ostream* out) {
   *out << writer.name;
@@ -81,7 +81,7 @@ class WrongShapeTest : public OperationsTest,
 TEST_P(WrongShapeTest, IsRefusedBeforeAnythingIsWritten) {
   const std::vector<Row> before = everything();
   Json::Value out = shape().document;
-  const Outcome outcome = writer().run(out);
+  const Aftermath outcome = writer().run(out);
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.statements, Each(Not(StartsWith("INSERT"))));
   EXPECT_EQ(out, shape().document);
@@ -121,7 +121,7 @@ TEST_F(WrongShapeOrderTest, EmptyDocumentBecomesAnObject) {
 
 struct LookUpCase {
   const char* name;
-  std::function<Outcome(Json::Value* rows)> run;
+  std::function<Aftermath(Json::Value* rows)> run;
 };
 void PrintTo(const LookUpCase& c, std::ostream* out) {
   *out << c.name;
@@ -169,7 +169,7 @@ const LookUpCase kLookUps[] = {
 class LookUpShapeTest : public OperationsTest, public ::testing::WithParamInterface<LookUpCase> {};
 
 TEST_P(LookUpShapeTest, NullPointerIsRefused) {
-  const Outcome outcome = GetParam().run(nullptr);
+  const Aftermath outcome = GetParam().run(nullptr);
   EXPECT_TRUE(failed(outcome, -2, "Bad parameters"));
   EXPECT_THAT(outcome.statements, IsEmpty());
 }

@@ -58,7 +58,7 @@ Lines journalOf(const std::string& source) {
   return entries;
 }
 
-::testing::AssertionResult succeeded(const Outcome& outcome) {
+::testing::AssertionResult succeeded(const Aftermath& outcome) {
   if (outcome.ok && outcome.code == kCodeBefore && outcome.message == kMessageBefore) {
     return ::testing::AssertionSuccess();
   }
@@ -67,7 +67,7 @@ Lines journalOf(const std::string& source) {
          << outcome.message << "\", lines: " << ::testing::PrintToString(outcome.lines);
 }
 
-::testing::AssertionResult failed(const Outcome& outcome, int code, const std::string& message) {
+::testing::AssertionResult failed(const Aftermath& outcome, int code, const std::string& message) {
   if (!outcome.ok && outcome.code == code && outcome.message == message) {
     return ::testing::AssertionSuccess();
   }
@@ -77,7 +77,7 @@ Lines journalOf(const std::string& source) {
          << "\", lines: " << ::testing::PrintToString(outcome.lines);
 }
 
-::testing::AssertionResult failedSilently(const Outcome& outcome) {
+::testing::AssertionResult failedSilently(const Aftermath& outcome) {
   return failed(outcome, kCodeBefore, kMessageBefore);
 }
 

@@ -21,7 +21,7 @@
 using Lines = std::vector<std::string>;
 
 /// What an operation left behind, besides rows.
-struct Outcome {
+struct Aftermath {
   bool ok = false;
   int code = 0;
   std::string message;
@@ -43,12 +43,12 @@ Lines journalOf(const std::string& source);
 
 /// An operation on `store`, whose error is set to the one before.
 template <typename Store, typename Operation>
-Outcome runOn(Store& store, Operation operation) {
+Aftermath runOn(Store& store, Operation operation) {
   store.SetErrCode(kCodeBefore);
   store.SetErrMsg(kMessageBefore);
   support::SystemLog::clear();
   Statements::clear();
-  Outcome outcome;
+  Aftermath outcome;
   outcome.ok = static_cast<bool>(operation(store));
   outcome.lines = journal();
   outcome.statements = Statements::texts();
@@ -59,34 +59,34 @@ Outcome runOn(Store& store, Operation operation) {
 
 /// The same on an object that is made for it.
 template <typename Store, typename Operation>
-Outcome run(const char* table, Operation operation) {
+Aftermath run(const char* table, Operation operation) {
   Store store(table);
   return runOn(store, operation);
 }
 template <typename Operation>
-Outcome onClients(Operation operation) {
+Aftermath onClients(Operation operation) {
   return run<KELDOAUTHSERVER::OAUTHDBClientInfo>(KELDOAUTHSERVER::names::kClientInfoTable,
                                                  operation);
 }
 template <typename Operation>
-Outcome onCodes(Operation operation) {
+Aftermath onCodes(Operation operation) {
   return run<KELDOAUTHSERVER::OAUTHDBGrantCode>(KELDOAUTHSERVER::names::kGrantCodeTable, operation);
 }
 template <typename Operation>
-Outcome onTokens(Operation operation) {
+Aftermath onTokens(Operation operation) {
   return run<KELDOAUTHSERVER::OAUTHDBToken>(KELDOAUTHSERVER::names::kTokenTable, operation);
 }
 template <typename Operation>
-Outcome onLog(Operation operation) {
+Aftermath onLog(Operation operation) {
   return run<KELDOAUTHSERVER::OAUTHDBLog>(KELDOAUTHSERVER::names::kLogTable, operation);
 }
 
 /// Success that leaves the object's error as it was.
-::testing::AssertionResult succeeded(const Outcome& outcome);
+::testing::AssertionResult succeeded(const Aftermath& outcome);
 /// Failure with this error.
-::testing::AssertionResult failed(const Outcome& outcome, int code, const std::string& message);
+::testing::AssertionResult failed(const Aftermath& outcome, int code, const std::string& message);
 /// Failure that leaves the object's error as it was.
-::testing::AssertionResult failedSilently(const Outcome& outcome);
+::testing::AssertionResult failedSilently(const Aftermath& outcome);
 
 /// What the file holds in place of a client's identifier or secret.
 std::string cipher(const std::string& text);

@@ -8,7 +8,7 @@
 #include <ostream>
 #include <string>
 
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 using support::id64;
 using support::LogLine;
@@ -23,7 +23,7 @@ namespace {
 
 struct TraceCase {
   const char* name;
-  std::function<Outcome()> run;
+  std::function<Aftermath()> run;
   Lines expected;  // at log level 1
 };
 void PrintTo(const TraceCase& c, std::ostream* out) {
@@ -36,7 +36,7 @@ class TraceTest : public OperationsTest, public ::testing::WithParamInterface<Tr
   static Lines linesAtLevel(int level) {
     Lines lines;
     withDiagnostics(level, [&] {
-      const Outcome outcome = GetParam().run();
+      const Aftermath outcome = GetParam().run();
       EXPECT_TRUE(succeeded(outcome));
       lines = outcome.lines;
     });
@@ -65,7 +65,7 @@ TEST_P(TraceTest, IsEmptyAtLevel0) {
 
 TEST_P(TraceTest, IsEmptyWithoutTheFlagFile) {
   writeSettings(R"({"log_level": 15})");
-  Outcome outcome;
+  Aftermath outcome;
   inFreshThread([&] { outcome = GetParam().run(); });
   EXPECT_TRUE(succeeded(outcome));
   EXPECT_THAT(outcome.lines, IsEmpty());
@@ -254,7 +254,7 @@ INSTANTIATE_TEST_SUITE_P(Log, TraceTest, ::testing::ValuesIn(logTraces()),
 class RefusalTraceTest : public OperationsTest, public ::testing::WithParamInterface<Operation> {
  protected:
   /// An operation refuses its first argument, empty.
-  static Outcome refuse() {
+  static Aftermath refuse() {
     Json::Value out;
     for (const Argument& argument : GetParam().arguments) {
       if (argument.stored == Stored::kGenerated) continue;
@@ -304,8 +304,8 @@ TEST_F(StoreFormatTest, EntryLineHasItsNameApart) {
 TEST_F(StoreFormatTest, FullTableLinesHaveNoArgumentsOfTheirOwn) {
   writeSettings(R"({"client_info_max": 1, "grantcode_max": 1, "token_max": 1})");
   for (const auto& [run, format] :
-       {std::pair<std::function<Outcome()>, std::string>{[] { return addClient(); },
-                                                         "%s:%d ClientInfo Table is full"},
+       {std::pair<std::function<Aftermath()>, std::string>{[] { return addClient(); },
+                                                           "%s:%d ClientInfo Table is full"},
         {[] { return addCode(); }, "%s:%d GrantCode Table is full"},
         {[] { return addToken(); }, "%s:%d Token Table is full"}}) {
     run();
@@ -315,7 +315,7 @@ TEST_F(StoreFormatTest, FullTableLinesHaveNoArgumentsOfTheirOwn) {
 }
 
 TEST_F(StoreFormatTest, BadAddressLineHasTheReasonApart) {
-  for (const Outcome& outcome : {addCode({{"ip", "x"}}), addToken({{"ip", "x"}})}) {
+  for (const Aftermath& outcome : {addCode({{"ip", "x"}}), addToken({{"ip", "x"}})}) {
     EXPECT_FALSE(outcome.ok);
     EXPECT_EQ(SystemLog::lines().front().format, "%s:%d Bad IP address[%s]");
     EXPECT_EQ(SystemLog::lines().front().priority, 3);

@@ -1,8 +1,8 @@
 // Every operation of every store, each on the same small household of rows, in
 // a form that a fault can be thrown into at any point.
 
-#ifndef KELDOAUTH_TESTS_FAULTS_OPERATIONS_H
-#define KELDOAUTH_TESTS_FAULTS_OPERATIONS_H
+#ifndef KELDOAUTH_TESTS_FAULTS_EVERY_OPERATION_H
+#define KELDOAUTH_TESTS_FAULTS_EVERY_OPERATION_H
 
 #include <functional>
 #include <memory>
@@ -75,4 +75,4 @@ void PrintTo(const Operation& operation, std::ostream* out);
 
 }  // namespace faults
 
-#endif  // KELDOAUTH_TESTS_FAULTS_OPERATIONS_H
+#endif  // KELDOAUTH_TESTS_FAULTS_EVERY_OPERATION_H

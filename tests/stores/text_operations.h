@@ -1,8 +1,8 @@
 // The operations of the stores that take texts, each callable with the
 // arguments that a test wants different from the usual ones.
 
-#ifndef KELDOAUTH_TESTS_STORES_OPERATIONS_H
-#define KELDOAUTH_TESTS_STORES_OPERATIONS_H
+#ifndef KELDOAUTH_TESTS_STORES_TEXT_OPERATIONS_H
+#define KELDOAUTH_TESTS_STORES_TEXT_OPERATIONS_H
 
 #include <json/value.h>
 
@@ -16,25 +16,25 @@
 /// Arguments by the names of their columns.
 using Texts = support::Row;
 
-Outcome addClient(const Texts& changes, Json::Value& out);
-Outcome addClient(const Texts& changes = {});
-Outcome addGeneratedClient(const Texts& changes, Json::Value& out);  // both generated
-Outcome addClientWithSecret(const Texts& changes, Json::Value& out);
-Outcome editClient(long long id, const Texts& changes = {});
+Aftermath addClient(const Texts& changes, Json::Value& out);
+Aftermath addClient(const Texts& changes = {});
+Aftermath addGeneratedClient(const Texts& changes, Json::Value& out);  // both generated
+Aftermath addClientWithSecret(const Texts& changes, Json::Value& out);
+Aftermath editClient(long long id, const Texts& changes = {});
 
-Outcome addCode(const Texts& changes, Json::Value& out);
-Outcome addCode(const Texts& changes = {});
-Outcome issueCode(const Texts& changes, Json::Value& out);  // code and expiry generated
-Outcome issueCode(const Texts& changes = {});
-Outcome editCode(long long id, const Texts& changes = {});
-Outcome editCodeAndExpiry(long long id, const Texts& changes = {});
+Aftermath addCode(const Texts& changes, Json::Value& out);
+Aftermath addCode(const Texts& changes = {});
+Aftermath issueCode(const Texts& changes, Json::Value& out);  // code and expiry generated
+Aftermath issueCode(const Texts& changes = {});
+Aftermath editCode(long long id, const Texts& changes = {});
+Aftermath editCodeAndExpiry(long long id, const Texts& changes = {});
 
-Outcome addToken(const Texts& changes, Json::Value& out);
-Outcome addToken(const Texts& changes = {});
-Outcome issueToken(const Texts& changes, Json::Value& out);  // tokens and expiry generated
-Outcome issueToken(const Texts& changes = {});
-Outcome editToken(long long id, const Texts& changes = {});
-Outcome editTokenAndExpiry(long long id, const Texts& changes = {});
+Aftermath addToken(const Texts& changes, Json::Value& out);
+Aftermath addToken(const Texts& changes = {});
+Aftermath issueToken(const Texts& changes, Json::Value& out);  // tokens and expiry generated
+Aftermath issueToken(const Texts& changes = {});
+Aftermath editToken(long long id, const Texts& changes = {});
+Aftermath editTokenAndExpiry(long long id, const Texts& changes = {});
 
 /// How the file holds an argument that an operation was given; kGenerated marks
 /// one that it checks, but does not get.
@@ -56,7 +56,7 @@ struct Operation {
   int refusalCode;      // kCodeBefore for a refusal that sets none
   std::string refusal;  // the line
   std::string row;      // the id of the row that it writes; empty for a look-up
-  std::function<Outcome(const Texts& changes, Json::Value& out)> run;
+  std::function<Aftermath(const Texts& changes, Json::Value& out)> run;
 
   [[nodiscard]] std::string refusalMessage() const {
     return refusalCode == kCodeBefore ? kMessageBefore : "Bad parameters";
@@ -88,4 +88,4 @@ class OperationsTest : public StoreTest {
 /// "A text of this many bytes."
 std::string textOf(std::size_t bytes);
 
-#endif  // KELDOAUTH_TESTS_STORES_OPERATIONS_H
+#endif  // KELDOAUTH_TESTS_STORES_TEXT_OPERATIONS_H

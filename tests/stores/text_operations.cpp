@@ -1,4 +1,4 @@
-#include "tests/stores/operations.h"
+#include "tests/stores/text_operations.h"
 
 #include <ostream>
 #include <utility>
@@ -80,7 +80,7 @@ std::vector<Operation> clientOperations() {
   const char* table = names::kClientInfoTable;
   const std::string refusedAdd = "oauth_clientInfo:76 Bad parameters";
   const std::string refusedGet = "oauth_clientInfo:180 Bad parameters";
-  using Add = Outcome (*)(const Texts&, Json::Value&);
+  using Add = Aftermath (*)(const Texts&, Json::Value&);
   return {
       {"ClientAdd",
        table,
@@ -135,7 +135,7 @@ std::vector<Operation> codeOperations() {
   const char* table = names::kGrantCodeTable;
   const std::string refusedAdd = "oauth_grantCode:71 Bad parameters";
   const std::string refusedGet = "oauth_grantCode:194 Bad parameters";
-  using Add = Outcome (*)(const Texts&, Json::Value&);
+  using Add = Aftermath (*)(const Texts&, Json::Value&);
   return {
       {"CodeAdd",
        table,
@@ -189,7 +189,7 @@ std::vector<Operation> codeOperations() {
 std::vector<Operation> tokenChanges() {
   const char* table = names::kTokenTable;
   const std::string refusedAdd = "oauth_token:80 Bad parameters";
-  using Add = Outcome (*)(const Texts&, Json::Value&);
+  using Add = Aftermath (*)(const Texts&, Json::Value&);
   return {
       {"TokenAdd",
        table,
@@ -275,71 +275,71 @@ std::vector<Operation> tokenLookups() {
 
 }  // namespace
 
-Outcome addClient(const Texts& changes, Json::Value& out) {
+Aftermath addClient(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onClients([&](auto& store) {
     return store.Add(a["client_id"], a["client_secret"], a["redirect_uri"], a["scope"],
                      a["display_name"], a["enable"], out);
   });
 }
-Outcome addClient(const Texts& changes) {
+Aftermath addClient(const Texts& changes) {
   Json::Value out;
   return addClient(changes, out);
 }
-Outcome addGeneratedClient(const Texts& changes, Json::Value& out) {
+Aftermath addGeneratedClient(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onClients([&](auto& store) {
     return store.Add(a["redirect_uri"], a["scope"], a["display_name"], out);
   });
 }
-Outcome addClientWithSecret(const Texts& changes, Json::Value& out) {
+Aftermath addClientWithSecret(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onClients([&](auto& store) {
     return store.Add(a["client_secret"], a["redirect_uri"], a["scope"], a["display_name"], out);
   });
 }
-Outcome editClient(long long id, const Texts& changes) {
+Aftermath editClient(long long id, const Texts& changes) {
   const Arguments a(changes);
   return onClients([&](auto& store) {
     return store.Edit(id, a["redirect_uri"], a["scope"], a["display_name"]);
   });
 }
 
-Outcome addCode(const Texts& changes, Json::Value& out) {
+Aftermath addCode(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onCodes([&](auto& store) {
     return store.Add(a["username"], a["client_id"], a["scope"], a["code"], a["expired_time"],
                      a["state"], a["ip"], out);
   });
 }
-Outcome addCode(const Texts& changes) {
+Aftermath addCode(const Texts& changes) {
   Json::Value out;
   return addCode(changes, out);
 }
-Outcome issueCode(const Texts& changes, Json::Value& out) {
+Aftermath issueCode(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onCodes([&](auto& store) {
     return store.Add(a["username"], a["client_id"], a["scope"], a["state"], a["ip"], out);
   });
 }
-Outcome issueCode(const Texts& changes) {
+Aftermath issueCode(const Texts& changes) {
   Json::Value out;
   return issueCode(changes, out);
 }
-Outcome editCode(long long id, const Texts& changes) {
+Aftermath editCode(long long id, const Texts& changes) {
   const Arguments a(changes);
   return onCodes([&](auto& store) {
     return store.Edit(id, a["username"], a["client_id"], a["scope"], a["state"]);
   });
 }
-Outcome editCodeAndExpiry(long long id, const Texts& changes) {
+Aftermath editCodeAndExpiry(long long id, const Texts& changes) {
   const Arguments a(changes);
   return onCodes([&](auto& store) {
     return store.Edit(id, a["username"], a["client_id"], a["scope"], a["expired_time"], a["state"]);
   });
 }
 
-Outcome addToken(const Texts& changes, Json::Value& out) {
+Aftermath addToken(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onTokens([&](auto& store) {
     return store.Add(a["username"], a["client_id"], a["scope"], a["refresh_token"],
@@ -347,28 +347,28 @@ Outcome addToken(const Texts& changes, Json::Value& out) {
                      out);
   });
 }
-Outcome addToken(const Texts& changes) {
+Aftermath addToken(const Texts& changes) {
   Json::Value out;
   return addToken(changes, out);
 }
-Outcome issueToken(const Texts& changes, Json::Value& out) {
+Aftermath issueToken(const Texts& changes, Json::Value& out) {
   const Arguments a(changes);
   return onTokens([&](auto& store) {
     return store.Add(a["username"], a["client_id"], a["scope"], a["flow_type"], a["state"], a["ip"],
                      out);
   });
 }
-Outcome issueToken(const Texts& changes) {
+Aftermath issueToken(const Texts& changes) {
   Json::Value out;
   return issueToken(changes, out);
 }
-Outcome editToken(long long id, const Texts& changes) {
+Aftermath editToken(long long id, const Texts& changes) {
   const Arguments a(changes);
   return onTokens([&](auto& store) {
     return store.Edit(id, a["username"], a["client_id"], a["scope"], a["flow_type"], a["state"]);
   });
 }
-Outcome editTokenAndExpiry(long long id, const Texts& changes) {
+Aftermath editTokenAndExpiry(long long id, const Texts& changes) {
   const Arguments a(changes);
   return onTokens([&](auto& store) {
     return store.Edit(id, a["username"], a["client_id"], a["scope"], a["expired_time"],

@@ -1,8 +1,8 @@
 // Backup, restore and rekey as an operator would run them, and as they are when
 // the machine stops half way.
 
-#ifndef KELDOAUTH_TESTS_OPERATIONS_OPERATIONS_H
-#define KELDOAUTH_TESTS_OPERATIONS_OPERATIONS_H
+#ifndef KELDOAUTH_TESTS_OPERATIONS_OPERATIONS_TEST_H
+#define KELDOAUTH_TESTS_OPERATIONS_OPERATIONS_TEST_H
 
 #include <sys/types.h>
 
@@ -123,4 +123,4 @@ void Operations::failAtEachStep(const Arguments& arguments, Prepare prepare, Che
 
 }  // namespace operations
 
-#endif  // KELDOAUTH_TESTS_OPERATIONS_OPERATIONS_H
+#endif  // KELDOAUTH_TESTS_OPERATIONS_OPERATIONS_TEST_H

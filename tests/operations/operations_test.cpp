@@ -1,4 +1,4 @@
-#include "tests/operations/operations.h"
+#include "tests/operations/operations_test.h"
 
 #include <sqlite3.h>
 #include <sys/stat.h>

@@ -1,4 +1,4 @@
-#include "tests/faults/operations.h"
+#include "tests/faults/every_operation.h"
 
 #include <sqlite3.h>
 
