@@ -53,7 +53,7 @@ BareStore::BareStore(Sync sync) : sync_(sync) {
   sqlite3_busy_timeout(db_, 5000);
   if (sync == Sync::kExtra) run(schema::kSyncFolderToo);
   select("SELECT * FROM sqlite_master WHERE name='oauth_meta' and type='table';");
-  for (const schema::Step& step : schema::kSteps) run(step.statement);
+  for (const schema::Step& step : schema::kSteps) run(step.table.statement);
 }
 
 BareStore::~BareStore() {

@@ -5,38 +5,14 @@
 #include <sys/stat.h>
 
 #include <cerrno>
-#include <ctime>
 
+#include "core/lock_wait.h"
 #include "core/privilege.h"
 #include "utils/oauth_names.h"
 #include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {
-
-// Waiting -------------------------------------------------------------------
-
-constexpr long long kLockWaitMilliseconds = 5000;
-constexpr long kLockStepNanoseconds = 1000000;
-
-long long monotonicMilliseconds() {
-  timespec now{};
-  clock_gettime(CLOCK_MONOTONIC, &now);
-  return static_cast<long long>(now.tv_sec) * 1000 + now.tv_nsec / 1000000;
-}
-
-/// SQLite's busy handler; `waits` counts from 0 in each statement. Short even
-/// steps: the growing ones of SQLite's own handler starve some of many writers.
-int waitForLock(void* /*unused*/, int waits) {
-  thread_local long long waitingSince = 0;
-  const long long now = monotonicMilliseconds();
-  if (waits == 0) waitingSince = now;
-  if (now - waitingSince >= kLockWaitMilliseconds) return 0;
-
-  const timespec step{0, kLockStepNanoseconds};
-  nanosleep(&step, nullptr);
-  return 1;
-}
 
 // Creation ------------------------------------------------------------------
 
@@ -104,7 +80,7 @@ int openConnection(const char* source, sqlite3*& db) {
       db = nullptr;
     }
   }
-  if (db != nullptr) sqlite3_busy_handler(db, waitForLock, nullptr);
+  if (db != nullptr) sqlite3_busy_handler(db, waitForLock<kLockWaitSeconds>, nullptr);
   return result;
 }
 

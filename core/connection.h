@@ -11,8 +11,8 @@ namespace KELDOAUTHSERVER {
 /// Opens names::kDatabaseFile. A file that is created has mode 0600, whatever
 /// the umask, which stays untouched, and the folder's default ACL; one that is
 /// there is left as it is. A symbolic link that leads nowhere creates nothing:
-/// SQLITE_CANTOPEN. Statements of the connection wait up to 5 seconds for other
-/// connections' locks.
+/// SQLITE_CANTOPEN. Statements of the connection wait up to kLockWaitSeconds for
+/// other connections' locks.
 /// Returns SQLite's result code; `db` is null unless it is SQLITE_OK. Lines of
 /// the privilege switch go under `source`.
 int openConnection(const char* source, sqlite3*& db);

@@ -199,7 +199,7 @@ int OAUTHDBBasic::DBInit() try {
     syslog(LOG_ERR, "%s:%d ==> %s[init meta table]", kSource, line::kInitMetaEntry, __func__);
   }
   if (FindTable(names::kMetaTable) == 0) {
-    if (CreateDBTab(schema::kCreateMeta) == 0) {
+    if (CreateDBTab(schema::kMeta.statement) == 0) {
       syslog(LOG_ERR, "%s:%d Create Table failed!![meta]", kSource, line::kCreateMetaFailed);
       return ready_;
     }
@@ -209,8 +209,8 @@ int OAUTHDBBasic::DBInit() try {
     if (isTraced(step.mask)) {
       syslog(LOG_ERR, step.trace, kSource, step.entryLine, __func__);
     }
-    if (CreateDBTab(step.statement) == 0) {
-      syslog(LOG_ERR, "%s:%d Create Table failed!![%s]", kSource, step.failedLine, step.table);
+    if (CreateDBTab(step.table.statement) == 0) {
+      syslog(LOG_ERR, "%s:%d Create Table failed!![%s]", kSource, step.failedLine, step.table.name);
       return ready_;
     }
   }
@@ -228,9 +228,9 @@ void OAUTHDBBasic::AddMetaData() try { InsertMetaRows(); } catch (...) {
 void OAUTHDBBasic::InsertMetaRows() {
   traceEntry(kCoreTrace, kSource, line::kAddMetaDataEntry, "AddMetaData");
   for (const char* table : schema::kVersionedTables) {
-    const std::string sql = std::string("INSERT INTO ") + names::kMetaTable +
-                            "(tab_name, version) VALUES('" + table + "', " + schema::kVersion +
-                            ");";
+    const std::string sql = std::string("INSERT INTO ") + names::kMetaTable + "(" +
+                            names::kTabName + ", " + names::kVersion + ") VALUES('" + table +
+                            "', " + schema::kMetaVersion + ");";
     if (Run(sql, nullptr, nullptr) == 0) {
       syslog(LOG_ERR, "%s:%d Add Meta failed", kSource, line::kAddMetaFailed);
     }

@@ -5,32 +5,42 @@
 #include <cstddef>
 #include <string_view>
 
-#include "utils/oauth_names.h"
+#include "core/tables.h"
 #include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {
 
-constexpr std::array<std::string_view, 17> kKnownColumns{
-    names::kAccessToken,  names::kClientId, names::kClientSecret, names::kCode,
-    names::kDisplayName,  names::kEnable,   names::kExpiredTime,  names::kFlowType,
-    names::kId,           names::kIp,       names::kMsg,          names::kRedirectUri,
-    names::kRefreshToken, names::kScope,    names::kState,        names::kTimestamp,
-    names::kUsername,
+/// The columns of all tables, each once, sorted.
+struct KnownColumns {
+  std::array<std::string_view, 32> names{};
+  std::size_t count = 0;
+
+  constexpr void add(std::string_view name) {
+    std::size_t at = 0;
+    while (at < count && names[at] < name) ++at;
+    if (at < count && names[at] == name) return;
+    for (std::size_t i = count; i > at; --i) names[i] = names[i - 1];
+    names[at] = name;
+    ++count;
+  }
 };
 
-constexpr bool isSorted() {
-  for (std::size_t i = 1; i < kKnownColumns.size(); ++i) {
-    if (kKnownColumns[i] <= kKnownColumns[i - 1]) return false;
+constexpr KnownColumns knownColumns() {
+  KnownColumns known;
+  for (const schema::Table* table : schema::kTables) {
+    for (const char* column : table->columns) known.add(column);
   }
-  return true;
+  return known;
 }
-static_assert(isSorted());
 
-/// The same name where it is there to stay; null for a column of no store.
+constexpr KnownColumns kKnown = knownColumns();
+
+/// The same name where it is there to stay; null for a column of no table.
 const char* lastingName(std::string_view column) {
-  const auto* const found = std::lower_bound(kKnownColumns.begin(), kKnownColumns.end(), column);
-  return found != kKnownColumns.end() && *found == column ? found->data() : nullptr;
+  const auto* const end = kKnown.names.begin() + kKnown.count;
+  const auto* const found = std::lower_bound(kKnown.names.begin(), end, column);
+  return found != end && *found == column ? found->data() : nullptr;
 }
 
 }  // namespace

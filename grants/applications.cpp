@@ -12,6 +12,7 @@
 #include "grants/rows/registry_words.h"
 #include "grants/rows/room_rules.h"
 #include "grants/rows/store.h"
+#include "utils/clock.h"
 #include "utils/oauth_names.h"
 
 namespace KELDOAUTHSERVER::grants {

@@ -11,6 +11,7 @@
 #include "grants/rows/read_rows.h"
 #include "grants/rows/room_rules.h"
 #include "grants/rows/store.h"
+#include "utils/clock.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 

@@ -6,6 +6,7 @@
 
 #include "core/oauth_errors.h"
 #include "stores/store_support.h"
+#include "utils/clock.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"

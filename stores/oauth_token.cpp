@@ -7,6 +7,7 @@
 
 #include "core/oauth_errors.h"
 #include "stores/store_support.h"
+#include "utils/clock.h"
 #include "utils/decimal.h"
 #include "utils/diagnostics.h"
 #include "utils/oauth_names.h"

@@ -5,7 +5,6 @@
 
 #include <cerrno>
 #include <cstring>
-#include <ctime>
 
 #include "core/oauth_errors.h"
 #include "utils/decimal.h"
@@ -47,10 +46,6 @@ Json::Value requestBy(const char* column, const std::string& value) {
 
 int firstId(const Json::Value& rows) {
   return rows.empty() ? 0 : static_cast<int>(decimalValue(rows[0U][names::kId]));
-}
-
-long long currentTime() {
-  return static_cast<long long>(time(nullptr));
 }
 
 std::vector<long long> expiredIds(const Json::Value& rows, long long now) {

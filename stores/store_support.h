@@ -27,9 +27,6 @@ Json::Value requestBy(const char* column, const std::string& value);
 /// The id of the first row, cut to 32 bits; 0 without a row.
 int firstId(const Json::Value& rows);
 
-/// The current time in Unix seconds, whatever the width of time_t.
-long long currentTime();
-
 /// 0 when `ip` is the text of an IPv6 or IPv4 address, else EINVAL. Behind an
 /// IPv6 address a `%` and any scope may follow: one that names no interface is
 /// taken as a number. Reading stops at the first NUL byte.

@@ -44,8 +44,10 @@ inline constexpr char kRedirectUri[] = "redirect_uri";
 inline constexpr char kRefreshToken[] = "refresh_token";
 inline constexpr char kScope[] = "scope";
 inline constexpr char kState[] = "state";
+inline constexpr char kTabName[] = "tab_name";
 inline constexpr char kTimestamp[] = "timestamp";
 inline constexpr char kUsername[] = "username";
+inline constexpr char kVersion[] = "version";
 
 // Keys of a request document.
 inline constexpr char kCondition[] = "condition";

@@ -1,7 +1,6 @@
 #include "grants/rows/store.h"
 
 #include <cstdlib>
-#include <ctime>
 #include <initializer_list>
 #include <utility>
 
@@ -60,7 +59,7 @@ void Store::requireReady() {
   const Trouble trouble = troubleOf(applications);
   for (OAUTHDBBasic* table : std::initializer_list<OAUTHDBBasic*>{
            &applications, &codes, &tokens, static_cast<OAUTHDBBasic*>(&log)}) {
-    if (table->DBCmd("", nullptr, nullptr) == 0) throw trouble;
+    if (table->DBCmd("SELECT 1", nullptr, nullptr) == 0) throw trouble;
   }
 }
 
@@ -148,10 +147,6 @@ void Whole::commit() {
 
 long long numberIn(const Json::Value& column) {
   return std::strtoll(column.asCString(), nullptr, 10);
-}
-
-long long currentTime() {
-  return static_cast<long long>(std::time(nullptr));
 }
 
 }  // namespace KELDOAUTHSERVER::grants

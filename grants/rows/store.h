@@ -78,9 +78,6 @@ class Whole {
 /// The decimal number at the start of a column's text; 0 without one.
 long long numberIn(const Json::Value& column);
 
-/// Unix seconds, once for each operation.
-long long currentTime();
-
 }  // namespace KELDOAUTHSERVER::grants
 
 #endif  // KELDOAUTH_GRANTS_ROWS_STORE_H

@@ -2,40 +2,29 @@
 
 #include <sqlite3.h>
 
-#include <ctime>
 #include <functional>
 #include <string_view>
 #include <utility>
 
-#include "core/schema.h"
+#include "core/lock_wait.h"
+#include "core/tables.h"
 #include "tools/keldoauth/storage/descriptor_vfs.h"
 #include "tools/keldoauth/storage/files.h"
-#include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
 
-constexpr long long kLockWaitSeconds = 30;
-constexpr long kLockStepNanoseconds = 2000000;
+constexpr int kPatienceSeconds = 30;
 
-/// What makes a table the store's.
-struct Table {
-  const char* name;
-  const char* columns;
-};
-
-constexpr Table kTables[] = {
-    {names::kMetaTable, "tab_name, version"},
-    {names::kClientInfoTable,
-     "id, enable, client_id, client_secret, redirect_uri, scope, display_name"},
-    {names::kGrantCodeTable, "id, username, client_id, scope, code, expired_time, state, ip"},
-    {names::kTokenTable,
-     "id, username, client_id, scope, refresh_token, access_token, expired_time, flow_type, "
-     "state, ip"},
-    {names::kLogTable, "id, timestamp, msg"},
-};
+/// Everything that a table of the store has.
+std::string selectFrom(const schema::Table& table) {
+  std::string columns;
+  for (const char* column : table.columns)
+    columns += (columns.empty() ? "" : ",") + std::string(column);
+  return "SELECT " + columns + " FROM " + table.name;
+}
 
 class Statement {
  public:
@@ -86,20 +75,6 @@ class Digest {
   std::uint64_t value_ = 14695981039346656037U;
 };
 
-/// SQLite's busy handler. Short even steps: the growing ones of SQLite's own
-/// would never get a turn between busy writers.
-int waitForLock(void* /*unused*/, int waits) {
-  static time_t waitingSince = 0;
-  timespec now{};
-  clock_gettime(CLOCK_MONOTONIC, &now);
-  if (waits == 0) waitingSince = now.tv_sec;
-  if (now.tv_sec - waitingSince >= kLockWaitSeconds) return 0;
-
-  const timespec step{0, kLockStepNanoseconds};
-  nanosleep(&step, nullptr);
-  return 1;
-}
-
 /// What a copy that somebody brings may be; nothing else about it is our fault.
 const char* faultOfCopy(int extendedCode) {
   switch (extendedCode) {
@@ -136,17 +111,16 @@ void DatabaseFile::open(const std::string& name, int flags, const char* vfs) {
   const int result = sqlite3_open_v2(name.c_str(), &raw, flags, vfs);
   db_.reset(raw);  // a failed open may hand out a handle, too
   if (result != SQLITE_OK) throw failure();
-  sqlite3_busy_handler(raw, waitForLock, nullptr);
+  sqlite3_busy_handler(raw, waitForLock<kPatienceSeconds>, nullptr);
 }
 
 void DatabaseFile::requireStore() {
   if (text("PRAGMA integrity_check(1)") != "ok") {
     throw Failure(kRefused, path_ + " is malformed");
   }
-  for (const Table& table : kTables) {
-    const std::string sql = std::string("SELECT ") + table.columns + " FROM " + table.name;
+  for (const schema::Table* table : schema::kTables) {
     sqlite3_stmt* raw = nullptr;
-    const int result = sqlite3_prepare_v2(db_.get(), sql.c_str(), -1, &raw, nullptr);
+    const int result = sqlite3_prepare_v2(db_.get(), selectFrom(*table).c_str(), -1, &raw, nullptr);
     sqlite3_finalize(raw);
     if (result == SQLITE_OK) continue;
     if (result != SQLITE_ERROR) throw failure();
@@ -166,8 +140,7 @@ void DatabaseFile::copyTo(DatabaseFile& target) {
 
 std::string DatabaseFile::stranger() {
   DatabaseFile model("an empty store", Use::kMemory);
-  model.execute(schema::kCreateMeta);
-  for (const schema::Step& step : schema::kSteps) model.execute(step.statement);
+  for (const schema::Table* table : schema::kTables) model.execute(table->statement);
   const std::map<std::string, std::string> own = model.schemaEntries();
   for (const auto& [definition, name] : schemaEntries()) {
     if (own.count(definition) == 0) return name;
@@ -192,10 +165,9 @@ std::map<std::string, std::string> DatabaseFile::schemaEntries() {
 
 std::uint64_t DatabaseFile::digest() {
   Digest digest;
-  for (const Table& table : kTables) {
-    digest.add(table.name);
-    Statement rows(db_.get(), std::string("SELECT ") + table.columns + " FROM " + table.name,
-                   [this] { return failure(); });
+  for (const schema::Table* table : schema::kTables) {
+    digest.add(table->name);
+    Statement rows(db_.get(), selectFrom(*table), [this] { return failure(); });
     while (rows.step()) {
       for (int i = 0; i < rows.columns(); ++i) digest.add(rows.text(i));
     }

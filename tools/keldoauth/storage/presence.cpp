@@ -8,6 +8,7 @@
 #include <memory>
 #include <string>
 
+#include "core/tables.h"
 #include "tools/keldoauth/console/failure.h"
 #include "tools/keldoauth/storage/key_files.h"
 #include "utils/oauth_names.h"
@@ -16,9 +17,6 @@ using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
-
-constexpr const char* kTables[] = {names::kMetaTable, names::kClientInfoTable,
-                                   names::kGrantCodeTable, names::kTokenTable, names::kLogTable};
 
 struct CloseConnection {
   void operator()(sqlite3* db) const { sqlite3_close(db); }
@@ -38,7 +36,8 @@ bool lacksTables() {
   if (opened != SQLITE_OK) return false;
 
   std::string sql = "SELECT 1 FROM sqlite_master WHERE type='table' AND name IN (''";
-  for (const char* table : kTables) sql.append(",'").append(table).append("'");
+  for (const schema::Table* table : schema::kTables)
+    sql.append(",'").append(table->name).append("'");
   sql += ")";
   bool isFound = false;
   return sqlite3_exec(raw, sql.c_str(), noteRow, &isFound, nullptr) == SQLITE_OK && !isFound;
