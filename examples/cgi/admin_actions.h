@@ -4,12 +4,11 @@
 #define KELDOAUTH_EXAMPLES_CGI_ADMIN_ACTIONS_H
 
 #include "examples/cgi/answer.h"
-#include "grants/grants.h"
 
 namespace service {
 
 /// The form's token has been checked.
-Answer act(KELDOAUTHSERVER::grants::Grants& store, const Request& request, const Parameters& form);
+Answer act(const Request& request, const Parameters& form);
 
 }  // namespace service
 

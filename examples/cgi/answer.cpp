@@ -7,22 +7,14 @@
 #include <iostream>
 #include <new>
 
-#include "grants/trouble.h"
+#include "core/oauth_db_basic.h"
+#include "core/oauth_errors.h"
+#include "utils/oauth_names.h"
 
 namespace service {
 namespace {
 
-using KELDOAUTHSERVER::grants::Trouble;
-
 constexpr char kRetryAfterSeconds[] = "5";
-
-constexpr Failure kBusy{503, "temporarily_unavailable", "One moment, please",
-                        "The box is busy. Nothing was lost; please try again in a few seconds."};
-constexpr Failure kFull{503, "temporarily_unavailable", "The box is full",
-                        "There is no room for more until its administrator makes some. Nothing "
-                        "was lost."};
-constexpr Failure kBroken{500, "server_error", "Something is wrong with the box",
-                          "Its administrator has to look after it. Nothing was lost."};
 
 const char* reason(int status) {
   switch (status) {
@@ -55,21 +47,20 @@ const char* reason(int status) {
   }
 }
 
-Answer tryAgain(Answer (*tell)(const Failure&)) {
-  return tell(kBusy).with("Retry-After", kRetryAfterSeconds);
+Answer jsonUnavailable() {
+  return oauthError(503, "temporarily_unavailable", "The service is busy, please try again");
 }
 
-Answer answerTo(Answer (*handle)(const Request&), Answer (*tell)(const Failure&)) try {
+Answer answerTo(Answer (*handle)(const Request&), Answer (*unavailable)()) try {
   return handle(readRequest([](const char* name) { return std::getenv(name); }, std::cin));
 } catch (const Refusal& refusal) {
   return refusal.answer;
-} catch (const Trouble& trouble) {
-  if (trouble.canTryAgain()) return tryAgain(tell);
-  return tell(trouble.kind() == Trouble::Kind::kFull ? kFull : kBroken);
+} catch (const Unavailable&) {
+  return unavailable().with("Retry-After", kRetryAfterSeconds);
 } catch (const std::bad_alloc&) {
-  return tryAgain(tell);
+  return unavailable().with("Retry-After", kRetryAfterSeconds);
 } catch (const std::exception&) {
-  return tell(kBroken);
+  return plainAnswer(500);
 }
 
 }  // namespace
@@ -108,8 +99,15 @@ Answer redirectAnswer(const Request& request, const std::string& address) {
   return Answer{request.isRead() ? 302 : 303, {{"Location", address}}, ""};
 }
 
-Answer failureAsJson(const Failure& failure) {
-  return oauthError(failure.status, failure.error, failure.text);
+bool hadNoRow(const KELDOAUTHSERVER::OAUTHDBBasic& store) {
+  if (store.GetErrCode() != KELDOAUTHSERVER::errors::kNone.code) throw Unavailable{};
+  return true;
+}
+
+bool takeRow(KELDOAUTHSERVER::OAUTHDBBasic& store, const char* column, const std::string& value) {
+  Json::Value request;
+  request[KELDOAUTHSERVER::names::kCondition][column] = value;
+  return store.DBDel(request) || !hadNoRow(store);
 }
 
 void write(const Answer& answer, std::ostream& output) {
@@ -122,8 +120,8 @@ void write(const Answer& answer, std::ostream& output) {
          << answer.body << std::flush;
 }
 
-int serve(Answer (*handle)(const Request&), Answer (*tell)(const Failure&)) {
-  write(answerTo(handle, tell), std::cout);
+int serve(Answer (*handle)(const Request&), Answer (*unavailable)()) {
+  write(answerTo(handle, unavailable == nullptr ? jsonUnavailable : unavailable), std::cout);
   return std::cout ? 0 : 1;
 }
 
