@@ -172,6 +172,42 @@ TEST_F(FloodsTest, EvictionsLeaveNoEntry) {
   EXPECT_EQ(entries().size(), 2U);
 }
 
+// At the size of a box as it is delivered: 1000 rows in each table.
+
+using FullSizeFloodsTest = FloodsTest;
+
+TEST_F(FullSizeFloodsTest, AnApplicationThatFetchesAThousandTokens) {
+  for (int i = 0; i < 1000; ++i) ASSERT_TRUE(grants().tokens.issueToItself({frame_}));
+  expectOthersUnharmed();
+}
+
+TEST_F(FullSizeFloodsTest, AUserWhoSendsOneFormAThousandTimes) {
+  for (int i = 0; i < 1000; ++i) issue(frame_);
+  expectOthersUnharmed();
+}
+
+TEST_F(FullSizeFloodsTest, AUserWhoLogsInAThousandTimes) {
+  for (int i = 0; i < 1000; ++i) login(frame_);
+  expectOthersUnharmed();
+}
+
+TEST_F(FullSizeFloodsTest, AHundredAndTwentyFiveApplicationsOfOneUser) {
+  for (int i = 0; i < 125; ++i) {
+    const ApplicationId application = add("Application " + std::to_string(i)).identifier;
+    for (int j = 0; j < 8; ++j) login(application);
+  }
+  EXPECT_EQ(rows("oauth_token WHERE username='alice'"), "250");
+  expectOthersUnharmed();
+}
+
+TEST_F(FullSizeFloodsTest, AHundredAndTwentyFiveUsersOfOneApplication) {
+  for (int i = 0; i < 125; ++i) {
+    for (int j = 0; j < 8; ++j) login(frame_, User("user" + std::to_string(i)));
+  }
+  EXPECT_EQ(rows("oauth_token WHERE username<>'bob'"), "500");
+  expectOthersUnharmed();
+}
+
 // Applications that register themselves ------------------------------------------------
 
 class SelfRegistrationTest : public FloodsTest {
