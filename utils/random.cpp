@@ -11,6 +11,7 @@
 
 #include "utils/file.h"
 #include "utils/oauth_utils.h"
+#include "utils/wide_time.h"
 
 namespace KELDOAUTHSERVER {
 namespace {
