@@ -34,6 +34,7 @@ class GrantsTest : public support::World {
   void SetUp() override;
 
   Grants& grants() { return *grants_; }
+  void close() { grants_.reset(); }
   /// Another connection, with another policy.
   void open(const Policy& policy);
 

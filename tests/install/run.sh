@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Builds a consumer in one of the three ways and runs it in private mounts; or
+# Builds two consumers in one of the three ways and runs them in private mounts; or
 # looks whether every link of the installed documents leads to something.
 # Usage: run.sh BUILD-FOLDER find_package|pkg_config|subdirectory|documents
 set -euo pipefail
@@ -18,7 +18,11 @@ if [[ $way != subdirectory ]]; then
   libraries=$(dirname "$(find "$prefix" -name libkeldoauth.so.1)")
 fi
 
-run_consumer() { KELDOAUTH_LIB_DIR=$libraries "$here/../support/sandbox.sh" "$work/consumer"; }
+run_consumers() {
+  for program in consumer login; do
+    KELDOAUTH_LIB_DIR=$libraries "$here/../support/sandbox.sh" "$work/$program"
+  done
+}
 
 case $way in
   find_package)
@@ -30,7 +34,7 @@ case $way in
         -DCMAKE_DISABLE_FIND_PACKAGE_PkgConfig=ON \
         -DCMAKE_DISABLE_FIND_PACKAGE_"$without"=ON >/dev/null
       cmake --build "$work" --clean-first >/dev/null
-      run_consumer
+      run_consumers
     done
     exit
     ;;
@@ -40,13 +44,15 @@ case $way in
     # It writes a blank within a path as a shell would take it.
     eval "flags=($(pkg-config --cflags --libs keldoauth))"
     g++ -std=c++17 "$here/consumer.cpp" "${flags[@]}" -o "$work/consumer"
+    eval "flags=($(pkg-config --cflags --libs keldoauth-grants))"
+    g++ -std=c++17 "$here/../../examples/first_login.cpp" "${flags[@]}" -o "$work/login"
     ;;
   subdirectory)
     cmake -S "$here/subdirectory" -B "$work" -G Ninja -DKELDOAUTH_PLATFORM=standin >/dev/null
-    cmake --build "$work" --target consumer >/dev/null
+    cmake --build "$work" --target consumer login >/dev/null
     ;;
   documents)
     exec "$here/check-links" "$prefix"
     ;;
 esac
-run_consumer
+run_consumers

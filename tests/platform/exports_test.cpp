@@ -13,7 +13,9 @@
 
 namespace {
 
+using ::testing::Contains;
 using ::testing::ElementsAre;
+using ::testing::StartsWith;
 using ::testing::UnorderedElementsAre;
 
 /// Where the loader found the library.
@@ -41,9 +43,14 @@ std::vector<std::string> exportsOf(const std::string& file) {
                  "' | awk '$5 ~ /GLOBAL|WEAK/ && $7 != \"UND\" && $8 !~ /^__/ {print $8}'");
 }
 
+/// What the dynamic section of the file says under this tag, in order.
+std::vector<std::string> entriesOf(const std::string& file, const std::string& tag) {
+  return linesOf("readelf --dynamic '" + file + "' | sed -n 's/.*(" + tag +
+                 ").*\\[\\(.*\\)\\]/\\1/p'");
+}
+
 std::string sonameOf(const std::string& file) {
-  const auto lines =
-      linesOf("readelf --dynamic '" + file + "' | sed -n 's/.*(SONAME).*\\[\\(.*\\)\\]/\\1/p'");
+  const auto lines = entriesOf(file, "SONAME");
   return lines.empty() ? "" : lines.front();
 }
 
@@ -59,6 +66,15 @@ TEST(ExportsTest, AddressExportsItsFunction) {
 TEST(ExportsTest, LibrariesHaveThePlatformsPlainNames) {
   EXPECT_EQ(sonameOf(fileOf("KCORECryptSzEncrypt")), "libkeldcore.so");
   EXPECT_EQ(sonameOf(fileOf("KeldCgiGetRemoteIP")), "libkeldcgi.so");
+}
+
+/// Where the build found nettle as an archive, what the cipher uses of it is in
+/// the cipher, and stays in there.
+TEST(ExportsTest, CipherLoadsNettleOnlyWhereThereIsNoArchiveOfIt) {
+  const auto needed = entriesOf(fileOf("KCORECryptSzEncrypt"), "NEEDED");
+  EXPECT_THAT(needed, Contains(StartsWith("libc.")));
+  const bool isThere = KELDCORE_NETTLE_ARCHIVE;
+  EXPECT_THAT(needed, Contains(StartsWith("libnettle")).Times(isThere ? 0 : 1));
 }
 
 }  // namespace

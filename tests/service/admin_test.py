@@ -60,7 +60,7 @@ class Applications(unittest.TestCase):
             self.assertIn('value="My &lt;app&gt;"', answer.text)
 
     def test_name_that_nobody_could_see_is_refused(self):
-        for name in ("  ", "a\nb", "x" * 65):
+        for name in ("  ", "a\nb", "x" * 65, "a" * 64):
             answer = submit("register", name=name, redirect=service.CALLBACK,
                             **{"scope.profile": "1"})
             self.assertEqual(answer.status, 400, name)
@@ -93,13 +93,20 @@ class Applications(unittest.TestCase):
         client = register()
         access = client.tokens()["access_token"]
         client.log_in()
-        self.assertEqual(submit("remove", client=client.id).location, "/admin?done=removed")
+        with sqlite3.connect(service.DATABASE) as file:
+            sealed = file.execute("SELECT client_id FROM oauth_token ORDER BY id DESC").fetchone()
+
+            def left(table):
+                return file.execute(f"SELECT count(*) FROM {table} WHERE client_id=?",
+                                    sealed).fetchone()[0]
+
+            self.assertEqual((left("oauth_token"), left("oauth_grantCode")), (1, 2))
+            self.assertEqual(submit("remove", client=client.id).location, "/admin?done=removed")
+            self.assertEqual((left("oauth_token"), left("oauth_grantCode")), (0, 0))
         self.assertEqual(whoami(access).status, 401)
         self.assertNotIn(client.id, show().text)
-        with sqlite3.connect(service.DATABASE) as file:
-            tokens = file.execute("SELECT count(*) FROM oauth_token WHERE access_token=?",
-                                  (access,)).fetchone()
-        self.assertEqual(tokens, (0,))
+        self.assertEqual(submit("remove", client=client.id).location, "/admin?done=gone")
+        self.assertEqual(submit("enable", client=client.id).location, "/admin?done=gone")
 
 
 class Access(unittest.TestCase):
@@ -118,7 +125,8 @@ class Access(unittest.TestCase):
             self.assertEqual(whoami(pair["access_token"]).status, 401)
             self.assertEqual(client.refresh(pair["refresh_token"]).status, 400)
         self.assertEqual(client.redeem(code, verifier).status, 400)
-        self.assertIn("Access revoked[Revoked] for bob by admin", show("?view=log").text)
+        self.assertIn(f"Access ended[Revoked {client.id[:8]}] for [bob] by [admin]",
+                      show("?view=log").text)
 
     def test_access_of_another_user_or_application_is_not_touched(self):
         client = register()
@@ -135,6 +143,41 @@ class Access(unittest.TestCase):
         access = client.tokens("o'neil")["access_token"]
         self.assertIn("done=revoked", submit("revoke", client=client.id, user="o'neil").location)
         self.assertEqual(whoami(access).status, 401)
+
+    def test_everything_of_a_user_is_revoked_at_once(self):
+        clients = [register(), register()]
+        pairs = [client.tokens("o'neil") for client in clients]
+        code, verifier = clients[0].log_in("o'neil")
+        kept = clients[0].tokens("bob")
+        page = show("?view=access&user=o%27neil").text
+        fields = Form(page[page.index("Revoke everything"):]).fields
+        self.assertEqual((fields["action"], fields["user"]), ("revoke-all", "o'neil"))
+        answer = submit("revoke-all", user="o'neil")
+        self.assertEqual(answer.location, "/admin?done=revoked&view=access&user=o%27neil")
+        for client, pair in zip(clients, pairs):
+            self.assertEqual(whoami(pair["access_token"]).status, 401)
+            self.assertEqual(client.refresh(pair["refresh_token"]).status, 400)
+        self.assertEqual(clients[0].redeem(code, verifier).status, 400)
+        self.assertEqual(whoami(kept["access_token"]).status, 200)
+        self.assertIn("No application has access", show("?view=access&user=o%27neil").text)
+        self.assertIn("done=gone", submit("revoke-all", user="o'neil").location)
+        self.assertIn("done=gone", submit("revoke-all", user="").location)
+        self.assertEqual(whoami(kept["access_token"]).status, 200)
+
+    def test_what_an_application_has_for_itself_is_revoked(self):
+        client = register(client_name="Own <self>")
+        own = client.post("token", grant_type="client_credentials").json["access_token"]
+        pair = client.tokens("bob")
+        self.assertIn(f'application={client.id}"><bdi>Own &lt;self&gt;', show("?view=access").text)
+        page = show("?view=access&application=" + client.id).text
+        self.assertIn("<h3>Own &lt;self&gt;</h3>", page)
+        self.assertIn("<dt>Grants</dt><dd>1</dd>", page)
+        answer = submit("revoke", client=client.id, user="")
+        self.assertEqual(answer.location,
+                         "/admin?done=revoked&view=access&application=" + client.id)
+        self.assertEqual(whoami(own).status, 401)
+        self.assertEqual(whoami(pair["access_token"]).status, 200, "of a user")
+        self.assertIn("done=gone", submit("revoke", client=client.id, user="").location)
 
     def test_user_with_a_quote_is_found(self):
         register(client_name="Quoted").tokens("o'neil")
@@ -178,19 +221,27 @@ class AuditLog(unittest.TestCase):
             self.assertEqual(show("?view=log&page=" + number).status, 200, number)
 
     def test_filter_finds_quotes_and_shows_them_undoubled(self):
-        register(client_name="Joe's app")
-        register(client_name="Another")
+        for name in ("Joe's app", "Another"):
+            submit("register", name=name, redirect=service.CALLBACK, **{"scope.profile": "1"})
         page = show("?view=log&filter=Joe%27s").text
-        self.assertIn("Application registed[Joe&#39;s app]", page)
-        self.assertNotIn("[Another]", page)
+        self.assertIn("Application registered[Joe&#39;s app ", page)
+        self.assertNotIn("[Another", page)
 
-    def test_login_and_changes_leave_an_entry(self):
+    def test_changes_leave_an_entry(self):
         client = register(client_name="Traced")
-        client.log_in()
+        client.tokens()
         submit("disable", client=client.id)
+        # One entry for all that register themselves: their names are anybody's.
+        self.assertIn("Application registered itself[",
+                      show("?view=log&filter=registered+itself").text)
         page = show("?view=log&filter=Traced").text
-        self.assertIn("Access allowed[Traced] by alice", page)
-        self.assertIn("Application disabled[Traced] by admin", page)
+        self.assertIn(f"Application disabled[Traced {client.id[:8]}] by [admin]", page)
+
+    def test_name_cannot_stand_for_another_entry(self):
+        client = register(client_name="x] by [bob] Secret renewed[y")
+        submit("disable", client=client.id)
+        page = show("?view=log&filter=Application+disabled").text
+        self.assertIn(f"[x) by (bob) Secret renewed(y {client.id[:8]}] by [admin]", page)
 
 
 class Storage(unittest.TestCase):

@@ -40,11 +40,11 @@ class Registration(unittest.TestCase):
         self.assertEqual(made["client_secret_expires_at"], 0)
         self.assertEqual(answer.headers["Cache-Control"], "no-store")
 
-    def test_row_holds_the_address_without_scheme(self):
-        register(redirect_uris=["https://without-scheme.example/cb"])
+    def test_row_holds_the_address_with_its_scheme(self):
+        register(redirect_uris=["https://with-scheme.example/cb"])
         with sqlite3.connect(service.DATABASE) as file:
             rows = file.execute("SELECT redirect_uri FROM oauth_clientInfo").fetchall()
-        self.assertIn(("without-scheme.example/cb",), rows)
+        self.assertIn("https://with-scheme.example/cb", [row.split()[0] for row, in rows])
 
     def test_several_addresses_serve_each(self):
         addresses = ["https://one.example/cb", "https://two.example/cb"]
@@ -138,8 +138,9 @@ class CodeFlow(unittest.TestCase):
 
     def test_loopback_address_may_be_https(self):
         client = register(redirect_uris=["https://localhost:8443/cb"])
-        answer = client.decide(client.ask(challenge_of("v" * 43)))
-        self.assertTrue(answer.location.startswith("https://localhost:8443/cb?"))
+        for address in (client.redirect, None):
+            answer = client.decide(client.ask(challenge_of("v" * 43), redirect_uri=address))
+            self.assertTrue(answer.location.startswith("https://localhost:8443/cb?"))
 
     def test_secret_may_be_in_the_body(self):
         code, verifier = self.client.log_in()
@@ -148,6 +149,68 @@ class CodeFlow(unittest.TestCase):
                 "client_secret": self.client.secret}
         self.assertEqual(send("POST", "/oauth/token", service.encode(form), service.FORM).status,
                          200)
+
+
+class OlderAddresses(unittest.TestCase):
+    """Rows that were registered by other means have lost the scheme of their
+    address: it may have been either."""
+
+    def without_scheme(self, address, stored):
+        client = register(redirect_uris=[address])
+        with sqlite3.connect(service.DATABASE) as file:
+            changed = file.execute("UPDATE oauth_clientInfo SET redirect_uri=? WHERE redirect_uri"
+                                   " LIKE ?", (stored, address + "%")).rowcount
+        self.assertEqual(changed, 1)
+        return client
+
+    def returns_to(self, client, address):
+        verifier = "v" * 43
+        page = client.ask(challenge_of(verifier), redirect_uri=address)
+        if page.status != 200:
+            self.assertIsNone(page.location)
+            return None
+        answer = client.decide(page)
+        again = client.redeem(answer.returned["code"], verifier, redirect_uri=address)
+        self.assertEqual(again.status, 200)
+        return answer.location.partition("?")[0]
+
+    def test_https_is_meant_everywhere(self):
+        client = self.without_scheme("https://older.example/cb", "older.example/cb")
+        for address in ("https://older.example/cb", None):
+            self.assertEqual(self.returns_to(client, address), "https://older.example/cb")
+        for address in ("http://older.example/cb", "older.example/cb", "https://older.example/cb/"):
+            self.assertIsNone(self.returns_to(client, address))
+
+    def test_http_is_meant_on_the_loopback_interface_as_well(self):
+        client = self.without_scheme("http://127.0.0.1:7/older", "127.0.0.1:7/older")
+        for address in ("http://127.0.0.1:7/older", "https://127.0.0.1:7/older"):
+            self.assertEqual(self.returns_to(client, address), address)
+        self.assertEqual(self.returns_to(client, None), "http://127.0.0.1:7/older")
+        self.assertIsNone(self.returns_to(client, "127.0.0.1:7/older"))
+
+    def test_an_address_with_its_scheme_has_no_other(self):
+        client = self.without_scheme("http://127.0.0.1:7/newer", "http://127.0.0.1:7/newer")
+        self.assertEqual(self.returns_to(client, None), "http://127.0.0.1:7/newer")
+        self.assertIsNone(self.returns_to(client, "https://127.0.0.1:7/newer"))
+
+    def test_of_several_each_serves_and_none_is_the_default(self):
+        client = self.without_scheme("https://both.example/1",
+                                     "both.example/1 https://both.example/2")
+        for address in ("https://both.example/1", "https://both.example/2"):
+            self.assertEqual(self.returns_to(client, address), address)
+        for address in (None, "https://both.example/1 https://both.example/2"):
+            self.assertIsNone(self.returns_to(client, address))
+
+    def test_plain_http_to_another_machine_is_no_address_however_it_stands_there(self):
+        client = self.without_scheme("https://plain.example/cb", "http://plain.example/cb")
+        for address in ("http://plain.example/cb", "https://plain.example/cb", None,
+                        "https://http://plain.example/cb"):
+            self.assertIsNone(self.returns_to(client, address))
+
+    def test_a_scheme_of_an_applications_own_is_no_host(self):
+        client = self.without_scheme("https://app.example/own", "my.app:/cb")
+        for address in ("my.app:/cb", "https://my.app:/cb", None):
+            self.assertIsNone(self.returns_to(client, address))
 
 
 class Refreshing(unittest.TestCase):

@@ -9,7 +9,6 @@
 #include <string>
 
 #include "examples/cgi/answer.h"
-#include "examples/cgi/code_state.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/html.h"
 #include "examples/cgi/http.h"
@@ -28,12 +27,9 @@ void expectDecoding(const std::string& text) {
 }
 
 void expectEncodings(const std::string& text) {
-  expect(service::base64UrlDecode(service::base64Url(text)) == text, "base64url round trip", text);
-  const service::CodeState state{text, true, "challenge"};
-  const std::optional<service::CodeState> again = service::unpackCodeState(service::pack(state));
-  expect(again && again->redirect == text, "state", text);
-  service::unpackCodeState(text);
-  service::unpackTokenState(text);
+  const std::string encoded = service::base64Url(text);
+  expect(service::percentEncode(encoded) == encoded, "safe in a form", text);
+  service::base64Decode(text);
 
   const std::string markup = service::escape(text);
   expect(markup.find_first_of("<>\"'") == std::string::npos, "no markup", text);
@@ -46,8 +42,14 @@ void expectEncodings(const std::string& text) {
 void expectAddress(const std::string& text) {
   if (!service::isRedirectAddress(text)) return;
   expect(text.find_first_of(" \r\n#") == std::string::npos, "one line, no fragment", text);
-  expect(service::isRegistered(text, service::withoutScheme(text)), "equal to itself", text);
-  expect(!service::isRegistered(text + "x", service::withoutScheme(text)), "exactly", text);
+  const std::string rest = text.substr(text.find("://") + 3);
+  for (const std::string& entry : {text, rest}) {
+    const service::Addresses registered{service::grants::RedirectAddress(entry)};
+    expect(service::isRegistered(text, registered), "equal to itself", text);
+    expect(!service::isRegistered(text + "x", registered), "exactly", text);
+    const std::string only = service::onlyAddress(registered);
+    expect(only.empty() || service::isRegistered(only, registered), "the default", text);
+  }
   expect(text.rfind(service::originOf(text), 0) == 0, "origin", text);
 }
 

@@ -6,7 +6,7 @@ import threading
 import unittest
 
 import service
-from service import register, whoami
+from service import FORM, Form, as_user, encode, register, send, whoami
 
 ROUNDS = int(os.environ.get("SERVICE_ROUNDS", "12"))
 RUNNERS = 16
@@ -65,9 +65,38 @@ class Races(unittest.TestCase):
             self.assertEqual(whoami(old["access_token"]).status, 401)
             self.tidy(client, pair)
 
-    def test_many_log_in_at_once(self):
+    def test_what_was_revoked_while_it_was_refreshed_is_gone(self):
         client = register()
-        tokens = together(LOGINS, lambda _: client.tokens())
+        for _ in range(ROUNDS):
+            old = client.tokens()["refresh_token"]
+            refreshed, revoked = together(
+                2, lambda i: (client.post("revoke", token=old) if i else client.refresh(old)))
+            self.assertEqual(revoked.status, 200)
+            self.assertGone(client, refreshed)
+
+    def test_what_the_administrator_ended_while_it_was_refreshed_is_gone(self):
+        client = register()
+        page = send("GET", "/admin", headers=as_user("admin"))
+        form = {**Form(page.text).fields, "action": "revoke", "client": client.id, "user": "alice"}
+        for _ in range(ROUNDS):
+            old = client.tokens()["refresh_token"]
+            refreshed, revoked = together(
+                2, lambda i: (send("POST", "/admin", encode(form), {**FORM, **as_user("admin")})
+                              if i else client.refresh(old)))
+            self.assertIn("done=revoked", revoked.location)
+            self.assertGone(client, refreshed)
+
+    def assertGone(self, client, refreshed):
+        if refreshed.status == 200:
+            pair = refreshed.json
+            self.assertEqual(whoami(pair["access_token"]).status, 401)
+            self.assertEqual(client.refresh(pair["refresh_token"]).status, 400)
+        else:
+            self.assertEqual((refreshed.status, refreshed.json["error"]), (400, "invalid_grant"))
+
+    def test_many_log_in_at_once(self):
+        clients = [register() for _ in range(LOGINS)]
+        tokens = together(LOGINS, lambda i: clients[i].tokens())
         self.assertEqual(len({pair["access_token"] for pair in tokens}), LOGINS)
         answers = together(LOGINS, lambda i: whoami(tokens[i]["access_token"]))
         self.assertEqual({answer.status for answer in answers}, {200})

@@ -5,12 +5,15 @@ is and who may log in.
 """
 
 import base64
+import contextlib
 import hashlib
 import html.parser
 import http.client
+import io
 import json
 import os
 import secrets
+import subprocess
 import urllib.parse
 
 ISSUER = os.environ["SERVICE_ISSUER"]
@@ -27,11 +30,14 @@ SEEN_SECRETS = {INITIAL_TOKEN, *USERS.values()}
 FORM = {"Content-Type": "application/x-www-form-urlencoded"}
 
 
+PROGRAMS = {"/oauth/register": "register", "/oauth/authorize": "authorize",
+            "/oauth/token": "token", "/oauth/introspect": "introspect",
+            "/oauth/revoke": "revoke", "/api/whoami": "whoami", "/admin": "admin"}
+
+
 class Answer:
-    def __init__(self, response):
-        self.status = response.status
-        self.headers = response.headers
-        self.body = response.read()
+    def __init__(self, status, headers, body):
+        self.status, self.headers, self.body = status, headers, body
 
     @property
     def text(self):
@@ -53,8 +59,64 @@ class Answer:
         return dict(pairs)
 
 
+class Killed(Exception):
+    """The program did not live to answer."""
+
+
+_moment = {}
+
+
+@contextlib.contextmanager
+def moment(**variables):
+    """Requests meanwhile go to the programs themselves, without the web server,
+    each in this moment: see steps.cpp."""
+    _moment.update(variables, LD_PRELOAD=os.environ["SERVICE_STEPS"])
+    try:
+        yield
+    finally:
+        _moment.clear()
+
+
+def later(seconds):
+    """Requests meanwhile are answered so many seconds later."""
+    return moment(SERVICE_LATER=str(seconds))
+
+
+def killed_at(step):
+    """Requests meanwhile are killed before they change a file the N-th time."""
+    return moment(SERVICE_KILL_AT=str(step))
+
+
+def run(method, path, body, headers):
+    """One request to the program that serves `path`, as the web server starts it."""
+    path, _, query = path.partition("?")
+    body = body.encode() if isinstance(body, str) else body or b""
+    authorization = headers.get("Authorization", "")
+    environment = {**_moment, "SERVICE_SETTINGS": RUN + "/settings.json", "QUERY_STRING": query,
+                   "REQUEST_METHOD": method, "CONTENT_LENGTH": str(len(body)),
+                   "CONTENT_TYPE": headers.get("Content-Type", ""), "REMOTE_ADDR": "127.0.0.1",
+                   "HTTP_AUTHORIZATION": authorization,
+                   # Of a program under a sanitizer: steps.cpp is loaded before it.
+                   "ASAN_OPTIONS": "verify_asan_link_order=0"}
+    if path in ("/oauth/authorize", "/admin"):
+        login = base64.b64decode(authorization.partition(" ")[2]).decode()
+        environment["REMOTE_USER"] = login.partition(":")[0]
+    runner = [os.environ["SERVICE_RUNNER"]] if os.environ.get("SERVICE_RUNNER") else []
+    program = os.path.join(os.environ["SERVICE_PROGRAMS"], PROGRAMS[path])
+    done = subprocess.run([*runner, program], env=environment, input=body, check=False,
+                          stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+    if done.returncode == -9:
+        raise Killed
+    assert done.returncode == 0, (done.returncode, done.stderr)
+    output = io.BytesIO(done.stdout)
+    status = int(output.readline().split()[1])
+    return Answer(status, http.client.parse_headers(output), output.read())
+
+
 def send(method, path, body=None, headers=None):
     """One request on a connection of its own; redirects are not followed."""
+    if _moment:
+        return run(method, path, body, headers or {})
     where = urllib.parse.urlsplit(ISSUER)
     connection = http.client.HTTPConnection(where.hostname, where.port, timeout=60)
     try:
@@ -62,7 +124,8 @@ def send(method, path, body=None, headers=None):
             connection.request(method, path, body=body, headers=headers or {})
         except (BrokenPipeError, ConnectionResetError):
             pass  # A server need not read to the end what it refuses.
-        return Answer(connection.getresponse())
+        response = connection.getresponse()
+        return Answer(response.status, response.headers, response.read())
     finally:
         connection.close()
 

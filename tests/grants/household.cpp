@@ -1,0 +1,125 @@
+#include "tests/grants/household.h"
+
+#include <cstdio>
+#include <regex>
+
+namespace grants_test {
+namespace {
+
+NewApplication newcomer() {
+  return {ApplicationName("Newcomer"), {kAddress}, kScope};
+}
+
+CodeRequest requestOf(const Household& household) {
+  CodeRequest request{kBob, household.frame, kScope, kAddress};
+  request.pkce = Pkce{kChallenge};
+  return request;
+}
+
+ApplicationChange anotherName() {
+  ApplicationChange change;
+  change.name = ApplicationName("Another name");
+  return change;
+}
+
+}  // namespace
+
+std::vector<Operation> everyChange() {
+  return {
+      {"AddApplication", [](auto& g, auto&) { g.applications.add(newcomer(), kAdmin); }},
+      {"ChangeApplication",
+       [](auto& g, auto& h) { g.applications.change(h.frame, anotherName(), kAdmin); }},
+      {"RenewSecret", [](auto& g, auto& h) { g.applications.renewSecret(h.frame, kAdmin); }},
+      {"Disable", [](auto& g, auto& h) { g.applications.disable(h.frame, kAdmin); }},
+      {"Remove", [](auto& g, auto& h) { g.applications.remove(h.frame, kAdmin); }},
+      {"IssueCode", [](auto& g, auto& h) { g.codes.issue(requestOf(h)); }},
+      {"Redeem",
+       [](auto& g, auto& h) {
+         g.codes.redeem({h.frame, h.code, kAddress, kVerifier});
+       }},
+      {"ReplayCode",
+       [](auto& g, auto& h) {
+         g.codes.redeem({h.frame, h.spentCode, kAddress, kVerifier});
+       }},
+      {"IssueLogin",
+       [](auto& g, auto& h) {
+         g.tokens.issue({kBob, h.frame, kScope});
+       }},
+      {"Refresh",
+       [](auto& g, auto& h) {
+         g.tokens.refresh({h.frame, *h.old.refresh});
+       }},
+      {"ReplayRefresh",
+       [](auto& g, auto& h) {
+         g.tokens.refresh({h.other, *h.replaced.refresh});
+       }},
+      {"IssueToItself", [](auto& g, auto& h) { g.tokens.issueToItself({h.frame}); }},
+      {"Revoke", [](auto& g, auto& h) { g.tokens.revoke(h.frame, AnyToken(h.old.access.text())); }},
+      {"EndHandle", [](auto& g, auto& h) { g.access.end(h.handle, kAdmin); }},
+      {"EndUser", [](auto& g, auto&) { g.access.endUser(kAlice, kAdmin); }},
+      {"EndUserWith", [](auto& g, auto& h) { g.access.endUserWith(kAlice, h.frame, kAdmin); }},
+      {"EndApplication", [](auto& g, auto& h) { g.access.endApplication(h.frame, kAdmin); }},
+      {"EndEverything", [](auto& g, auto&) { g.access.endEverything(kAdmin); }},
+      {"Purge", [](auto& g, auto&) { g.room.purge(); }},
+      {"Record", [](auto& g, auto&) { g.audit.record("Key changed", kAdmin); }},
+      {"ClearLog", [](auto& g, auto&) { g.audit.clear(kAdmin); }},
+  };
+}
+
+void HouseholdTest::SetUp() {
+  GrantsTest::SetUp();
+  support::Platform::useReadableCipher();
+  household_.frame = add().identifier;
+  household_.other = add("Other").identifier;
+  CodeRequest brief = request(household_.other, kBob);
+  brief.lifetime = 1;
+  grants().codes.issue(brief);                                   // dead
+  grants().tokens.issueToItself({household_.other, {}, {}, 1});  // dead
+  household_.spentCode = issue(household_.frame);
+  household_.old = *grants().codes.redeem(redemption(household_.frame, household_.spentCode));
+  household_.handle = grants().access.list({kAlice, household_.frame})[0].handle;
+  household_.replaced = login(household_.other, kBob);
+  household_.current = refresh(household_.other, household_.replaced);
+  household_.code = issue(household_.frame);
+  support::Clock::advance(60);
+  close();
+  file_ = readFile(kDatabase);
+  for (const char* table : {"oauth_clientInfo", "oauth_grantCode", "oauth_token"}) {
+    for (const auto& row : sql("SELECT * FROM " + std::string(table))) {
+      for (const auto& [column, text] : row) seen_ += text + "\n";
+    }
+  }
+  before_ = state();
+}
+
+void HouseholdTest::reset() {
+  close();
+  std::remove((std::string(kDatabase) + "-journal").c_str());
+  writeFile(kDatabase, file_);
+  support::Clock::setTo(kNow + 60);
+}
+
+std::string HouseholdTest::state() const {
+  std::string all;
+  for (const char* table : {"oauth_clientInfo", "oauth_grantCode", "oauth_token", "oauth_log"}) {
+    for (const auto& row : sql("SELECT * FROM " + std::string(table) + " ORDER BY id")) {
+      all += table;
+      for (const auto& [column, text] : row) all += " " + column + "=" + text;
+      all += "\n";
+    }
+  }
+  // The short form of an identifier stands in the log.
+  static const std::regex kDrawn("[0-9a-f]{40,}|[0-9a-f]{8}(?=\\])");
+  std::string shown;
+  auto end = all.cbegin();
+  for (auto match = std::sregex_iterator(all.begin(), all.end(), kDrawn);
+       match != std::sregex_iterator(); ++match) {
+    shown.append(end, (*match)[0].first);
+    shown += seen_.find(match->str()) == std::string::npos ? "#new" : "#old";
+    end = (*match)[0].second;
+  }
+  shown.append(end, all.cend());
+  return shown;
+}
+
+}  // namespace grants_test
