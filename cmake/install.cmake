@@ -48,5 +48,5 @@ install(FILES README.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT dev)
 install(FILES ${documents} DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs COMPONENT dev)
 install(FILES platform/README.md platform/keldcore.h platform/keldcgi.h
   DESTINATION ${CMAKE_INSTALL_DOCDIR}/platform COMPONENT dev)
-install(FILES examples/first_token.cpp
+install(FILES examples/first_token.cpp examples/first_login.cpp
   DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT dev)

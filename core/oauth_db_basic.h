@@ -73,9 +73,9 @@ class OAUTHDBBasic {
   /// The same without the check for readiness: start-up runs through it.
   int DBCmdRun(const std::string& sql, RowCallback callback, Json::Value* arg);
 
-  /// True between a BEGIN, by whichever object on the connection, and the end of
-  /// its transaction, which need not be a COMMIT: a statement that meets an I/O
-  /// error, a full medium or no memory makes SQLite roll back by itself.
+  /// True between a BEGIN, by whichever object on the connection, and the end
+  /// of its transaction, which need not be a COMMIT: a statement that meets an
+  /// I/O error, a full medium or no memory makes SQLite roll back by itself.
   bool InTransaction() const;
 
   // The library's own callbacks. `arg` is a Json::Value, an array (an object

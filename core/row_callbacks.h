@@ -1,5 +1,5 @@
 // The library's own row callbacks: what the executor has to know of them. Their
-// contract stands with the members of OAUTHDBBasic, which are defined here, too.
+// contract stands with the members of OAUTHDBBasic, defined here, too.
 
 #ifndef KELDOAUTH_CORE_ROW_CALLBACKS_H
 #define KELDOAUTH_CORE_ROW_CALLBACKS_H
@@ -10,8 +10,8 @@
 
 namespace KELDOAUTHSERVER {
 
-/// A public callback, and what stands behind it: that one throws, since within a
-/// statement an exception has to end it.
+/// A public callback, and what stands behind it: that one throws, since within
+/// a statement an exception has to end it.
 struct OwnCallback {
   OAUTHDBBasic::RowCallback callback;
   OAUTHDBBasic::RowCallback body;

@@ -193,20 +193,22 @@ void noteEach(Store& store, const Subjects& subjects, const Actor& by) {
                         rows::actorWord(by));
 }
 
-void endCode(Store& store, const AccessHandle& handle, Ended& ended, Subjects& subjects) {
+void endCode(Store& store, const AccessHandle& handle, long long now, Ended& ended,
+             Subjects& subjects) {
   const auto code = rows::findCode(store, names::kId, std::to_string(handle.row));
   if (!code || markOf(*code) != handle.mark) return;
   rows::erase(store, *code);
-  if (!isLive(*code, currentTime())) return;
+  if (!isLive(*code, now)) return;
   ++ended.codes;
   ++subjects[{code->application, code->user}];
 }
 
-void endToken(Store& store, const AccessHandle& handle, Ended& ended, Subjects& subjects) {
+void endToken(Store& store, const AccessHandle& handle, long long now, Ended& ended,
+              Subjects& subjects) {
   const auto token = rows::findToken(store, names::kId, std::to_string(handle.row));
   if (!token || markOf(*token) != handle.mark) return;
   rows::erase(store, *token);
-  if (!isLive(*token, store.policy, currentTime())) return;
+  if (!isLive(*token, store.policy, now)) return;
   ++ended.tokens;
   ++subjects[{token->application,
               token->isOwn() ? std::nullopt : std::optional<std::string>(token->user)}];
@@ -251,12 +253,13 @@ Ended Access::end(const AccessHandle& handle, const Actor& by) {
 }
 
 Ended Access::end(const std::vector<AccessHandle>& handles, const Actor& by) {
+  const long long now = currentTime();
   Whole whole(store_);
   Ended ended{0, 0};
   Subjects subjects;
   for (const AccessHandle& handle : handles) {
     const bool isCode = handle.table == AccessHandle::Table::kCodes;
-    (isCode ? endCode : endToken)(store_, handle, ended, subjects);
+    (isCode ? endCode : endToken)(store_, handle, now, ended, subjects);
   }
   noteEach(store_, subjects, by);
   whole.commit();

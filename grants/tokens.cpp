@@ -102,6 +102,17 @@ Bearer bearerOf(const TokenRow& token, const Application& application, const std
           CallerText(token.state ? token.state->text : "")};
 }
 
+Outcome<Bearer> verifyAt(Store& store, const std::string& shown, long long now) {
+  const auto refuse = [](Why why) { return Refusal{Error::kInvalidToken, why}; };
+  if (rows::hasNul(shown)) return refuse(Why::kHasNul);
+  const auto found = rows::findShownAccess(store, shown);
+  if (!found) return refuse(Why::kUnknown);
+  if (found->expires < now) return refuse(Why::kExpired);
+  const auto application = rows::actingApplication(store, ApplicationId(found->application));
+  if (!application) return refuse(application.refusal().why);
+  return bearerOf(*found, application->shown, found->scope, found->expires);
+}
+
 /// Of a refresh token that its application holds and may still use.
 std::optional<Introspection> introspectRefresh(Store& store, const TokenRow& login,
                                                const ApplicationId& asking, long long now) {
@@ -206,15 +217,7 @@ Outcome<Pair> Tokens::issueToItself(const OwnTokenRequest& request) {
 }
 
 Outcome<Bearer> Tokens::verify(const AccessToken& token) const {
-  const auto refuse = [](Why why) { return Refusal{Error::kInvalidToken, why}; };
-  if (rows::hasNul(token.text())) return refuse(Why::kHasNul);
-  const long long now = currentTime();
-  const auto found = rows::findShownAccess(store_, token.text());
-  if (!found) return refuse(Why::kUnknown);
-  if (found->expires < now) return refuse(Why::kExpired);
-  const auto application = rows::actingApplication(store_, ApplicationId(found->application));
-  if (!application) return refuse(application.refusal().why);
-  return bearerOf(*found, application->shown, found->scope, found->expires);
+  return verifyAt(store_, token.text(), currentTime());
 }
 
 std::optional<Introspection> Tokens::introspect(const ApplicationId& asking,
@@ -227,7 +230,7 @@ std::optional<Introspection> Tokens::introspect(const ApplicationId& asking,
     if (!login || !isCurrent(*login, shown)) return {};
     return introspectRefresh(store_, *login, asking, now);
   }
-  if (const auto bearer = verify(AccessToken(shown))) {
+  if (const auto bearer = verifyAt(store_, shown, now)) {
     return Introspection{Introspection::Kind::kAccess, *bearer};
   }
   const auto foreign = rows::findForeignRefresh(store_, shown);

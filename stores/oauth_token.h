@@ -83,11 +83,11 @@ class OAUTHDBToken : public OAUTHDBBasic {
   /// tokens included. True when all removals succeeded, also when there was
   /// nothing to remove or the rows could not be read; else false, without an
   /// error code when another process had removed a row first. Several removals
-  /// are one transaction: when it cannot be committed, false with SQLite's code,
-  /// and every row is back. When it cannot be begun because another process held
-  /// the lock for the whole wait, false with 5 "database is locked", and nothing
-  /// is removed; for another reason (a transaction of the caller's, say), they
-  /// run one by one.
+  /// are one transaction: when it cannot be committed, false with SQLite's
+  /// code, and every row is back. When it cannot be begun because another
+  /// process held the lock for the whole wait, false with 5 "database is
+  /// locked", and nothing is removed; for another reason (a transaction of the
+  /// caller's, say), they run one by one.
   bool Purge();
 
   // Look-ups ----------------------------------------------------------------

@@ -13,13 +13,22 @@ namespace {
 
 using namespace service;
 
-Answer show(const Request& request, const Parameters& query) {
+Answer show(const grants::Grants& store, const Request& request, const Parameters& query) {
   const std::string view = query.value("view");
   const std::string done = query.value("done");
-  if (view == "access") return accessPage(request.user, done, query.value("user"));
-  if (view == "log") return logPage(request.user, query.value("filter"), query.value("page"));
-  if (view == "storage") return storagePage(request.user);
-  return applicationsPage(request.user, done, {});
+  if (view == "access") {
+    return accessPage(store, request.user, done, {query.value("user"), query.value("application")});
+  }
+  if (view == "log") {
+    return logPage(store, request.user, query.value("filter"), query.value("page"));
+  }
+  if (view == "storage") return storagePage(store, request.user);
+  return applicationsPage(store, request.user, done, {});
+}
+
+bool isFromHere(const Request& request, const Parameters& form) {
+  return !form.isDoubled("form_token") &&
+         isFormToken(form.value("form_token"), request.user, kAdminSubject);
 }
 
 Answer handle(const Request& request) {
@@ -34,19 +43,18 @@ Answer handle(const Request& request) {
   }
   const std::optional<Parameters> given = Parameters::parse(isForm ? request.body : request.query);
   if (!given) return messagePage(400, "The request cannot be read", "Nothing was changed.");
-  if (!isForm) return show(request, *given);
-  if (given->isDoubled("form_token") ||
-      !isFormToken(given->value("form_token"), request.user, kAdminSubject)) {
+  if (isForm && !isFromHere(request, *given)) {
     return messagePage(403, "This form is too old",
                        "Or it does not come from this box. Nothing was changed; go back and "
                        "repeat what you did.",
                        "/admin");
   }
-  return act(request, *given);
+  grants::Grants store;
+  return isForm ? act(store, request, *given) : show(store, request, *given);
 }
 
 }  // namespace
 
 int main() {
-  return serve(handle, unavailablePage);
+  return serve(handle, failurePage);
 }

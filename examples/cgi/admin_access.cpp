@@ -1,37 +1,61 @@
 #include "examples/cgi/admin_pages.h"
 
+#include <algorithm>
 #include <ctime>
 #include <map>
 
-#include "examples/cgi/admin_rows.h"
 #include "examples/cgi/admin_view.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/html.h"
+#include "examples/cgi/scopes.h"
 
 namespace service {
 namespace {
 
-std::map<std::string, std::string> clientNames() {
-  std::map<std::string, std::string> names;
-  for (const Client& client : allClients()) names[client.identifier] = client.name;
-  return names;
+using grants::AccessEntry;
+
+/// What an application may do for a user, or for itself, by all of the entries
+/// together: codes that can be redeemed, tokens that work or can be renewed.
+struct Held {
+  enum class State { kAllowed, kRenewable, kInUse };  // the best of them counts
+  State state = State::kAllowed;
+  std::string scope;
+  long long since = 0;    // of the first; 0 when not known
+  long long renewed = 0;  // of the last; likewise
+  long long ends = 0;     // of the last
+  int entries = 0;
+};
+
+/// By what people look for: the application's name, and then its identifier.
+using Holder = std::pair<std::string, grants::ApplicationId>;
+using HeldBy = std::map<Holder, Held>;
+
+std::string nameOf(const AccessEntry& entry) {
+  return entry.applicationName ? entry.applicationName->text() : "An application that was removed";
 }
 
-std::string nameOf(const std::map<std::string, std::string>& names, const std::string& clientId) {
-  const auto found = names.find(clientId);
-  return found == names.end() ? "An application that was removed" : found->second;
+Held::State stateOf(const AccessEntry& entry) {
+  if (entry.kind == AccessEntry::Kind::kCode) return Held::State::kAllowed;
+  return entry.expires < std::time(nullptr) ? Held::State::kRenewable : Held::State::kInUse;
 }
 
-/// Markup in the order in which people look for names.
-using ByName = std::multimap<std::string, std::string>;
-
-std::string joined(const ByName& items) {
-  std::string all;
-  for (const auto& [name, item] : items) all += item;
-  return all;
+long long earlier(long long a, long long b) {
+  return a == 0 || b == 0 ? std::max(a, b) : std::min(a, b);
 }
 
-std::string userItem(const std::string& user, int applications) {
+void add(HeldBy& all, const AccessEntry& entry) {
+  Held& held = all[{nameOf(entry), entry.application}];
+  held.state = std::max(held.state, stateOf(entry));
+  held.scope = tidyScope(held.scope + " " + entry.scope.text());
+  held.since = earlier(held.since, entry.since);
+  held.renewed = std::max(held.renewed, entry.renewed);
+  held.ends = std::max(held.ends, entry.ends);
+  ++held.entries;
+}
+
+// Who has given access ----------------------------------------------------------
+
+std::string userItem(const std::string& user, std::size_t applications) {
   return fill(
       "<li><a href=\"/admin?view=access&amp;user={}\"><bdi>{}</bdi></a> "
       "<span class=\"count\">{}</span></li>\n",
@@ -39,88 +63,122 @@ std::string userItem(const std::string& user, int applications) {
        std::to_string(applications) + (applications == 1 ? " application" : " applications")});
 }
 
-/// In its own flow an application stands where users stand.
-std::string userItems(const std::vector<Access>& all,
-                      const std::map<std::string, std::string>& names) {
-  std::map<std::string, int> people;
-  ByName byName;
-  for (const Access& access : all) {
-    if (access.user != access.clientId) {
-      ++people[access.user];
-    } else {
-      const std::string name = nameOf(names, access.clientId);
-      byName.emplace(name,
-                     fill("<li><a href=\"/admin?view=access&amp;user={}\"><bdi>{}</bdi></a></li>\n",
-                          {access.user, name}));
-    }
-  }
+std::string ownItems(const HeldBy& own) {
+  if (own.empty()) return {};
   std::string items;
-  for (const auto& [name, count] : people) items += userItem(name, count);
-  std::string users = items.empty() ? "<p class=\"empty\">Nobody has given any access.</p>\n"
-                                    : "<ul class=\"users\">\n" + items + "</ul>\n";
-  if (byName.empty()) return users;
-  return users +
-         "<h2 class=\"spaced\">Applications that act for themselves</h2>\n"
+  for (const auto& [holder, held] : own) {
+    items += fill("<li><a href=\"/admin?view=access&amp;application={}\"><bdi>{}</bdi></a></li>\n",
+                  {percentEncode(holder.second.text()), holder.first});
+  }
+  return "<h2 class=\"spaced\">Applications that act for themselves</h2>\n"
          "<ul class=\"users\">\n" +
-         joined(byName) + "</ul>\n";
+         items + "</ul>\n";
 }
 
-const char* badgeOf(Access::State state) {
+std::string everybody(const grants::Grants& store) {
+  std::map<std::string, HeldBy> people;
+  HeldBy own;
+  for (const AccessEntry& entry : store.access.list({})) {
+    add(entry.user ? people[entry.user->text()] : own, entry);
+  }
+  std::string items;
+  for (const auto& [name, held] : people) items += userItem(name, held.size());
+  return "<h2 class=\"spaced\">Users</h2>\n" +
+         (items.empty() ? "<p class=\"empty\">Nobody has given any access.</p>\n"
+                        : "<ul class=\"users\">\n" + items + "</ul>\n") +
+         ownItems(own);
+}
+
+// What somebody has given -------------------------------------------------------
+
+const char* badgeOf(Held::State state) {
   switch (state) {
-    case Access::State::kAllowed:
+    case Held::State::kAllowed:
       return "<p class=\"badge on\">Allowed, not signed in yet</p>\n";
-    case Access::State::kRenewable:
+    case Held::State::kRenewable:
       return "<p class=\"badge off\">Can be renewed</p>\n";
     default:
       return "<p class=\"badge on\">In use</p>\n";
   }
 }
 
-std::string accessItem(const std::string& user, const Access& access, const std::string& name) {
-  const bool expired = access.expires < std::time(nullptr);
-  return fill("<li class=\"card\">\n<h3>{}</h3>\n", {name}) + badgeOf(access.state) +
-         fill("<dl><dt>{}</dt><dd>", {expired ? "Expired" : "Expires"}) + timeText(access.expires) +
-         fill("</dd>\n<dt>Grants</dt><dd>{}</dd></dl>\n", {std::to_string(access.grants)}) +
-         scopeTags(access.scope) + "<div class=\"actions\">\n" + formStart(user, "revoke") +
-         fill(
-             "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
-             "<input type=\"hidden\" name=\"user\" value=\"{}\">\n"
-             "<button class=\"danger\" aria-label=\"Revoke the access of {}\">Revoke</button>\n"
-             "</form></div>\n</li>\n",
-             {access.clientId, access.user, name});
+std::string timeRow(const char* what, long long time) {
+  if (time == 0) return {};
+  return fill("<dt>{}</dt><dd>", {what}) + timeText(time) + "</dd>\n";
 }
 
-std::string accessOfUser(const std::string& user, const std::string& shown,
-                         const std::vector<Access>& all,
-                         const std::map<std::string, std::string>& names) {
-  ByName byName;
-  for (const Access& access : all) {
-    if (access.user != shown) continue;
-    const std::string name = nameOf(names, access.clientId);
-    byName.emplace(name, accessItem(user, access, name));
+/// A form that asks to revoke; without an application, everything of the user.
+std::string revokeForm(const std::string& admin, const char* action, const Shown& shown,
+                       const std::string& client) {
+  return formStart(admin, action) + fill(
+                                        "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
+                                        "<input type=\"hidden\" name=\"user\" value=\"{}\">\n",
+                                        {client, shown.user});
+}
+
+std::string accessItem(const std::string& admin, const Shown& shown, const Holder& holder,
+                       const Held& held) {
+  const auto& [name, client] = holder;
+  return fill("<li class=\"card\">\n<h3>{}</h3>\n", {name}) + badgeOf(held.state) + "<dl>" +
+         timeRow("Since", held.since) + timeRow("Renewed", held.renewed) +
+         timeRow("Ends unused", held.ends) +
+         fill("<dt>Grants</dt><dd>{}</dd></dl>\n", {std::to_string(held.entries)}) +
+         scopeTags(held.scope) + "<div class=\"actions\">\n" +
+         revokeForm(admin, "revoke", shown, client.text()) +
+         fill(
+             "<button class=\"danger\" aria-label=\"Revoke the access of {}\">Revoke</button>\n"
+             "</form></div>\n</li>\n",
+             {name});
+}
+
+std::string revokeEverything(const std::string& admin, const Shown& shown) {
+  return "<div class=\"actions\">\n<details><summary>Revoke everything…</summary>\n" +
+         revokeForm(admin, "revoke-all", shown, "") +
+         fill(
+             "<p>Every application will have to ask <bdi>{}</bdi> again.</p>\n"
+             "<button class=\"danger\">Revoke everything</button>\n</form>\n</details>\n</div>\n",
+             {shown.user});
+}
+
+/// What an application has for itself is under the application, not under the
+/// users of whom it has something, too.
+HeldBy heldFor(const grants::Grants& store, const Shown& shown) {
+  grants::AccessFilter filter;
+  if (!shown.user.empty()) filter.user = grants::User(shown.user);
+  if (shown.user.empty()) filter.application = grants::ApplicationId(shown.application);
+  HeldBy all;
+  for (const AccessEntry& entry : store.access.list(filter)) {
+    if (filter.user || entry.kind == AccessEntry::Kind::kOwn) add(all, entry);
   }
-  const std::string items = joined(byName);
-  const std::string heading = fill("<h2 class=\"spaced\">Access for {}</h2>\n",
-                                   {names.count(shown) > 0 ? nameOf(names, shown) : shown});
+  return all;
+}
+
+std::string accessOf(const grants::Grants& store, const std::string& admin, const Shown& shown) {
+  const HeldBy all = heldFor(store, shown);
+  std::string items;
+  for (const auto& [holder, held] : all) items += accessItem(admin, shown, holder, held);
+  const std::string heading = shown.user.empty()
+                                  ? "<h2 class=\"spaced\">Access for itself</h2>\n"
+                                  : fill("<h2 class=\"spaced\">Access for {}</h2>\n", {shown.user});
   if (items.empty()) return heading + "<p class=\"empty\">No application has access.</p>\n";
-  return heading + "<ul class=\"cards\">\n" + items + "</ul>\n";
+  return heading + "<ul class=\"cards\">\n" + items + "</ul>\n" +
+         (shown.user.empty() ? "" : revokeEverything(admin, shown));
 }
 
 }  // namespace
 
-Answer accessPage(const std::string& user, const std::string& done, const std::string& shown) {
-  const std::map<std::string, std::string> names = clientNames();
-  const std::vector<Access> all = allAccess();
-  return view(kAccess, user,
+Answer accessPage(const grants::Grants& store, const std::string& admin, const std::string& done,
+                  const Shown& shown) {
+  const bool isNobody = shown.user.empty() && shown.application.empty();
+  return view(kAccess, admin,
               notice(done) +
                   fill("<form method=\"get\" action=\"/admin\" class=\"search\" role=\"search\">\n"
                        "<input type=\"hidden\" name=\"view\" value=\"access\">\n"
                        "<label for=\"user\">User</label>\n"
                        "<input id=\"user\" name=\"user\" value=\"{}\" autocomplete=\"off\">\n"
                        "<button>Show</button>\n</form>\n",
-                       {shown}) +
-                  (shown.empty() ? "<h2 class=\"spaced\">Users</h2>\n" + userItems(all, names)
-                                 : accessOfUser(user, shown, all, names)));
+                       {shown.user}) +
+                  (isNobody ? everybody(store) : accessOf(store, admin, shown)));
 }
 
 }  // namespace service

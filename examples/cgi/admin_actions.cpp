@@ -1,20 +1,17 @@
 #include "examples/cgi/admin_actions.h"
 
-#include "core/oauth_errors.h"
+#include <string_view>
+#include <vector>
+
 #include "examples/cgi/admin_pages.h"
-#include "examples/cgi/admin_rows.h"
-#include "examples/cgi/code_state.h"
+#include "examples/cgi/clients.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/html.h"
 #include "examples/cgi/redirect.h"
 #include "examples/cgi/scopes.h"
-#include "stores/oauth_clientInfo.h"
-#include "utils/oauth_names.h"
 
 namespace service {
 namespace {
-
-using namespace KELDOAUTHSERVER;
 
 /// Back to a page that can be reloaded without doing it again.
 Answer done(const Request& request, const std::string& word) {
@@ -42,58 +39,99 @@ std::string faultOf(const Draft& draft) {
   return draft.scope.empty() ? "Choose at least one thing that it may ask to do." : "";
 }
 
-Answer registerClient(const Request& request, const Parameters& form) {
-  Draft draft{form.value("name"), form.value("redirect"), chosenScope(form), ""};
-  draft.fault = faultOf(draft);
-  if (!draft.fault.empty()) return applicationsPage(request.user, "", draft);
-
-  OAUTHDBClientInfo store(names::kClientInfoTable);
-  Json::Value issued;
-  if (store.Add(draft.redirect, draft.scope, draft.name, issued) == 0) {
-    if (store.GetErrCode() != errors::kClientInfoFull.code) throw Unavailable{};
-    draft.fault = "There is no room for another application. Remove one first.";
-    return applicationsPage(request.user, "", draft);
-  }
-  return secretPage(request.user, draft.name, issued[names::kClientId].asString(),
-                    issued[names::kClientSecret].asString());
+grants::Actor by(const Request& request) {
+  return grants::Actor(request.user);
 }
 
-Answer changeClient(const Request& request, const Parameters& form, const std::string& action) {
-  const std::optional<Client> client = findClient(form.value("client"));
-  if (!client) return done(request, "gone");
-  if (action == "remove") {
-    if (!removeClient(*client)) return done(request, "gone");
-    note("Application removed[" + client->name + "] by " + request.user);
-    return done(request, "removed");
-  }
-  const bool enable = action == "enable";
-  const std::string word = enable ? "enabled" : "disabled";
-  if (!setEnabled(client->id, enable)) return done(request, "gone");
-  note("Application " + word + "[" + client->name + "] by " + request.user);
-  return done(request, word);
+Answer faulty(const grants::Grants& store, const Request& request, Draft draft,
+              const std::string& fault) {
+  draft.fault = fault;
+  return applicationsPage(store, request.user, "", draft);
 }
 
-Answer revoke(const Request& request, const Parameters& form) {
-  const std::string user = form.value("user");
-  const std::string clientId = form.value("client");
-  const bool removed = removeAccess(user, clientId);
-  if (removed) {
-    const std::optional<Client> client = findClient(clientId);
-    note("Access revoked[" + (client ? client->name : clientId) + "] for " + user + " by " +
-         request.user);
+Answer registerClient(grants::Grants& store, const Request& request, const Parameters& form) {
+  const Draft draft{form.value("name"), form.value("redirect"), chosenScope(form), ""};
+  const std::string fault = faultOf(draft);
+  if (!fault.empty()) return faulty(store, request, draft, fault);
+  const grants::ApplicationName name(draft.name);
+  try {
+    const auto registered = store.applications.add(
+        {name, {grants::RedirectAddress(draft.redirect)}, grants::Scope(draft.scope)}, by(request));
+    if (registered) return secretPage(request.user, name, *registered);
+    return faulty(store, request, draft,
+                  std::string(grants::explain(registered.refusal().why)) + ".");
+  } catch (const grants::Trouble& trouble) {
+    if (trouble.kind() != grants::Trouble::Kind::kFull) throw;
+    return faulty(store, request, draft,
+                  "There is no room for another application. Remove one first.");
   }
-  return done(request, std::string(removed ? "revoked" : "gone") +
-                           "&view=access&user=" + percentEncode(user));
 }
+
+/// The word for what became of it; the only refusal is that it is not there.
+template <typename Value>
+Answer changed(const Request& request, const grants::Outcome<Value>& outcome, const char* word) {
+  return done(request, outcome ? word : "gone");
+}
+
+Answer enable(grants::Grants& store, const Request& request, const Parameters& form) {
+  const grants::ApplicationId client(form.value("client"));
+  return changed(request, store.applications.enable(client, by(request)), "enabled");
+}
+
+Answer disable(grants::Grants& store, const Request& request, const Parameters& form) {
+  const grants::ApplicationId client(form.value("client"));
+  return changed(request, store.applications.disable(client, by(request)), "disabled");
+}
+
+Answer remove(grants::Grants& store, const Request& request, const Parameters& form) {
+  const grants::ApplicationId client(form.value("client"));
+  return changed(request, store.applications.remove(client, by(request)), "removed");
+}
+
+Answer ended(const Request& request, const grants::Ended& ended, const std::string& shown) {
+  const bool wasThere = ended.codes + ended.tokens > 0;
+  return done(request, std::string(wasThere ? "revoked" : "gone") + "&view=access&" + shown);
+}
+
+/// What the application has for itself. It may fetch more: disabling stops that.
+grants::Ended endOwn(grants::Grants& store, const grants::ApplicationId& client,
+                     const grants::Actor& by) {
+  std::vector<grants::AccessHandle> own;
+  for (const grants::AccessEntry& entry : store.access.list({{}, client})) {
+    if (entry.kind == grants::AccessEntry::Kind::kOwn) own.push_back(entry.handle);
+  }
+  return store.access.end(own, by);
+}
+
+Answer revoke(grants::Grants& store, const Request& request, const Parameters& form) {
+  const grants::ApplicationId client(form.value("client"));
+  const grants::User user(form.value("user"));
+  if (user.text().empty()) {
+    return ended(request, endOwn(store, client, by(request)),
+                 "application=" + percentEncode(client.text()));
+  }
+  return ended(request, store.access.endUserWith(user, client, by(request)),
+               "user=" + percentEncode(user.text()));
+}
+
+Answer revokeAll(grants::Grants& store, const Request& request, const Parameters& form) {
+  const grants::User user(form.value("user"));
+  return ended(request, store.access.endUser(user, by(request)),
+               "user=" + percentEncode(user.text()));
+}
+
+constexpr struct {
+  std::string_view name;
+  Answer (*act)(grants::Grants& store, const Request& request, const Parameters& form);
+} kActions[] = {{"register", registerClient}, {"enable", enable}, {"disable", disable},
+                {"remove", remove},           {"revoke", revoke}, {"revoke-all", revokeAll}};
 
 }  // namespace
 
-Answer act(const Request& request, const Parameters& form) {
-  const std::string action = form.value("action");
-  if (action == "register") return registerClient(request, form);
-  if (action == "revoke") return revoke(request, form);
-  if (action == "enable" || action == "disable" || action == "remove") {
-    return changeClient(request, form, action);
+Answer act(grants::Grants& store, const Request& request, const Parameters& form) {
+  const std::string asked = form.value("action");
+  for (const auto& action : kActions) {
+    if (action.name == asked) return action.act(store, request, form);
   }
   return messagePage(400, "This form is not known", "Nothing was changed.");
 }

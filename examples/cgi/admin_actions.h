@@ -4,11 +4,12 @@
 #define KELDOAUTH_EXAMPLES_CGI_ADMIN_ACTIONS_H
 
 #include "examples/cgi/answer.h"
+#include "grants/grants.h"
 
 namespace service {
 
 /// The form's token has been checked.
-Answer act(const Request& request, const Parameters& form);
+Answer act(KELDOAUTHSERVER::grants::Grants& store, const Request& request, const Parameters& form);
 
 }  // namespace service
 

@@ -1,6 +1,5 @@
 #include "examples/cgi/admin_pages.h"
 
-#include "examples/cgi/admin_rows.h"
 #include "examples/cgi/admin_view.h"
 #include "examples/cgi/html.h"
 #include "examples/cgi/redirect.h"
@@ -45,58 +44,64 @@ std::string registrationForm(const std::string& user, const Draft& draft) {
          "</form>\n</section>\n";
 }
 
-std::string shownAddresses(const Client& client) {
-  if (client.redirects == kNoRedirect) return "no redirect address";
-  return client.redirects;
+std::string shownAddresses(const grants::Application& client) {
+  std::string all;
+  for (const grants::RedirectAddress& address : client.addresses) {
+    all += (all.empty() ? "" : " ") + address.text();
+  }
+  return all.empty() ? "no redirect address" : all;
 }
 
-std::string applicationActions(const std::string& user, const Client& client) {
-  const char* change = client.enabled ? "disable" : "enable";
-  const char* word = client.enabled ? "Disable" : "Enable";
+std::string applicationActions(const std::string& user, const grants::Application& client) {
+  const char* change = client.isEnabled ? "disable" : "enable";
+  const char* word = client.isEnabled ? "Disable" : "Enable";
   return "<div class=\"actions\">\n" + formStart(user, change) +
          fill(
              "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
              "<button aria-label=\"{} {}\">{}</button>\n</form>\n",
-             {client.identifier, word, client.name, word}) +
-         fill("<details><summary aria-label=\"Remove {}…\">Remove…</summary>\n", {client.name}) +
+             {client.identifier.text(), word, client.name.text(), word}) +
+         fill("<details><summary aria-label=\"Remove {}…\">Remove…</summary>\n",
+              {client.name.text()}) +
          formStart(user, "remove") +
          fill(
              "<input type=\"hidden\" name=\"client\" value=\"{}\">\n"
              "<p><bdi>{}</bdi> and all access that it has will be gone for good.</p>\n"
              "<button class=\"danger\">Remove for good</button>\n</form>\n</details>\n</div>\n",
-             {client.identifier, client.name});
+             {client.identifier.text(), client.name.text()});
 }
 
-std::string applicationItem(const std::string& user, const Client& client) {
-  return fill("<li class=\"card\">\n<h3>{}</h3>\n", {client.name}) +
-         (client.enabled ? "<p class=\"badge on\">Enabled</p>\n"
-                         : "<p class=\"badge off\">Disabled</p>\n") +
+std::string applicationItem(const std::string& user, const grants::Application& client) {
+  return fill("<li class=\"card\">\n<h3>{}</h3>\n", {client.name.text()}) +
+         (client.isEnabled ? "<p class=\"badge on\">Enabled</p>\n"
+                           : "<p class=\"badge off\">Disabled</p>\n") +
          fill("<dl><dt>Address</dt><dd>{}</dd>\n<dt>Identifier</dt><dd><code>{}</code></dd></dl>\n",
-              {shownAddresses(client), client.identifier}) +
-         scopeTags(client.scope) + applicationActions(user, client) + "</li>\n";
+              {shownAddresses(client), client.identifier.text()}) +
+         scopeTags(client.scope.text()) + applicationActions(user, client) + "</li>\n";
 }
 
 }  // namespace
 
-Answer applicationsPage(const std::string& user, const std::string& done, const Draft& draft) {
+Answer applicationsPage(const grants::Grants& store, const std::string& admin,
+                        const std::string& done, const Draft& draft) {
   std::string items;
-  for (const Client& client : allClients()) items += applicationItem(user, client);
+  for (const grants::Application& client : store.applications.all())
+    items += applicationItem(admin, client);
   const std::string list = items.empty() ? "<p class=\"empty\">No application is registered.</p>\n"
                                          : "<ul class=\"cards\">\n" + items + "</ul>\n";
   const std::string registered =
       "<section aria-labelledby=\"registered\">\n<h2 id=\"registered\">Registered</h2>\n"
       "<p class=\"jump\"><a href=\"#new\">Register an application</a></p>\n" +
       list + "</section>\n";
-  const std::string form = registrationForm(user, draft);
-  return view(kApplications, user,
+  const std::string form = registrationForm(admin, draft);
+  return view(kApplications, admin,
               notice(done) + "<div class=\"columns\">\n" +
                   (draft.fault.empty() ? registered + form : form + registered) + "</div>\n",
               draft.fault.empty() ? 200 : 400);
 }
 
-Answer secretPage(const std::string& user, const std::string& name, const std::string& identifier,
-                  const std::string& secret) {
-  return view(kApplications, user,
+Answer secretPage(const std::string& admin, const grants::ApplicationName& name,
+                  const grants::Registered& registered) {
+  return view(kApplications, admin,
               fill("<section class=\"card\" aria-labelledby=\"secret\">\n"
                    "<h2 id=\"secret\">{} is registered</h2>\n"
                    "<p class=\"notice\" role=\"status\">Copy the secret now: it is shown this once "
@@ -104,7 +109,7 @@ Answer secretPage(const std::string& user, const std::string& name, const std::s
                    "<dl><dt>Identifier</dt><dd><code>{}</code></dd>\n"
                    "<dt>Secret</dt><dd><code class=\"secret\">{}</code></dd></dl>\n"
                    "<p><a class=\"button\" href=\"/admin\">Done</a></p>\n</section>\n",
-                   {name, identifier, secret}));
+                   {name.text(), registered.identifier.text(), registered.secret->text()}));
 }
 
 }  // namespace service

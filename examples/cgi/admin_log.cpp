@@ -2,13 +2,14 @@
 
 #include <algorithm>
 
-#include "examples/cgi/admin_rows.h"
 #include "examples/cgi/admin_view.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/html.h"
 
 namespace service {
 namespace {
+
+constexpr int kRows = 200;
 
 /// No log is so long that it had more pages.
 int pageNumber(const std::string& text) {
@@ -29,16 +30,21 @@ std::string logTurns(const std::string& filter, int page, bool more) {
 
 }  // namespace
 
-Answer logPage(const std::string& user, const std::string& filter, const std::string& number) {
+Answer logPage(const grants::Grants& store, const std::string& admin, const std::string& filter,
+               const std::string& number) {
   const int page = pageNumber(number);
-  std::vector<LogEntry> entries = logEntries(filter, page);
-  const bool more = entries.size() > kLogRows;
+  grants::AuditFilter wanted;
+  wanted.contains = filter;
+  wanted.most = kRows + 1;  // one more, when another page follows
+  wanted.skipped = (page - 1) * kRows;
+  std::vector<grants::AuditEntry> entries = store.audit.list(wanted);
+  const bool more = entries.size() > kRows;
   if (more) entries.pop_back();
   std::string rows;
-  for (const LogEntry& entry : entries) {
+  for (const grants::AuditEntry& entry : entries) {
     rows += "<tr><td>" + timeText(entry.time) + fill("</td><td>{}</td></tr>\n", {entry.text});
   }
-  return view(kLog, user,
+  return view(kLog, admin,
               fill("<form method=\"get\" action=\"/admin\" class=\"search\" role=\"search\">\n"
                    "<input type=\"hidden\" name=\"view\" value=\"log\">\n"
                    "<label for=\"filter\">Contains</label>\n"

@@ -6,8 +6,11 @@
 #include <string>
 
 #include "examples/cgi/answer.h"
+#include "grants/grants.h"
 
 namespace service {
+
+namespace grants = KELDOAUTHSERVER::grants;
 
 /// The fields of the registration form, to be shown again with its fault.
 struct Draft {
@@ -17,19 +20,28 @@ struct Draft {
   std::string fault;
 };
 
-/// `done` is the word for what was done just now; unknown words say nothing.
-Answer applicationsPage(const std::string& user, const std::string& done, const Draft& draft);
+/// Whose access is shown: a user's, or an application's own; empty for the list.
+struct Shown {
+  std::string user;
+  std::string application;
+};
 
-/// `shown` is whose access is shown; empty for the list of users.
-Answer accessPage(const std::string& user, const std::string& done, const std::string& shown);
+// `admin` is who looks; `done` is the word for what was done just now, and an
+// unknown word says nothing.
+
+Answer applicationsPage(const grants::Grants& store, const std::string& admin,
+                        const std::string& done, const Draft& draft);
+Answer accessPage(const grants::Grants& store, const std::string& admin, const std::string& done,
+                  const Shown& shown);
 
 /// The page with this `number`: 1 is the newest; any text will do.
-Answer logPage(const std::string& user, const std::string& filter, const std::string& number);
-Answer storagePage(const std::string& user);
+Answer logPage(const grants::Grants& store, const std::string& admin, const std::string& filter,
+               const std::string& number);
+Answer storagePage(const grants::Grants& store, const std::string& admin);
 
 /// The only time that a secret is shown.
-Answer secretPage(const std::string& user, const std::string& name, const std::string& identifier,
-                  const std::string& secret);
+Answer secretPage(const std::string& admin, const grants::ApplicationName& name,
+                  const grants::Registered& registered);
 
 }  // namespace service
 

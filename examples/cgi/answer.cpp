@@ -7,14 +7,22 @@
 #include <iostream>
 #include <new>
 
-#include "core/oauth_db_basic.h"
-#include "core/oauth_errors.h"
-#include "utils/oauth_names.h"
+#include "grants/trouble.h"
 
 namespace service {
 namespace {
 
+using KELDOAUTHSERVER::grants::Trouble;
+
 constexpr char kRetryAfterSeconds[] = "5";
+
+constexpr Failure kBusy{503, "temporarily_unavailable", "One moment, please",
+                        "The box is busy. Nothing was lost; please try again in a few seconds."};
+constexpr Failure kFull{503, "temporarily_unavailable", "The box is full",
+                        "There is no room for more until its administrator makes some. Nothing "
+                        "was lost."};
+constexpr Failure kBroken{500, "server_error", "Something is wrong with the box",
+                          "Its administrator has to look after it. Nothing was lost."};
 
 const char* reason(int status) {
   switch (status) {
@@ -47,20 +55,21 @@ const char* reason(int status) {
   }
 }
 
-Answer jsonUnavailable() {
-  return oauthError(503, "temporarily_unavailable", "The service is busy, please try again");
+Answer tryAgain(Answer (*tell)(const Failure&)) {
+  return tell(kBusy).with("Retry-After", kRetryAfterSeconds);
 }
 
-Answer answerTo(Answer (*handle)(const Request&), Answer (*unavailable)()) try {
+Answer answerTo(Answer (*handle)(const Request&), Answer (*tell)(const Failure&)) try {
   return handle(readRequest([](const char* name) { return std::getenv(name); }, std::cin));
 } catch (const Refusal& refusal) {
   return refusal.answer;
-} catch (const Unavailable&) {
-  return unavailable().with("Retry-After", kRetryAfterSeconds);
+} catch (const Trouble& trouble) {
+  if (trouble.canTryAgain()) return tryAgain(tell);
+  return tell(trouble.kind() == Trouble::Kind::kFull ? kFull : kBroken);
 } catch (const std::bad_alloc&) {
-  return unavailable().with("Retry-After", kRetryAfterSeconds);
+  return tryAgain(tell);
 } catch (const std::exception&) {
-  return plainAnswer(500);
+  return tell(kBroken);
 }
 
 }  // namespace
@@ -99,15 +108,8 @@ Answer redirectAnswer(const Request& request, const std::string& address) {
   return Answer{request.isRead() ? 302 : 303, {{"Location", address}}, ""};
 }
 
-bool hadNoRow(const KELDOAUTHSERVER::OAUTHDBBasic& store) {
-  if (store.GetErrCode() != KELDOAUTHSERVER::errors::kNone.code) throw Unavailable{};
-  return true;
-}
-
-bool takeRow(KELDOAUTHSERVER::OAUTHDBBasic& store, const char* column, const std::string& value) {
-  Json::Value request;
-  request[KELDOAUTHSERVER::names::kCondition][column] = value;
-  return store.DBDel(request) || !hadNoRow(store);
+Answer failureAsJson(const Failure& failure) {
+  return oauthError(failure.status, failure.error, failure.text);
 }
 
 void write(const Answer& answer, std::ostream& output) {
@@ -120,8 +122,8 @@ void write(const Answer& answer, std::ostream& output) {
          << answer.body << std::flush;
 }
 
-int serve(Answer (*handle)(const Request&), Answer (*unavailable)()) {
-  write(answerTo(handle, unavailable == nullptr ? jsonUnavailable : unavailable), std::cout);
+int serve(Answer (*handle)(const Request&), Answer (*tell)(const Failure&)) {
+  write(answerTo(handle, tell), std::cout);
   return std::cout ? 0 : 1;
 }
 

@@ -1,5 +1,5 @@
-// What a program answers: status, headers, body; and the two ways out of the
-// middle of a request.
+// What a program answers: status, headers, body; and what it says when it could
+// not do what was asked.
 
 #ifndef KELDOAUTH_EXAMPLES_CGI_ANSWER_H
 #define KELDOAUTH_EXAMPLES_CGI_ANSWER_H
@@ -12,10 +12,6 @@
 #include <vector>
 
 #include "examples/cgi/http.h"
-
-namespace KELDOAUTHSERVER {
-class OAUTHDBBasic;
-}
 
 namespace service {
 
@@ -33,9 +29,14 @@ struct Refusal {
   Answer answer;
 };
 
-/// Thrown when the store could not say: the client may well be right and shall
-/// try again. Becomes 503 with Retry-After, in the form that the program speaks.
-struct Unavailable {};
+/// Why nobody could have been answered. The request may well be right: nothing
+/// is said of it, and nothing has been changed.
+struct Failure {
+  int status;
+  const char* error;  // as RFC 6749, 4.1.2.1 has it
+  const char* title;
+  const char* text;
+};
 
 Answer plainAnswer(int status);
 Answer jsonAnswer(int status, const Json::Value& document);
@@ -49,22 +50,14 @@ Answer methodNotAllowed(const std::string& allowed);
 /// To the user's browser. After a form the next request must be a GET: 303.
 Answer redirectAnswer(const Request& request, const std::string& address);
 
-/// True when `store` never failed: then an operation without effect had no row
-/// to work on. Otherwise throws Unavailable.
-bool hadNoRow(const KELDOAUTHSERVER::OAUTHDBBasic& store);
-
-/// Deletes what has this value in `column`. True when there was a row: with a
-/// unique column, for the one caller who deleted it. Never delete by `id`
-/// what was read a moment ago: SQLite gives the id of the last row, once it is
-/// deleted, to the next one, and of two requests with one code the slower would
-/// delete somebody else's.
-bool takeRow(KELDOAUTHSERVER::OAUTHDBBasic& store, const char* column, const std::string& value);
-
 void write(const Answer& answer, std::ostream& output);
 
+Answer failureAsJson(const Failure& failure);
+
 /// The whole life of a program: reads the request, answers with what `handle`
-/// returns or throws, and with `unavailable` when the store could not say.
-int serve(Answer (*handle)(const Request&), Answer (*unavailable)() = nullptr);
+/// returns or throws, and in the form of `tell` when the store could not do it:
+/// 503, with Retry-After when the same request can succeed in a moment, or 500.
+int serve(Answer (*handle)(const Request&), Answer (*tell)(const Failure&) = failureAsJson);
 
 }  // namespace service
 

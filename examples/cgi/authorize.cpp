@@ -2,10 +2,8 @@
 // sends the answer to the application (RFC 6749, 4.1; 7636; 9207). The web
 // server has authenticated the user.
 
-#include "core/oauth_errors.h"
 #include "examples/cgi/answer.h"
 #include "examples/cgi/clients.h"
-#include "examples/cgi/code_state.h"
 #include "examples/cgi/consent_page.h"
 #include "examples/cgi/csrf.h"
 #include "examples/cgi/encoding.h"
@@ -13,18 +11,13 @@
 #include "examples/cgi/redirect.h"
 #include "examples/cgi/scopes.h"
 #include "examples/cgi/settings.h"
-#include "stores/oauth_grantCode.h"
-#include "stores/oauth_log.h"
 #include "utils/oauth_bounds.h"
-#include "utils/oauth_names.h"
-#include "utils/oauth_utils.h"
 
 namespace {
 
 using namespace service;
-using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxUser = bounds::kUsername.max;
+constexpr std::size_t kMaxUser = KELDOAUTHSERVER::bounds::kUsername.max;
 constexpr std::size_t kChallengeBytes = 43;
 
 [[noreturn]] void refuseWithPage(int status, const std::string& why) {
@@ -46,29 +39,47 @@ std::string addressWith(const AuthorizationRequest& asked, const std::string& pa
       request, addressWith(asked, "error=" + error + "&error_description=" + percentEncode(why)))};
 }
 
+/// That an application is no good any more is nothing to send its users back for.
+[[noreturn]] void refuse(const Request& request, const AuthorizationRequest& asked,
+                         const grants::Refusal& refusal) {
+  const char* why = grants::explain(refusal.why);
+  if (refusal.error == grants::Error::kInvalidClient) refuseWithPage(403, std::string(why) + ".");
+  refuse(request, asked, grants::codeText(refusal.error), why);
+}
+
 /// Until client and address are known to belong together, nobody is redirected
 /// anywhere.
-void readClient(const Parameters& given, AuthorizationRequest& asked) {
+AuthorizationRequest readClient(const grants::Grants& store, const Parameters& given) {
   if (given.isAnyDoubled({"client_id", "redirect_uri"})) {
     refuseWithPage(400, "The application or its address is named twice.");
   }
-  std::optional<Client> client = findClient(given.value("client_id"));
+  const auto client = store.applications.find(grants::ApplicationId(given.value("client_id")));
   if (!client) refuseWithPage(400, "The application that sent you here is not known to this box.");
-  if (!client->enabled) {
+  if (!client->isEnabled) {
     refuseWithPage(403, "The administrator of this box has disabled this application.");
   }
-  asked.client = *client;
-  asked.redirect = given.value("redirect_uri");
-  asked.redirectWasGiven = !asked.redirect.empty();
-  if (!asked.redirectWasGiven) asked.redirect = onlyAddress(client->redirects);
-  if (asked.redirect.empty() || !isRegistered(asked.redirect, client->redirects)) {
+  const bool named = given.has("redirect_uri");
+  AuthorizationRequest asked{
+      *client, named ? given.value("redirect_uri") : onlyAddress(client->addresses), named};
+  if (asked.redirect.empty() || !isRegistered(asked.redirect, client->addresses)) {
     refuseWithPage(400, "The address to return to is not one that the application registered.");
   }
+  return asked;
 }
 
 bool isChallenge(const std::string& text) {
   return text.size() == kChallengeBytes && percentEncode(text) == text &&
          text.find_first_of(".~") == std::string::npos;
+}
+
+grants::CodeRequest codeRequest(const Request& request, const AuthorizationRequest& asked) {
+  grants::CodeRequest code{grants::User(request.user), asked.client.identifier,
+                           grants::Scope(asked.scope), grants::RedirectAddress(asked.redirect)};
+  code.named =
+      asked.redirectWasGiven ? grants::AddressNamed::kInRequest : grants::AddressNamed::kImplied;
+  code.pkce = grants::Pkce{grants::Challenge(asked.challenge)};
+  code.from = peerAddress();
+  return code;
 }
 
 /// Faults that the application hears of.
@@ -89,37 +100,17 @@ void readRest(const Request& request, const Parameters& given, AuthorizationRequ
   if (given.value("code_challenge_method") != "S256" || !isChallenge(asked.challenge)) {
     refuse(request, asked, "invalid_request", "PKCE with the method S256 is required");
   }
-  asked.scope = given.has("scope") ? tidyScope(given.value("scope")) : asked.client.scope;
-  if (asked.scope.empty() || !isWithin(asked.scope, asked.client.scope)) {
+  const std::string& registered = asked.client.scope.text();
+  asked.scope = tidyScope(given.has("scope") ? given.value("scope") : registered);
+  if (asked.scope.empty() || !isWithin(asked.scope, registered)) {
     refuse(request, asked, "invalid_scope", "The application is not registered for this scope");
   }
+  const auto fault = grants::Codes::faultOf(codeRequest(request, asked));
+  if (fault) refuse(request, asked, *fault);
 }
 
-AuthorizationRequest readAsked(const Request& request, const Parameters& given) {
-  AuthorizationRequest asked;
-  readClient(given, asked);
-  readRest(request, given, asked);
-  return asked;
-}
-
-/// A full table gets one chance: codes that nobody redeemed in time may go.
-std::string issueCode(const Request& request, const AuthorizationRequest& asked) {
-  const std::string state =
-      pack(CodeState{asked.redirect, asked.redirectWasGiven, asked.challenge});
-  for (const bool mayPurge : {true, false}) {
-    OAUTHDBGrantCode codes(names::kGrantCodeTable);
-    Json::Value issued;
-    if (codes.Add(request.user, asked.client.identifier, asked.scope, state, getRemoteIP(),
-                  issued) != 0) {
-      return issued[names::kCode].asString();
-    }
-    if (!mayPurge || codes.GetErrCode() != errors::kGrantCodeFull.code) break;
-    codes.Purge();
-  }
-  throw Unavailable{};
-}
-
-Answer decide(const Request& request, const Parameters& given, const AuthorizationRequest& asked) {
+Answer decide(grants::Grants& store, const Request& request, const Parameters& given,
+              const AuthorizationRequest& asked) {
   if (given.isAnyDoubled({"form_token", "decision"}) ||
       !isFormToken(given.value("form_token"), request.user, formSubject(asked))) {
     refuseWithPage(403,
@@ -131,10 +122,9 @@ Answer decide(const Request& request, const Parameters& given, const Authorizati
     refuse(request, asked, "access_denied", "The user refused");
   }
   if (decision != "allow") refuseWithPage(400, "The form does not say what you decided.");
-  const std::string code = issueCode(request, asked);
-  OAUTHDBLog log(names::kLogTable);
-  log.Add("Access allowed[" + asked.client.name + "] by " + request.user);
-  return redirectAnswer(request, addressWith(asked, "code=" + code));
+  const auto issued = store.codes.issue(codeRequest(request, asked));
+  if (!issued) refuse(request, asked, issued.refusal());
+  return redirectAnswer(request, addressWith(asked, "code=" + issued->code.text()));
 }
 
 Answer handle(const Request& request) {
@@ -148,12 +138,14 @@ Answer handle(const Request& request) {
       Parameters::parse(isDecision ? request.body : request.query);
   if (!given) refuseWithPage(400, "The request cannot be read.");
 
-  const AuthorizationRequest asked = readAsked(request, *given);
-  return isDecision ? decide(request, *given, asked) : consentPage(request.user, asked);
+  grants::Grants store;
+  AuthorizationRequest asked = readClient(store, *given);
+  readRest(request, *given, asked);
+  return isDecision ? decide(store, request, *given, asked) : consentPage(request.user, asked);
 }
 
 }  // namespace
 
 int main() {
-  return serve(handle, unavailablePage);
+  return serve(handle, failurePage);
 }

@@ -2,25 +2,22 @@
 
 #include <algorithm>
 
-#include "examples/cgi/answer.h"
 #include "examples/cgi/encoding.h"
-#include "stores/oauth_clientInfo.h"
 #include "utils/oauth_bounds.h"
-#include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
 
 namespace service {
 namespace {
 
 using namespace KELDOAUTHSERVER;
 
-struct Credentials {
-  std::string identifier;
-  std::string secret;
-};
+Answer unauthenticated(const std::string& why) {
+  return oauthError(401, grants::codeText(grants::Error::kInvalidClient), why)
+      .with("WWW-Authenticate", R"(Basic realm="oauth", charset="UTF-8")");
+}
 
 [[noreturn]] void refuseClient(const std::string& why) {
-  throw Refusal{oauthError(401, "invalid_client", why)
-                    .with("WWW-Authenticate", R"(Basic realm="oauth", charset="UTF-8")")};
+  throw Refusal{unauthenticated(why)};
 }
 
 [[noreturn]] void refuseRequest(const std::string& why) {
@@ -42,31 +39,10 @@ Credentials readBasic(const std::string& header) {
   const std::optional<std::string> identifier = formDecode(pair->substr(0, colon));
   const std::optional<std::string> secret = formDecode(pair->substr(colon + 1));
   if (!identifier || !secret) refuseClient("The Authorization header cannot be read");
-  return {*identifier, *secret};
-}
-
-Credentials readCredentials(const Request& request, const Parameters& form) {
-  const std::string identifier = form.value("client_id");
-  const std::string secret = form.value("client_secret");
-  if (request.authorization.empty()) return {identifier, secret};
-
-  if (!secret.empty()) refuseRequest("More than one way of client authentication");
-  Credentials credentials = readBasic(request.authorization);
-  if (!identifier.empty() && identifier != credentials.identifier) {
-    refuseRequest("client_id is not the one in the Authorization header");
-  }
-  return credentials;
+  return {grants::ApplicationId(*identifier), grants::Secret(*secret)};
 }
 
 }  // namespace
-
-std::string undoubled(const Json::Value& text) {
-  std::string single = text.asString();
-  for (std::size_t at = single.find("''"); at != std::string::npos; at = single.find("''", at)) {
-    single.erase(at++, 1);
-  }
-  return single;
-}
 
 std::string faultOfName(const std::string& name) {
   const auto isControl = [](unsigned char byte) { return byte < ' ' || byte == 0x7f; };
@@ -81,37 +57,6 @@ std::string faultOfName(const std::string& name) {
   return {};
 }
 
-Client clientOf(const Json::Value& row) {
-  return {number(row[names::kId].asString()),  row[names::kEnable].asString() == "1",
-          undoubled(row[names::kClientId]),    undoubled(row[names::kClientSecret]),
-          undoubled(row[names::kRedirectUri]), undoubled(row[names::kScope]),
-          undoubled(row[names::kDisplayName])};
-}
-
-std::optional<Client> findClient(const std::string& identifier) {
-  if (identifier.size() != kIdentifierLength) return std::nullopt;
-  OAUTHDBClientInfo clients(names::kClientInfoTable);
-  Json::Value rows;
-  if (clients.Get(identifier, &rows) == 0) throw Unavailable{};
-  if (rows.empty()) return std::nullopt;
-
-  Client client = clientOf(rows[0]);
-  // A row that could not be decrypted is not the one asked for.
-  if (client.identifier != identifier) throw Unavailable{};
-  return client;
-}
-
-Client authenticate(const Request& request, const Parameters& form) {
-  const Credentials credentials = readCredentials(request, form);
-  if (credentials.identifier.empty()) refuseClient("Client authentication is required");
-  std::optional<Client> client = findClient(credentials.identifier);
-  if (!client || !equalSecrets(credentials.secret, client->secret)) {
-    refuseClient("Unknown client or wrong secret");
-  }
-  if (!client->enabled) refuseClient("This client has been disabled");
-  return *client;
-}
-
 Parameters readForm(const Request& request, std::initializer_list<std::string_view> names) {
   if (request.method != "POST") throw Refusal{methodNotAllowed("POST")};
   if (!request.isForm()) refuseRequest("The content type must be that of a form");
@@ -121,6 +66,41 @@ Parameters readForm(const Request& request, std::initializer_list<std::string_vi
     refuseRequest("A parameter occurs more than once");
   }
   return *form;
+}
+
+Credentials readCredentials(const Request& request, const Parameters& form) {
+  const grants::ApplicationId identifier(form.value("client_id"));
+  const grants::Secret secret(form.value("client_secret"));
+  Credentials credentials{identifier, secret};
+  if (!request.authorization.empty()) {
+    if (form.has("client_secret")) refuseRequest("More than one way of client authentication");
+    credentials = readBasic(request.authorization);
+    if (form.has("client_id") && identifier != credentials.identifier) {
+      refuseRequest("client_id is not the one in the Authorization header");
+    }
+  }
+  if (credentials.identifier.text().empty()) refuseClient("Client authentication is required");
+  return credentials;
+}
+
+grants::Application authenticate(const grants::Grants& store, const Credentials& credentials) {
+  const auto client = store.applications.authenticate(credentials.identifier, credentials.secret);
+  if (!client) throw Refusal{refusalAnswer(client.refusal())};
+  return *client;
+}
+
+Answer refusalAnswer(const grants::Refusal& refusal) {
+  const char* why = grants::explain(refusal.why);
+  if (refusal.error == grants::Error::kInvalidClient) return unauthenticated(why);
+  return oauthError(400, grants::codeText(refusal.error), why);
+}
+
+std::string subjectOf(const grants::Bearer& bearer) {
+  return bearer.user ? bearer.user->text() : bearer.application.text();
+}
+
+grants::PeerAddress peerAddress() {
+  return grants::PeerAddress(getRemoteIP());
 }
 
 }  // namespace service

@@ -16,7 +16,7 @@ std::string hidden(const char* name, const std::string& value) {
 
 /// The request once more, to come back with the decision.
 std::string hiddenRequest(const std::string& user, const AuthorizationRequest& asked) {
-  return hidden("client_id", asked.client.identifier) +
+  return hidden("client_id", asked.client.identifier.text()) +
          hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
          hidden("response_type", "code") + hidden("scope", asked.scope) +
          hidden("state", asked.state) + hidden("code_challenge", asked.challenge) +
@@ -54,8 +54,8 @@ administrator of the box can take the access back at any time.</p>
 
 std::string formSubject(const AuthorizationRequest& asked) {
   std::string subject = "consent";
-  for (const std::string& part :
-       {asked.client.identifier, asked.redirect, asked.scope, asked.state, asked.challenge}) {
+  for (const std::string& part : {asked.client.identifier.text(), asked.redirect, asked.scope,
+                                  asked.state, asked.challenge}) {
     subject += "." + base64Url(part);
   }
   return subject;
@@ -63,8 +63,8 @@ std::string formSubject(const AuthorizationRequest& asked) {
 
 Answer consentPage(const std::string& user, const AuthorizationRequest& asked) {
   const std::string origin = originOf(asked.redirect);
-  return pageLeadingAway(asked.client.name + " asks for access",
-                         fill(kQuestion, {user, asked.client.name, origin}) +
+  return pageLeadingAway(asked.client.name.text() + " asks for access",
+                         fill(kQuestion, {user, asked.client.name.text(), origin}) +
                              scopeItems(asked.scope) +
                              "</ul>\n<form method=\"post\" action=\"/oauth/authorize\">\n" +
                              hiddenRequest(user, asked) + kDecision);

@@ -11,12 +11,12 @@
 namespace service {
 
 struct AuthorizationRequest {
-  Client client;
+  grants::Application client;
   std::string redirect;
   bool redirectWasGiven = false;
-  std::string scope;
-  std::string state;
-  std::string challenge;
+  std::string scope = {};
+  std::string state = {};
+  std::string challenge = {};
 };
 
 /// What the form's token is bound to: everything that the user decides about.

@@ -12,26 +12,8 @@
 namespace service {
 namespace {
 
-using Digest = std::array<std::uint8_t, SHA256_DIGEST_SIZE>;
-
 const std::uint8_t* bytesOf(std::string_view text) {
   return reinterpret_cast<const std::uint8_t*>(text.data());
-}
-
-std::string textOf(const Digest& digest) {
-  return {digest.begin(), digest.end()};
-}
-
-std::optional<std::string> decode(base64_decode_ctx& decoder, std::string_view text) {
-  std::string bytes(BASE64_DECODE_LENGTH(text.size()), '\0');
-  std::size_t size = bytes.size();
-  if (base64_decode_update(&decoder, &size, reinterpret_cast<std::uint8_t*>(bytes.data()),
-                           text.size(), text.data()) == 0 ||
-      base64_decode_final(&decoder) == 0) {
-    return std::nullopt;
-  }
-  bytes.resize(size);
-  return bytes;
 }
 
 bool isContinuation(char c) {
@@ -56,36 +38,27 @@ std::string base64Url(std::string_view bytes) {
   return text;
 }
 
-std::optional<std::string> base64UrlDecode(std::string_view text) {
-  std::string padded(text);
-  while (padded.size() % 4 != 0) padded += '=';
-  base64_decode_ctx decoder;
-  base64url_decode_init(&decoder);
-  return decode(decoder, padded);
-}
-
 std::optional<std::string> base64Decode(std::string_view text) {
   base64_decode_ctx decoder;
   base64_decode_init(&decoder);
-  return decode(decoder, text);
-}
-
-std::string sha256(std::string_view text) {
-  sha256_ctx context;
-  sha256_init(&context);
-  sha256_update(&context, text.size(), bytesOf(text));
-  Digest digest{};
-  sha256_digest(&context, digest.size(), digest.data());
-  return textOf(digest);
+  std::string bytes(BASE64_DECODE_LENGTH(text.size()), '\0');
+  std::size_t size = bytes.size();
+  if (base64_decode_update(&decoder, &size, reinterpret_cast<std::uint8_t*>(bytes.data()),
+                           text.size(), text.data()) == 0 ||
+      base64_decode_final(&decoder) == 0) {
+    return std::nullopt;
+  }
+  bytes.resize(size);
+  return bytes;
 }
 
 std::string hmacSha256(std::string_view key, std::string_view text) {
   hmac_sha256_ctx context;
   hmac_sha256_set_key(&context, key.size(), bytesOf(key));
   hmac_sha256_update(&context, text.size(), bytesOf(text));
-  Digest digest{};
+  std::array<std::uint8_t, SHA256_DIGEST_SIZE> digest{};
   hmac_sha256_digest(&context, digest.size(), digest.data());
-  return textOf(digest);
+  return {digest.begin(), digest.end()};
 }
 
 std::string percentEncode(std::string_view text) {

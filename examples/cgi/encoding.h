@@ -13,13 +13,11 @@ namespace service {
 
 /// Without padding, as RFC 7636 wants it.
 std::string base64Url(std::string_view bytes);
-std::optional<std::string> base64UrlDecode(std::string_view text);
 
 /// The plain alphabet, as the Basic scheme uses it.
 std::optional<std::string> base64Decode(std::string_view text);
 
 /// The digest's bytes.
-std::string sha256(std::string_view text);
 std::string hmacSha256(std::string_view key, std::string_view text);
 
 /// For the value of a parameter in a query or a form.
@@ -33,8 +31,7 @@ bool isUtf8(std::string_view text);
 /// Takes as long for a near miss as for a far one.
 bool equalSecrets(std::string_view a, std::string_view b);
 
-/// The decimal number at the start of a text; 0 without one. The stores give
-/// every value as a text.
+/// The decimal number at the start of a text; 0 without one.
 long long number(const std::string& text);
 
 std::vector<std::string> split(std::string_view text, char separator);

@@ -99,9 +99,8 @@ Answer messagePage(int status, const std::string& title, const std::string& text
                   link + "</main>\n");
 }
 
-Answer unavailablePage() {
-  return messagePage(503, "One moment, please",
-                     "The box is busy. Nothing was lost; please try again in a few seconds.");
+Answer failurePage(const Failure& failure) {
+  return messagePage(failure.status, failure.title, failure.text);
 }
 
 }  // namespace service

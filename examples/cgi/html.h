@@ -33,7 +33,7 @@ Answer messagePage(int status, const std::string& title, const std::string& text
                    const std::string& back = "");
 
 /// For `serve`.
-Answer unavailablePage();
+Answer failurePage(const Failure& failure);
 
 }  // namespace service
 

@@ -5,7 +5,6 @@
 #include "examples/cgi/answer.h"
 #include "examples/cgi/clients.h"
 #include "examples/cgi/settings.h"
-#include "examples/cgi/tokens.h"
 
 namespace {
 
@@ -17,33 +16,30 @@ Answer inactive() {
   return jsonAnswer(200, document);
 }
 
-Answer active(const Token& token, const std::string& scope, long long expires,
-              const std::string& type = "") {
+Answer active(const grants::Introspection& found) {
+  const grants::Bearer& bearer = found.bearer;
   Json::Value document;
   document["active"] = true;
-  document["scope"] = scope;
+  document["scope"] = bearer.scope.text();
   document["iss"] = settings().issuer;
-  document["sub"] = token.user;
-  document["client_id"] = token.clientId;
-  document["exp"] = static_cast<Json::Int64>(expires);
-  if (!type.empty()) document["token_type"] = type;
-  if (token.flow != kFlowClient) document["username"] = token.user;
-  if (token.state.issued > 0) document["iat"] = static_cast<Json::Int64>(token.state.issued);
+  document["sub"] = subjectOf(bearer);
+  document["client_id"] = bearer.application.text();
+  document["exp"] = static_cast<Json::Int64>(bearer.expires);
+  if (found.kind == grants::Introspection::Kind::kAccess) document["token_type"] = "Bearer";
+  if (bearer.user) document["username"] = bearer.user->text();
+  if (bearer.issued) document["iat"] = static_cast<Json::Int64>(*bearer.issued);
   return jsonAnswer(200, document);
 }
 
 Answer handle(const Request& request) {
   const Parameters form = readForm(request, {"token", "token_type_hint"});
-  const Client client = authenticate(request, form);
-  const std::string text = form.value("token");
-  if (text.empty()) return oauthError(400, "invalid_request", "token is missing");
-
-  if (const std::optional<Token> token = verifiedToken(text)) {
-    return active(*token, token->scope, token->expires, "Bearer");
-  }
-  const std::optional<Token> token = findRefreshToken(text);
-  if (!token || token->clientId != client.identifier || !token->isRefreshable()) return inactive();
-  return active(*token, token->state.grantScope, token->expires + kRefreshSeconds);
+  const Credentials credentials = readCredentials(request, form);
+  const grants::Grants store;
+  const grants::Application client = authenticate(store, credentials);
+  if (!form.has("token")) return oauthError(400, "invalid_request", "token is missing");
+  const auto found =
+      store.tokens.introspect(client.identifier, grants::AnyToken(form.value("token")));
+  return found ? active(*found) : inactive();
 }
 
 }  // namespace

@@ -4,8 +4,6 @@
 #include <cctype>
 #include <string_view>
 
-#include "examples/cgi/encoding.h"
-
 namespace service {
 namespace {
 
@@ -80,21 +78,19 @@ bool isRedirectAddress(const std::string& address) {
   return isHost(host) && (scheme == kHttps || isLoopback(host));
 }
 
-bool isRegistered(const std::string& address, const std::string& registered) {
+bool isRegistered(const std::string& address, const Addresses& registered) {
   if (!isRedirectAddress(address)) return false;
-  for (const std::string& entry : split(registered, ' ')) {
-    if (entry == (schemeOf(entry).empty() ? withoutScheme(address) : address)) return true;
-  }
-  return false;
+  const std::string rest = address.substr(schemeOf(address).size());
+  return std::any_of(registered.begin(), registered.end(),
+                     [&](const grants::RedirectAddress& entry) {
+                       return entry.text() == (schemeOf(entry.text()).empty() ? rest : address);
+                     });
 }
 
-std::string onlyAddress(const std::string& registered) {
-  const std::string address = withScheme(registered);
+std::string onlyAddress(const Addresses& registered) {
+  if (registered.size() != 1) return {};
+  const std::string address = withScheme(registered[0].text());
   return isRedirectAddress(address) ? address : std::string();
-}
-
-std::string withoutScheme(const std::string& address) {
-  return address.substr(schemeOf(address).size());
 }
 
 std::string originOf(const std::string& address) {

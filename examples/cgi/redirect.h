@@ -1,33 +1,40 @@
-// Redirect addresses. The registry keeps them without their scheme, so the
-// scheme follows from the host: https everywhere, and on the loopback interface
-// http as well, where nothing leaves the machine (RFC 8252, 7.3). Everything
-// behind the scheme is compared exactly, byte by byte, the port included.
+// Redirect addresses: https everywhere, and on the loopback interface http as
+// well, where nothing leaves the machine (RFC 8252, 7.3). They are compared
+// exactly, byte by byte, scheme and port included.
+//
+// Rows that the registry's own Add stored have lost their scheme. Such an entry
+// may have been either of the two: it is equal to the https address and, on the
+// loopback interface, to the http address as well; never to http elsewhere.
 
 #ifndef KELDOAUTH_EXAMPLES_CGI_REDIRECT_H
 #define KELDOAUTH_EXAMPLES_CGI_REDIRECT_H
 
+#include <cstddef>
 #include <string>
+#include <vector>
+
+#include "grants/texts.h"
 
 namespace service {
 
-/// What the registry holds for an application without a redirect address. No
-/// address is ever equal to it.
-inline constexpr char kNoRedirect[] = "(none)";
+namespace grants = KELDOAUTHSERVER::grants;
+
+/// The longest redirect address that may be registered. The code of a login
+/// remembers it, with room to spare.
+inline constexpr std::size_t kMaxRedirect = 1400;
+
+using Addresses = std::vector<grants::RedirectAddress>;
 
 /// An absolute https address, or http on the loopback interface, in the
 /// characters of RFC 3986, without user, fragment or blank.
 bool isRedirectAddress(const std::string& address);
 
-/// Whether `address` is one of the `registered`, a blank-separated list. An
-/// entry that has its scheme (an edit stores it) must be equal with it.
-bool isRegistered(const std::string& address, const std::string& registered);
+/// Whether `address` is one of the `registered`, with their schemes or without.
+bool isRegistered(const std::string& address, const Addresses& registered);
 
-/// The only address of `registered`, with its scheme, http on loopback; empty
-/// when there are none or several.
-std::string onlyAddress(const std::string& registered);
-
-/// The address as the registry keeps it.
-std::string withoutScheme(const std::string& address);
+/// The only address of `registered`; empty when there are none or several. One
+/// without a scheme gets http on loopback, else https.
+std::string onlyAddress(const Addresses& registered);
 
 /// "https://host:port" of a valid address.
 std::string originOf(const std::string& address);

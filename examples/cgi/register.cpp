@@ -4,27 +4,19 @@
 #include <json/reader.h>
 
 #include <ctime>
-#include <memory>
 #include <sstream>
 
-#include "core/oauth_errors.h"
 #include "examples/cgi/answer.h"
 #include "examples/cgi/clients.h"
-#include "examples/cgi/code_state.h"
 #include "examples/cgi/encoding.h"
 #include "examples/cgi/redirect.h"
 #include "examples/cgi/scopes.h"
 #include "examples/cgi/settings.h"
-#include "stores/oauth_clientInfo.h"
-#include "utils/oauth_bounds.h"
-#include "utils/oauth_names.h"
 
 namespace {
 
 using namespace service;
-using namespace KELDOAUTHSERVER;
 
-constexpr std::size_t kMaxRedirects = bounds::kRedirectUri.max;
 constexpr char kDefaultScope[] = "profile";
 constexpr char kDefaultMethod[] = "client_secret_basic";
 
@@ -97,22 +89,21 @@ bool usesRedirects(const Json::Value& metadata) {
   return false;
 }
 
-/// As the registry keeps them: without schemes, in one text.
-std::string readRedirects(const Json::Value& metadata) {
+/// None for an application that only acts for itself.
+Addresses readRedirects(const Json::Value& metadata) {
   const Json::Value& addresses = metadata["redirect_uris"];
   if (!addresses.isNull() && !addresses.isArray()) refuseRedirect("redirect_uris must be an array");
-  std::string stored;
+  Addresses read;
   for (const Json::Value& address : addresses) {
     if (!address.isString() || !isRedirectAddress(address.asString())) {
       refuseRedirect("Only https, or http on the loopback interface, without a fragment");
     }
     if (address.asString().size() > kMaxRedirect) refuseRedirect("An address is too long");
-    stored += (stored.empty() ? "" : " ") + withoutScheme(address.asString());
+    read.emplace_back(address.asString());
   }
-  if (!usesRedirects(metadata)) return kNoRedirect;
-  if (stored.empty()) refuseRedirect("redirect_uris is missing");
-  if (stored.size() > kMaxRedirects) refuseRedirect("redirect_uris is too long");
-  return stored;
+  if (!usesRedirects(metadata)) return {};
+  if (read.empty()) refuseRedirect("redirect_uris is missing");
+  return read;
 }
 
 std::string readScope(const Json::Value& metadata) {
@@ -138,11 +129,11 @@ std::string readMethod(const Json::Value& metadata) {
   return method;
 }
 
-Json::Value store(const std::string& redirects, const std::string& scope, const std::string& name) {
-  OAUTHDBClientInfo clients(names::kClientInfoTable);
-  Json::Value issued;
-  if (clients.Add(redirects, scope, name, issued) == 0) throw Unavailable{};
-  return issued;
+grants::Registered add(const grants::NewApplication& application) {
+  grants::Grants store;
+  const auto added = store.applications.add(application, grants::Actor(application.name.text()));
+  if (!added) throw Refusal{refusalAnswer(added.refusal())};
+  return *added;
 }
 
 Answer handle(const Request& request) {
@@ -157,15 +148,17 @@ Answer handle(const Request& request) {
   answer["token_endpoint_auth_method"] = readMethod(metadata);
   answer["client_name"] = readName(metadata);
   answer["scope"] = readScope(metadata);
-  const std::string redirects = readRedirects(metadata);
-  const Json::Value issued =
-      store(redirects, answer["scope"].asString(), answer["client_name"].asString());
+  grants::NewApplication application{grants::ApplicationName(answer["client_name"].asString()),
+                                     readRedirects(metadata),
+                                     grants::Scope(answer["scope"].asString())};
+  application.registersItself = true;
+  const grants::Registered registered = add(application);
 
-  answer["client_id"] = issued[names::kClientId];
-  answer["client_secret"] = issued[names::kClientSecret];
+  answer["client_id"] = registered.identifier.text();
+  answer["client_secret"] = registered.secret->text();
   answer["client_secret_expires_at"] = 0;
   answer["client_id_issued_at"] = static_cast<Json::Int64>(std::time(nullptr));
-  if (redirects != kNoRedirect) {
+  if (!application.addresses.empty()) {
     answer["redirect_uris"] = metadata["redirect_uris"];
     answer["response_types"].append("code");
     answer["grant_types"].append("authorization_code");

@@ -2,8 +2,8 @@
 // the scope "profile" who the token stands for (RFC 6750).
 
 #include "examples/cgi/answer.h"
+#include "examples/cgi/clients.h"
 #include "examples/cgi/scopes.h"
-#include "examples/cgi/tokens.h"
 
 namespace {
 
@@ -29,16 +29,20 @@ Answer handle(const Request& request) {
   }
   if (text->empty()) return refuse(400, "invalid_request", "The token is missing");
 
-  const std::optional<Token> token = verifiedToken(*text);
-  if (!token) return refuse(401, "invalid_token", "The token is unknown, expired or revoked");
-  if (!isWithin(kScope, token->scope)) {
+  const grants::Grants store;
+  const auto bearer = store.tokens.verify(grants::AccessToken(*text));
+  if (!bearer) {
+    const grants::Refusal& refusal = bearer.refusal();
+    return refuse(401, grants::codeText(refusal.error), grants::explain(refusal.why));
+  }
+  if (!isWithin(kScope, bearer->scope.text())) {
     return refuse(403, "insufficient_scope", "The token does not cover this",
                   std::string(", scope=\"") + kScope + "\"");
   }
   Json::Value document;
-  document["sub"] = token->user;
-  document["client_id"] = token->clientId;
-  document["scope"] = token->scope;
+  document["sub"] = subjectOf(*bearer);
+  document["client_id"] = bearer->application.text();
+  document["scope"] = bearer->scope.text();
   return jsonAnswer(200, document);
 }
 

@@ -59,7 +59,7 @@ void Store::requireReady() {
   const Trouble trouble = troubleOf(applications);
   for (OAUTHDBBasic* table : std::initializer_list<OAUTHDBBasic*>{
            &applications, &codes, &tokens, static_cast<OAUTHDBBasic*>(&log)}) {
-    if (table->DBCmd("SELECT 1", nullptr, nullptr) == 0) throw trouble;
+    if (table->DBCmd("", nullptr, nullptr) == 0) throw trouble;
   }
 }
 

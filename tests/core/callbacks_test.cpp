@@ -1,7 +1,7 @@
 // The library's row callbacks with arguments that no statement of its own has:
 // called by hand, and handed to the executor. This file is also built into a
-// program at a fixed address, where the callbacks that the program names are not
-// at the addresses that the library knows, unless the linker is told.
+// program at a fixed address, where the callbacks that the program names are
+// not at the addresses that the library knows, unless the linker is told.
 
 #include "tests/core/core_test.h"
 #include "tests/support/case_name.h"
@@ -57,7 +57,7 @@ class CallbackTest : public CoreTest, public ::testing::WithParamInterface<Callb
 
 INSTANTIATE_TEST_SUITE_P(Core, CallbackTest, ::testing::ValuesIn(kCallbacks), support::CaseName());
 
-// By hand -----------------------------------------------------------------------
+// By hand ---------------------------------------------------------------------
 
 TEST_P(CallbackTest, FillsItsDocument) {
   Json::Value doc = suitable();
@@ -105,7 +105,7 @@ TEST_P(CallbackTest, ReadsNoColumnOfANegativeCount) {
   });
 }
 
-// Through the executor ------------------------------------------------------------
+// Through the executor --------------------------------------------------------
 
 TEST_P(CallbackTest, ExecutorFillsItsDocument) {
   for (Json::Value doc : {suitable(), Json::Value()}) {

@@ -70,7 +70,7 @@ class LentTest : public StoreTest, public ::testing::WithParamInterface<Kind> {
   static void unblockLogTable() { sql("DROP INDEX oauth_log;"); }
 };
 
-// Construction --------------------------------------------------------------------
+// Construction ----------------------------------------------------------------
 
 TEST_P(LentTest, OpensNothingAndRunsNothing) {
   OAUTHDBToken owner(names::kTokenTable);
@@ -128,7 +128,7 @@ TEST_P(LentTest, SeesAndWritesWhatTheOwnerDoes) {
   owner->DBCmd("COMMIT;", nullptr, nullptr);
 }
 
-// Readiness -----------------------------------------------------------------------
+// Readiness -------------------------------------------------------------------
 
 TEST_P(LentTest, IsReadyWithTheOwner) {
   OAUTHDBToken owner(names::kTokenTable);
@@ -198,7 +198,7 @@ TEST_P(LentTest, HasNoConnectionOnAnOwnerWithout) {
   EXPECT_EQ(lent->GetErrMsg(), "bad parameter or other API misuse");
 }
 
-// Chains and lives ------------------------------------------------------------------
+// Chains and lives ------------------------------------------------------------
 
 TEST_P(LentTest, CanLendOn) {
   OAUTHDBToken owner(names::kTokenTable);
@@ -246,7 +246,7 @@ TEST_P(LentTest, ConnectionIsClosedWithTheOwnerOnceAndForAll) {
   EXPECT_THAT(journal(), IsEmpty());
 }  // a borrower that only goes after it touches nothing
 
-// Errors ------------------------------------------------------------------------------
+// Errors ----------------------------------------------------------------------
 
 TEST_P(LentTest, ErrorsOfBorrowerAndOwnerAreApart) {
   OAUTHDBToken owner(names::kTokenTable);
@@ -263,7 +263,7 @@ TEST_P(LentTest, ErrorsOfBorrowerAndOwnerAreApart) {
   EXPECT_EQ(lent->GetErrMsg(), "no such table: nowhere");
 }
 
-// Tables --------------------------------------------------------------------------------
+// Tables ----------------------------------------------------------------------
 
 TEST_P(LentTest, TableNamesOfBorrowerAndOwnerAreApart) {
   OAUTHDBToken owner(names::kTokenTable);

@@ -84,7 +84,7 @@ class LentTransactionTest : public StoreTest {
   std::optional<Stores> stores_;
 };
 
-// All four ------------------------------------------------------------------------
+// All four --------------------------------------------------------------------
 
 TEST_F(LentTransactionTest, CommitKeepsTheChangesOfAllWhoeverBeganIt) {
   Transaction transaction(clients());
@@ -177,7 +177,7 @@ TEST_F(LentTransactionTest, PurgeThroughABorrowerIsTakenBackWithIt) {
   EXPECT_EQ(rowCount("oauth_token"), 0);
 }
 
-// Registration --------------------------------------------------------------------
+// Registration ----------------------------------------------------------------
 
 TEST_F(LentTransactionTest, RegistrationThroughABorrowerOpensNothing) {
   FakeIds::use(1000, 1000);
