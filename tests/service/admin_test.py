@@ -250,6 +250,16 @@ class Storage(unittest.TestCase):
             count = file.execute("SELECT count(*) FROM oauth_clientInfo").fetchone()[0]
         self.assertIn(f"<strong>{count}</strong> of 1000 rows", show("?view=storage").text)
 
+    def test_what_gives_way_is_counted(self):
+        with sqlite3.connect(service.DATABASE) as file:
+            for table in ("oauth_token", "oauth_grantCode"):
+                file.execute(f"DELETE FROM {table}")
+        client = register()
+        client.log_in()
+        self.assertNotIn("would give way", show("?view=storage").text)
+        client.tokens()
+        self.assertIn("1 would give way to new rows</p>", show("?view=storage").text)
+
 
 class Forgery(unittest.TestCase):
     def test_form_without_a_token_of_ours_changes_nothing(self):
