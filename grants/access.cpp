@@ -154,8 +154,8 @@ Ended liveOf(Store& store, const Conditions& conditions) {
 Ended endAll(Store& store, const Conditions& conditions, const std::string& entry) {
   Whole whole(store);
   const Ended ended = liveOf(store, conditions);
-  store.run("DELETE FROM " + std::string(names::kGrantCodeTable) + " WHERE " + conditions.codes);
-  store.run("DELETE FROM " + std::string(names::kTokenTable) + " WHERE " + conditions.tokens);
+  store.eraseWhere(names::kGrantCodeTable, conditions.codes);
+  store.eraseWhere(names::kTokenTable, conditions.tokens);
   if (ended.codes + ended.tokens > 0) rows::note(store, entry);
   whole.commit();
   return ended;

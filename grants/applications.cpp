@@ -22,7 +22,6 @@ using rows::ApplicationRow;
 using rows::doubled;
 using rows::RegistryWords;
 
-constexpr char kPublicStart[] = "public:";
 constexpr Refusal kGone{Error::kInvalidClient, Why::kNoApplication};
 
 // Checks ------------------------------------------------------------------------
@@ -52,7 +51,8 @@ std::optional<Refusal> faultOfSecret(const Secret& secret, ApplicationKind kind)
   if (const auto why = rows::faultOf({{secret.text(), bounds::kIdentifier}})) {
     return metadataFault(why);
   }
-  const bool isGood = rows::isVisible(secret.text()) && secret.text().rfind(kPublicStart, 0) != 0;
+  const bool isGood =
+      rows::isVisible(secret.text()) && secret.text().rfind(rows::kPublicStart, 0) != 0;
   return metadataFault(isGood ? std::optional<Why>() : Why::kOutOfBounds);
 }
 
@@ -106,7 +106,7 @@ std::string newSecret() {
 
 /// What stands where a public application has no secret: nobody was told it.
 std::string secretOfNobody() {
-  const std::string start = kPublicStart;
+  const std::string start = rows::kPublicStart;
   return start + rows::randomDigits(kIdentifierLength - start.size());
 }
 
@@ -304,9 +304,9 @@ Outcome<Removed> Applications::remove(const ApplicationId& identifier, const Act
   const auto found = rows::findApplication(store_, identifier.text());
   if (!found) return kGone;
   Store::erase(store_.applications, conditionOf(found->shown));
-  const std::string isIts = " WHERE client_id=" + rows::literal(Store::sealed(identifier.text()));
-  const long long codes = store_.run("DELETE FROM " + std::string(names::kGrantCodeTable) + isIts);
-  const long long tokens = store_.run("DELETE FROM " + std::string(names::kTokenTable) + isIts);
+  const std::string isIts = rows::isOneOf(names::kClientId, {Store::sealed(identifier.text())});
+  const long long codes = store_.eraseWhere(names::kGrantCodeTable, isIts);
+  const long long tokens = store_.eraseWhere(names::kTokenTable, isIts);
   rows::note(store_, "Application removed" + wordOf(found->shown) + rows::actorWord(by));
   whole.commit();
   return Removed{static_cast<int>(codes), static_cast<int>(tokens)};

@@ -7,6 +7,7 @@
 #include "grants/rows/notes.h"
 #include "grants/rows/quotes.h"
 #include "grants/rows/store.h"
+#include "utils/decimal.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -21,8 +22,9 @@ void narrow(std::string& condition, const std::string& more) {
 
 std::string conditionOf(const AuditFilter& filter) {
   std::string condition;
-  if (filter.since) narrow(condition, "timestamp>=" + std::to_string(*filter.since));
-  if (filter.until) narrow(condition, "timestamp<=" + std::to_string(*filter.until));
+  const std::string time = names::kTimestamp;
+  if (filter.since) narrow(condition, time + ">=" + std::to_string(*filter.since));
+  if (filter.until) narrow(condition, time + "<=" + std::to_string(*filter.until));
   if (!filter.contains.empty()) {
     narrow(condition, getSQLFormatLikeStr(names::kMsg, rows::doubled(filter.contains)));
   }
@@ -33,11 +35,12 @@ std::string conditionOf(const AuditFilter& filter) {
 
 std::vector<AuditEntry> Audit::list(const AuditFilter& filter) const {
   if (rows::hasNul(filter.contains)) return {};
-  const std::string tail = "ORDER BY id DESC LIMIT " + std::to_string(std::max(filter.most, 0)) +
-                           " OFFSET " + std::to_string(std::max(filter.skipped, 0));
+  const std::string tail = std::string(rows::kNewestFirst) + " LIMIT " +
+                           std::to_string(std::max(filter.most, 0)) + " OFFSET " +
+                           std::to_string(std::max(filter.skipped, 0));
   std::vector<AuditEntry> entries;
   for (const Json::Value& row : Store::rowsWhere(store_.log, conditionOf(filter), tail)) {
-    entries.push_back({numberIn(row[names::kId]), numberIn(row[names::kTimestamp]),
+    entries.push_back({decimalValue(row[names::kId]), decimalValue(row[names::kTimestamp]),
                        rows::undoubled(row[names::kMsg].asString())});
   }
   return entries;
@@ -51,7 +54,7 @@ void Audit::record(const std::string& what, const Actor& by) {
 
 long long Audit::clear(const Actor& by) {
   Whole whole(store_);
-  const long long gone = store_.run("DELETE FROM " + std::string(names::kLogTable));
+  const long long gone = store_.eraseWhere(names::kLogTable);
   rows::note(store_, "Audit log cleared" + rows::actorWord(by));
   whole.commit();
   return gone;

@@ -56,9 +56,8 @@ Purged Room::purgeable(long long grace, Rows rows) const {
 Purged Room::purge(long long grace, Rows rows) {
   const Conditions dead = deadFor(grace, rows, store_.policy);
   Whole whole(store_);
-  const Purged purged{
-      store_.run("DELETE FROM " + std::string(names::kGrantCodeTable) + " WHERE " + dead.codes),
-      store_.run("DELETE FROM " + std::string(names::kTokenTable) + " WHERE " + dead.tokens)};
+  const Purged purged{store_.eraseWhere(names::kGrantCodeTable, dead.codes),
+                      store_.eraseWhere(names::kTokenTable, dead.tokens)};
   whole.commit();
   return purged;
 }

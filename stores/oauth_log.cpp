@@ -31,8 +31,9 @@ enum Line : int {
 /// Keyed on the time stamp, so that one second is kept or trimmed as a whole.
 std::string rotationStatement(const std::string& table) {
   const std::string limit = std::to_string(getTableRowMax(names::kLogMax));
-  return "DELETE FROM " + table + " WHERE timestamp IN (SELECT timestamp FROM " + table +
-         " ORDER BY timestamp DESC LIMIT -1 OFFSET " + limit + ")";
+  const std::string time = names::kTimestamp;
+  return "DELETE FROM " + table + " WHERE " + time + " IN (SELECT " + time + " FROM " + table +
+         " ORDER BY " + time + " DESC LIMIT -1 OFFSET " + limit + ")";
 }
 
 /// Whatever stops it, the row that was just stored stays stored.

@@ -16,7 +16,6 @@
 namespace KELDOAUTHSERVER::grants::rows {
 namespace {
 
-constexpr std::string_view kMark = "sha256:";
 constexpr int kNoRandom = 7;  // what the stores say of a failing random source
 
 using Digest = std::array<std::uint8_t, SHA256_DIGEST_SIZE>;
@@ -40,11 +39,11 @@ std::string hexDigest(std::string_view text) {
 }
 
 std::string markOf(std::string_view text) {
-  return std::string(kMark) + hexDigest(text).substr(0, kIdentifierLength - kMark.size());
+  return std::string(kMarkStart) + hexDigest(text).substr(0, kIdentifierLength - kMarkStart.size());
 }
 
 bool isMark(std::string_view stored) {
-  return stored.substr(0, kMark.size()) == kMark;
+  return stored.substr(0, kMarkStart.size()) == kMarkStart;
 }
 
 std::string challengeOf(std::string_view verifier) {

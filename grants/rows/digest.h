@@ -12,7 +12,9 @@ namespace KELDOAUTHSERVER::grants::rows {
 /// The SHA-256 in 64 lowercase hexadecimal digits.
 std::string hexDigest(std::string_view text);
 
-/// What the columns of 64 bytes hold in place of a code or token: "sha256:" and
+inline constexpr std::string_view kMarkStart = "sha256:";
+
+/// What the columns of 64 bytes hold in place of a code or token: kMarkStart and
 /// the first 57 digits.
 std::string markOf(std::string_view text);
 

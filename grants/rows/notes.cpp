@@ -40,13 +40,11 @@ std::size_t countAt(std::string_view text, std::size_t subject, bool hasDetail) 
 
 /// Entries of the subject, newest first. The log's time is the database's.
 Json::Value recent(Store& store, const std::string& subject) {
-  const std::string start = literal(doubled(subject));
   const std::string now = "CAST(strftime('%s','now') AS INTEGER)";
-  return Store::rowsWhere(store.log,
-                          "timestamp BETWEEN " + now + "-" +
-                              std::to_string(store.policy.auditPause) + " AND " + now +
-                              " AND substr(msg,1,length(" + start + "))=" + start,
-                          "ORDER BY id DESC");
+  const std::string isRecent = std::string(names::kTimestamp) + " BETWEEN " + now + "-" +
+                               std::to_string(store.policy.auditPause) + " AND " + now;
+  return Store::rowsWhere(store.log, isRecent + " AND " + beginsWith(names::kMsg, doubled(subject)),
+                          kNewestFirst);
 }
 
 bool countAgain(Store& store, const std::string& subject, bool hasDetail) {

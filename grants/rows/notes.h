@@ -12,6 +12,9 @@
 
 namespace KELDOAUTHSERVER::grants::rows {
 
+/// The tail of a look into the log.
+inline constexpr char kNewestFirst[] = "ORDER BY id DESC";
+
 /// "[Photo Frame 1a2b3c4d]"; without a name "[removed 1a2b3c4d]".
 std::string applicationWord(const std::optional<ApplicationName>& name,
                             const std::string& identifier);

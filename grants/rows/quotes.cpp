@@ -34,6 +34,11 @@ std::string literal(std::string_view stored) {
   return "'" + doubled(stored) + "'";
 }
 
+std::string beginsWith(const char* column, std::string_view start) {
+  const std::string text = literal(start);
+  return "(substr(" + std::string(column) + ",1,length(" + text + "))=" + text + ")";
+}
+
 std::string isOneOf(const char* column, const std::vector<std::string>& stored) {
   std::string list;
   for (const std::string& text : stored) {

@@ -24,6 +24,9 @@ std::vector<std::string> spellings(const std::string& text);
 /// A literal of SQL. The text has no NUL byte.
 std::string literal(std::string_view stored);
 
+/// The column's text begins so, as it is stored.
+std::string beginsWith(const char* column, std::string_view start);
+
 /// "(column IN ('O''''Brien','O''Brien'))"
 std::string isOneOf(const char* column, const std::vector<std::string>& stored);
 

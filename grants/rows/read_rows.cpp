@@ -6,13 +6,13 @@
 #include "grants/rows/checks.h"
 #include "grants/rows/digest.h"
 #include "grants/rows/quotes.h"
+#include "utils/decimal.h"
 #include "utils/oauth_names.h"
 
 namespace KELDOAUTHSERVER::grants::rows {
 namespace {
 
 constexpr char kEnabled[] = "1";
-constexpr char kPublicStart[] = "public:";
 
 std::string textIn(const Json::Value& row, const char* column) {
   return undoubled(row[column].asString());
@@ -69,24 +69,25 @@ ApplicationRow applicationOf(const Json::Value& row) {
   const std::string secret = textIn(row, names::kClientSecret);
   const bool isPublic = secret.rfind(kPublicStart, 0) == 0;
   RegistryWords words = unpackWords(textIn(row, names::kRedirectUri));
-  return {{ApplicationId(textIn(row, names::kClientId)),
-           ApplicationName(textIn(row, names::kDisplayName)),
-           isPublic ? ApplicationKind::kPublic : ApplicationKind::kConfidential,
-           row[names::kEnable].asString() == kEnabled, allOf<RedirectAddress>(words.addresses),
-           allOf<LogoutAddress>(words.logoutAddresses), Scope(textIn(row, names::kScope)),
-           isPublic || !words.isPkceOptional, words.registeredItself, numberIn(row[names::kId])},
-          secret,
-          words};
+  return {
+      {ApplicationId(textIn(row, names::kClientId)),
+       ApplicationName(textIn(row, names::kDisplayName)),
+       isPublic ? ApplicationKind::kPublic : ApplicationKind::kConfidential,
+       row[names::kEnable].asString() == kEnabled, allOf<RedirectAddress>(words.addresses),
+       allOf<LogoutAddress>(words.logoutAddresses), Scope(textIn(row, names::kScope)),
+       isPublic || !words.isPkceOptional, words.registeredItself, decimalValue(row[names::kId])},
+      secret,
+      words};
 }
 
 CodeRow codeOf(const Json::Value& row) {
   const std::string state = row[names::kState].asString();
-  return {numberIn(row[names::kId]),
+  return {decimalValue(row[names::kId]),
           textIn(row, names::kUsername),
           textIn(row, names::kClientId),
           textIn(row, names::kScope),
           textIn(row, names::kIp),
-          numberIn(row[names::kExpiredTime]),
+          decimalValue(row[names::kExpiredTime]),
           unpackCode(undoubled(state)),
           row[names::kCode].asString(),
           state};
@@ -94,13 +95,13 @@ CodeRow codeOf(const Json::Value& row) {
 
 TokenRow tokenOf(const Json::Value& row) {
   const std::string state = row[names::kState].asString();
-  return {numberIn(row[names::kId]),
+  return {decimalValue(row[names::kId]),
           textIn(row, names::kUsername),
           textIn(row, names::kClientId),
           textIn(row, names::kScope),
           textIn(row, names::kFlowType),
           textIn(row, names::kIp),
-          numberIn(row[names::kExpiredTime]),
+          decimalValue(row[names::kExpiredTime]),
           unpackToken(undoubled(state)),
           row[names::kAccessToken].asString(),
           row[names::kRefreshToken].asString(),

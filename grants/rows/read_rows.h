@@ -85,6 +85,9 @@ Json::Value conditionOf(const TokenRow& token);
 bool erase(Store& store, const CodeRow& code);
 bool erase(Store& store, const TokenRow& token);
 
+/// How the secret's column of a public application begins.
+inline constexpr char kPublicStart[] = "public:";
+
 inline constexpr char kLoginFlow[] = "authorization_code";
 inline constexpr char kOwnFlow[] = "client_credentials";
 

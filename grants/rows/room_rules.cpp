@@ -7,6 +7,7 @@
 #include "core/oauth_errors.h"
 #include "grants/rows/digest.h"
 #include "grants/rows/quotes.h"
+#include "grants/rows/read_rows.h"
 #include "grants/rows/registry_words.h"
 #include "grants/rows/state.h"
 #include "grants/texts.h"
@@ -62,9 +63,9 @@ Crowd count(Store& store, const Claim& claim) {
 
 /// Removes the first `most` of the rows that meet `condition`; how many went.
 long long evict(Store& store, const Claim& claim, const std::string& condition, long long most) {
-  return store.run("DELETE FROM " + std::string(claim.table) + " WHERE id IN (SELECT id FROM " +
-                   claim.table + " WHERE " + condition + " ORDER BY " + claim.order + " LIMIT " +
-                   std::to_string(most) + ")");
+  return store.eraseWhere(claim.table, "id IN (SELECT id FROM " + std::string(claim.table) +
+                                           " WHERE " + condition + " ORDER BY " + claim.order +
+                                           " LIMIT " + std::to_string(most) + ")");
 }
 
 /// Whether something of the claimant's own had to go.
@@ -91,7 +92,7 @@ bool evictOwn(Store& store, const Claim& claim, const Crowd& crowd, long long li
 }
 
 void clearDead(Store& store, const Claim& claim, long long rows, long long limit) {
-  rows -= store.run("DELETE FROM " + std::string(claim.table) + " WHERE " + claim.isDead);
+  rows -= store.eraseWhere(claim.table, claim.isDead);
   if (rows < limit) return;
   if (claim.yields.empty()) fail(claim.whenFull);
   const long long needed = rows - limit + 1;
@@ -107,7 +108,7 @@ long long makeRoom(Store& store, const Claim& claim) {
 }
 
 std::string isOf(const std::string& application) {
-  return "(" + std::string(names::kClientId) + "=" + literal(Store::sealed(application)) + ")";
+  return isOneOf(names::kClientId, {Store::sealed(application)});
 }
 
 Claim tokenClaim(const Store& store, const std::string& application, long long now) {
@@ -125,8 +126,8 @@ std::string isDeadCode(long long now, long long grace) {
 }
 
 std::string isSpentCode() {
-  return "(substr(" + std::string(names::kState) + ",1,2)='" + kSpentStart + "' AND substr(" +
-         names::kCode + ",1,7)='sha256:')";
+  return "(" + beginsWith(names::kState, kSpentStart) + " AND " +
+         beginsWith(names::kCode, kMarkStart) + ")";
 }
 
 std::string isDeadToken(const Policy& policy, long long now, long long grace) {
@@ -135,7 +136,7 @@ std::string isDeadToken(const Policy& policy, long long now, long long grace) {
 }
 
 std::string isOwnToken() {
-  return "(" + std::string(names::kFlowType) + "='client_credentials')";
+  return isOneOf(names::kFlowType, {kOwnFlow});
 }
 
 void makeRoomForCode(Store& store, const std::string& user, const std::string& application,
@@ -177,13 +178,16 @@ void makeRoomForApplication(Store& store, bool registersItself, long long now) {
   if (!isBeyond) fail(errors::kClientInfoFull);
 
   // An application that nobody uses: neither a code to redeem nor a token.
-  const std::string live = " AND client_id NOT IN (SELECT client_id FROM ";
-  const long long gone = store.run(
-      "DELETE FROM " + std::string(names::kClientInfoTable) + " WHERE id IN (SELECT id FROM " +
-      names::kClientInfoTable + " WHERE " + selfCondition() + live + names::kGrantCodeTable +
-      " WHERE NOT " + isDeadCode(now) + " AND NOT " + isSpentCode() + ")" + live +
-      names::kTokenTable + " WHERE NOT " + isDeadToken(store.policy, now) + ") ORDER BY id LIMIT " +
-      std::to_string(found[1] - part + 1) + ")");
+  const std::string identifier = names::kClientId;
+  const std::string live = " AND " + identifier + " NOT IN (SELECT " + identifier + " FROM ";
+  const std::string unused = selfCondition() + live + names::kGrantCodeTable + " WHERE NOT " +
+                             isDeadCode(now) + " AND NOT " + isSpentCode() + ")" + live +
+                             names::kTokenTable + " WHERE NOT " + isDeadToken(store.policy, now) +
+                             ")";
+  const long long gone = store.eraseWhere(
+      names::kClientInfoTable, "id IN (SELECT id FROM " + std::string(names::kClientInfoTable) +
+                                   " WHERE " + unused + " ORDER BY id LIMIT " +
+                                   std::to_string(found[1] - part + 1) + ")");
   if (gone == 0 || found[0] - gone >= limit) fail(errors::kClientInfoFull);
 }
 

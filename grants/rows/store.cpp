@@ -1,11 +1,11 @@
 #include "grants/rows/store.h"
 
-#include <cstdlib>
 #include <initializer_list>
 #include <utility>
 
 #include "core/oauth_errors.h"
 #include "grants/rows/quotes.h"
+#include "utils/decimal.h"
 #include "utils/oauth_names.h"
 
 namespace KELDOAUTHSERVER::grants {
@@ -84,7 +84,7 @@ std::vector<long long> Store::numbers(const std::string& select) {
   Json::Value columns(Json::arrayValue);
   if (applications.DBCmd(select, appendNumbers, &columns) == 0) throw troubleOf(applications);
   std::vector<long long> numbers;
-  for (const Json::Value& column : columns) numbers.push_back(numberIn(column));
+  for (const Json::Value& column : columns) numbers.push_back(decimalValue(column));
   return numbers;
 }
 
@@ -110,7 +110,8 @@ bool Store::erase(OAUTHDBBasic& table, const Json::Value& condition) {
   return foundRow(table, table.DBDel(request));
 }
 
-long long Store::run(const std::string& statement) {
+long long Store::eraseWhere(const char* table, const std::string& condition) {
+  const std::string statement = std::string("DELETE FROM ") + table + " WHERE " + condition;
   clearError(applications);
   if (applications.DBCmd(statement, nullptr, nullptr) == 0) throw troubleOf(applications);
   return numbers("SELECT changes()").front();
@@ -141,12 +142,6 @@ void Whole::commit() {
   throw troubleOf(store_.applications.GetErrCode() != errors::kNone.code
                       ? static_cast<OAUTHDBBasic&>(store_.applications)
                       : store_.log);
-}
-
-// Values ------------------------------------------------------------------------
-
-long long numberIn(const Json::Value& column) {
-  return std::strtoll(column.asCString(), nullptr, 10);
 }
 
 }  // namespace KELDOAUTHSERVER::grants

@@ -53,8 +53,8 @@ class Store {
   static bool change(OAUTHDBBasic& table, const Json::Value& condition,
                      const Json::Value& modified);
   static bool erase(OAUTHDBBasic& table, const Json::Value& condition);
-  /// A statement that gives no rows; how many it changed.
-  long long run(const std::string& statement);
+  /// Removes the rows that meet a condition of SQL, or all; how many there were.
+  long long eraseWhere(const char* table, const std::string& condition = "1");
 
   /// An application's identifier as the columns "client_id" hold it.
   static std::string sealed(const std::string& identifier);
@@ -74,9 +74,6 @@ class Whole {
   Store& store_;
   Transaction transaction_;
 };
-
-/// The decimal number at the start of a column's text; 0 without one.
-long long numberIn(const Json::Value& column);
 
 }  // namespace KELDOAUTHSERVER::grants
 
