@@ -25,5 +25,6 @@ set(DOXYGEN_SORT_MEMBER_DOCS NO)
 set(DOXYGEN_HAVE_DOT NO)
 set(DOXYGEN_GENERATE_LATEX NO)
 
-doxygen_add_docs(docs ${public_headers} docs/reference.md
+file(GLOB grants_headers RELATIVE ${PROJECT_SOURCE_DIR} grants/*.h)
+doxygen_add_docs(docs ${public_headers} ${grants_headers} docs/reference.md
   WORKING_DIRECTORY ${PROJECT_SOURCE_DIR} COMMENT "Writing the reference to docs/html")

@@ -157,7 +157,13 @@ const char* const kPublicHeaders[] = {"core/oauth_db_basic.h",    "core/oauth_er
                                       "core/transaction.h",       "stores/oauth_clientInfo.h",
                                       "stores/oauth_grantCode.h", "stores/oauth_log.h",
                                       "stores/oauth_token.h",     "utils/oauth_bounds.h",
-                                      "utils/oauth_names.h",      "utils/oauth_utils.h"};
+                                      "utils/oauth_names.h",      "utils/oauth_utils.h",
+                                      "grants/access.h",          "grants/applications.h",
+                                      "grants/audit.h",           "grants/codes.h",
+                                      "grants/grants.h",          "grants/outcome.h",
+                                      "grants/policy.h",          "grants/room.h",
+                                      "grants/texts.h",           "grants/tokens.h",
+                                      "grants/trouble.h"};
 
 class HeaderTest : public ::testing::TestWithParam<const char*> {
  protected:
