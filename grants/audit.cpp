@@ -2,14 +2,12 @@
 
 #include <algorithm>
 
-#include "core/oauth_errors.h"
 #include "grants/rows/checks.h"
 #include "grants/rows/notes.h"
 #include "grants/rows/quotes.h"
 #include "grants/rows/store.h"
 #include "utils/decimal.h"
 #include "utils/oauth_names.h"
-#include "utils/oauth_utils.h"
 
 namespace KELDOAUTHSERVER::grants {
 namespace {
@@ -26,7 +24,8 @@ std::string conditionOf(const AuditFilter& filter) {
   if (filter.since) narrow(condition, time + ">=" + std::to_string(*filter.since));
   if (filter.until) narrow(condition, time + "<=" + std::to_string(*filter.until));
   if (!filter.contains.empty()) {
-    narrow(condition, getSQLFormatLikeStr(names::kMsg, rows::doubled(filter.contains)));
+    const std::string pattern = "%" + rows::doubled(filter.contains) + "%";
+    narrow(condition, std::string(names::kMsg) + " LIKE " + rows::literal(pattern));
   }
   return condition;
 }

@@ -11,7 +11,7 @@
 //   has happened or everything has.
 // - What a request did wrong is a value (grants/outcome.h). What the store could
 //   not do is an exception (grants/trouble.h). Nothing else is thrown, but for
-//   std::bad_alloc.
+//   a std::exception of another kind when memory runs out.
 // - Texts go in and come out as they are (grants/texts.h).
 // - At rest there is no usable code or token: the file holds digests.
 // - Nobody can push others out (grants/policy.h).

@@ -1,7 +1,7 @@
-// What the store could not do: the only exception of this floor, besides
-// std::bad_alloc. An operation that ends with it has changed nothing, and has
-// looked at nothing that could be relied upon: "not found" is never an answer
-// to a question that could not be asked.
+// What the store could not do: the only exception of this floor, besides those
+// of the standard library and of JsonCpp when memory runs out. An operation that ends with it has
+// changed nothing, and has looked at nothing that could be relied upon: "not found" is never an
+// answer to a question that could not be asked.
 
 #ifndef KELDOAUTH_GRANTS_TROUBLE_H
 #define KELDOAUTH_GRANTS_TROUBLE_H
@@ -19,7 +19,8 @@ class Trouble : public std::exception {
     kMedium,    // the disk is full, cannot be read or cannot be written
     kNotReady,  // the file could not be opened, or its tables not be made
     kCipher,    // a value could not be encrypted or decrypted
-    kMemory,    // out of memory, or no random numbers
+    kMemory,    // out of memory, or no random numbers; the lock may be held until
+                // the object's next change or its end
     kOther,     // anything else that SQLite says
   };
 

@@ -128,9 +128,21 @@ std::string Store::sealed(const std::string& identifier) {
 
 // Several steps as one ------------------------------------------------------------
 
-Whole::Whole(Store& store) : store_(store), transaction_(store.applications) {
+/// A rollback that found no memory has left its transaction open: its time is
+/// now.
+Whole::Whole(Store& store) : store_(store) {
+  if (begin()) return;
+  const Trouble trouble = troubleOf(store_.applications);
+  const bool isWithinAnother = trouble.kind() == Trouble::Kind::kOther;
+  if (!isWithinAnother || store_.applications.DBCmd("ROLLBACK", nullptr, nullptr) == 0 ||
+      !begin()) {
+    throw trouble;
+  }
+}
+
+bool Whole::begin() {
   clearError(store_.applications);
-  if (!transaction_.Begin()) throw troubleOf(store_.applications);
+  return transaction_.emplace(store_.applications).Begin();
 }
 
 /// A transaction that SQLite gave up on its own leaves its reason with the store
@@ -138,7 +150,7 @@ Whole::Whole(Store& store) : store_(store), transaction_(store.applications) {
 /// rotation.
 void Whole::commit() {
   clearError(store_.applications);
-  if (transaction_.Commit()) return;
+  if (transaction_->Commit()) return;
   throw troubleOf(store_.applications.GetErrCode() != errors::kNone.code
                       ? static_cast<OAUTHDBBasic&>(store_.applications)
                       : store_.log);

@@ -71,8 +71,10 @@ class Whole {
   void commit();
 
  private:
+  bool begin();
+
   Store& store_;
-  Transaction transaction_;
+  std::optional<Transaction> transaction_;
 };
 
 }  // namespace KELDOAUTHSERVER::grants

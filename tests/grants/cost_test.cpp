@@ -30,20 +30,6 @@ std::map<std::string, std::string> publishedTable() {
   return table;
 }
 
-/// Those that only read, with names as in the table.
-std::vector<Operation> everyLookUp() {
-  return {
-      {"Verify", [](auto& g, auto& h) { g.tokens.verify(h.old.access); }},
-      {"VerifyForeign", [](auto& g, auto&) { g.tokens.verify(AccessToken(support::id64('f'))); }},
-      {"Introspect",
-       [](auto& g, auto& h) { g.tokens.introspect(h.frame, AnyToken(h.old.refresh->text())); }},
-      {"Authenticate",
-       [](auto& g, auto& h) { g.applications.authenticate(h.frame, Secret(support::id64('x'))); }},
-      {"List", [](auto& g, auto&) { static_cast<void>(g.access.list({})); }},
-      {"Count", [](auto& g, auto&) { static_cast<void>(g.room.count()); }},
-  };
-}
-
 class CostTest : public HouseholdTest {
  protected:
   /// " | opens | commits | statements |", the connection's own start left out.

@@ -22,47 +22,100 @@ ApplicationChange anotherName() {
   return change;
 }
 
+template <typename Value>
+std::string said(const Outcome<Value>& outcome) {
+  return wordOf(outcome);
+}
+template <typename Value>
+std::string said(const std::optional<Value>& found) {
+  return found ? "found" : "nothing";
+}
+template <typename Value>
+std::string said(const std::vector<Value>& list) {
+  return std::to_string(list.size());
+}
+std::string said(const Ended& ended) {
+  return std::to_string(ended.codes) + " " + std::to_string(ended.tokens);
+}
+std::string said(const Purged& purged) {
+  return std::to_string(purged.codes) + " " + std::to_string(purged.tokens);
+}
+std::string said(long long number) {
+  return std::to_string(number);
+}
+
 }  // namespace
 
 std::vector<Operation> everyChange() {
   return {
-      {"AddApplication", [](auto& g, auto&) { g.applications.add(newcomer(), kAdmin); }},
+      {"AddApplication",
+       [](auto& g, auto&) { return said(g.applications.add(newcomer(), kAdmin)); }},
       {"ChangeApplication",
-       [](auto& g, auto& h) { g.applications.change(h.frame, anotherName(), kAdmin); }},
-      {"RenewSecret", [](auto& g, auto& h) { g.applications.renewSecret(h.frame, kAdmin); }},
-      {"Disable", [](auto& g, auto& h) { g.applications.disable(h.frame, kAdmin); }},
-      {"Remove", [](auto& g, auto& h) { g.applications.remove(h.frame, kAdmin); }},
-      {"IssueCode", [](auto& g, auto& h) { g.codes.issue(requestOf(h)); }},
+       [](auto& g, auto& h) {
+         return said(g.applications.change(h.frame, anotherName(), kAdmin));
+       }},
+      {"RenewSecret",
+       [](auto& g, auto& h) { return said(g.applications.renewSecret(h.frame, kAdmin)); }},
+      {"Disable", [](auto& g, auto& h) { return said(g.applications.disable(h.frame, kAdmin)); }},
+      {"Remove", [](auto& g, auto& h) { return said(g.applications.remove(h.frame, kAdmin)); }},
+      {"IssueCode", [](auto& g, auto& h) { return said(g.codes.issue(requestOf(h))); }},
       {"Redeem",
        [](auto& g, auto& h) {
-         g.codes.redeem({h.frame, h.code, kAddress, kVerifier});
+         return said(g.codes.redeem({h.frame, h.code, kAddress, kVerifier}));
        }},
       {"ReplayCode",
        [](auto& g, auto& h) {
-         g.codes.redeem({h.frame, h.spentCode, kAddress, kVerifier});
+         return said(g.codes.redeem({h.frame, h.spentCode, kAddress, kVerifier}));
        }},
       {"IssueLogin",
        [](auto& g, auto& h) {
-         g.tokens.issue({kBob, h.frame, kScope});
+         return said(g.tokens.issue({kBob, h.frame, kScope}));
        }},
       {"Refresh",
        [](auto& g, auto& h) {
-         g.tokens.refresh({h.frame, *h.old.refresh});
+         return said(g.tokens.refresh({h.frame, *h.old.refresh}));
        }},
       {"ReplayRefresh",
        [](auto& g, auto& h) {
-         g.tokens.refresh({h.other, *h.replaced.refresh});
+         return said(g.tokens.refresh({h.other, *h.replaced.refresh}));
        }},
-      {"IssueToItself", [](auto& g, auto& h) { g.tokens.issueToItself({h.frame}); }},
-      {"Revoke", [](auto& g, auto& h) { g.tokens.revoke(h.frame, AnyToken(h.old.access.text())); }},
-      {"EndHandle", [](auto& g, auto& h) { g.access.end(h.handle, kAdmin); }},
-      {"EndUser", [](auto& g, auto&) { g.access.endUser(kAlice, kAdmin); }},
-      {"EndUserWith", [](auto& g, auto& h) { g.access.endUserWith(kAlice, h.frame, kAdmin); }},
-      {"EndApplication", [](auto& g, auto& h) { g.access.endApplication(h.frame, kAdmin); }},
-      {"EndEverything", [](auto& g, auto&) { g.access.endEverything(kAdmin); }},
-      {"Purge", [](auto& g, auto&) { g.room.purge(); }},
-      {"Record", [](auto& g, auto&) { g.audit.record("Key changed", kAdmin); }},
-      {"ClearLog", [](auto& g, auto&) { g.audit.clear(kAdmin); }},
+      {"IssueToItself", [](auto& g, auto& h) { return said(g.tokens.issueToItself({h.frame})); }},
+      {"Revoke",
+       [](auto& g, auto& h) {
+         return said(g.tokens.revoke(h.frame, AnyToken(h.old.access.text())));
+       }},
+      {"EndHandle", [](auto& g, auto& h) { return said(g.access.end(h.handle, kAdmin)); }},
+      {"EndUser", [](auto& g, auto&) { return said(g.access.endUser(kAlice, kAdmin)); }},
+      {"EndUserWith",
+       [](auto& g, auto& h) { return said(g.access.endUserWith(kAlice, h.frame, kAdmin)); }},
+      {"EndApplication",
+       [](auto& g, auto& h) { return said(g.access.endApplication(h.frame, kAdmin)); }},
+      {"EndEverything", [](auto& g, auto&) { return said(g.access.endEverything(kAdmin)); }},
+      {"Purge", [](auto& g, auto&) { return said(g.room.purge()); }},
+      {"Record",
+       [](auto& g, auto&) {
+         g.audit.record("Key changed", kAdmin);
+         return std::string();
+       }},
+      {"ClearLog", [](auto& g, auto&) { return said(g.audit.clear(kAdmin)); }},
+  };
+}
+
+std::vector<Operation> everyLookUp() {
+  return {
+      {"Verify", [](auto& g, auto& h) { return said(g.tokens.verify(h.old.access)); }},
+      {"VerifyForeign",
+       [](auto& g, auto&) { return said(g.tokens.verify(AccessToken(support::id64('f')))); }},
+      {"Introspect",
+       [](auto& g, auto& h) {
+         return said(g.tokens.introspect(h.frame, AnyToken(h.old.refresh->text())));
+       }},
+      {"Authenticate",
+       [](auto& g, auto& h) {
+         return said(g.applications.authenticate(h.frame, Secret(support::id64('x'))));
+       }},
+      {"List", [](auto& g, auto&) { return said(g.access.list({})); }},
+      {"Count", [](auto& g, auto&) { return said(g.room.count().tokens.rows); }},
   };
 }
 

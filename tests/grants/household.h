@@ -1,4 +1,4 @@
-// Every operation of the floor that changes something, each on the same small
+// Every operation of the floor, each on the same small
 // household, in a form that a fault can be thrown into at any point.
 
 #ifndef KELDOAUTH_TESTS_GRANTS_HOUSEHOLD_H
@@ -26,7 +26,8 @@ struct Household {
 
 struct Operation {
   std::string name;
-  std::function<void(Grants&, const Household&)> run;
+  /// What it answers, as far as it is the same every time.
+  std::function<std::string(Grants&, const Household&)> run;
 };
 
 inline void PrintTo(const Operation& operation, std::ostream* out) {
@@ -34,6 +35,7 @@ inline void PrintTo(const Operation& operation, std::ostream* out) {
 }
 
 std::vector<Operation> everyChange();
+std::vector<Operation> everyLookUp();
 
 /// The fixture: a household in the file, which can be put back as it was.
 class HouseholdTest : public GrantsTest {
