@@ -24,8 +24,7 @@ using rows::CodeState;
 using rows::doubled;
 
 constexpr Bounds kChallenge{1, 128};
-constexpr Bounds kRedirect{0, 2048};
-constexpr Bounds kCallerText{0, 512};
+constexpr Bounds kRedirect{0, bounds::kRedirectUri.max};
 constexpr char kS256[] = "S";
 constexpr char kPlain[] = "P";
 
@@ -146,7 +145,7 @@ std::optional<Refusal> Codes::faultOf(const CodeRequest& request) {
                                   {request.scope.text(), bounds::kScope},
                                   {request.redirect.text(), kRedirect},
                                   {challenge, kChallenge},
-                                  {request.text.text(), kCallerText}});
+                                  {request.text.text(), rows::kCallerText}});
   if (why) return requestFault(*why);
   if (request.user.text() == kNoUser) return requestFault(Why::kReservedUser);
   if (!rows::isPeer(request.from.text())) return requestFault(Why::kBadPeer);

@@ -20,8 +20,6 @@ using rows::ApplicationRow;
 using rows::RefreshText;
 using rows::TokenRow;
 
-constexpr Bounds kCallerText{0, 512};
-
 Refusal requestFault(Why why) {
   return {Error::kInvalidRequest, why};
 }
@@ -47,7 +45,7 @@ std::optional<Refusal> faultOf(const std::optional<Scope>& scope) {
 std::optional<Refusal> faultOf(const LoginRequest& request) {
   const auto why = rows::faultOf({{request.user.text(), bounds::kUsername},
                                   {request.scope.text(), bounds::kScope},
-                                  {request.text.text(), kCallerText}});
+                                  {request.text.text(), rows::kCallerText}});
   if (why) return requestFault(*why);
   if (request.user.text() == kNoUser) return requestFault(Why::kReservedUser);
   if (!fitsEver(rows::TokenState{0, 0, 0, "", "", "", "", request.text.text()},

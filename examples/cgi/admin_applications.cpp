@@ -4,6 +4,7 @@
 #include "examples/cgi/html.h"
 #include "examples/cgi/redirect.h"
 #include "examples/cgi/scopes.h"
+#include "utils/oauth_bounds.h"
 
 namespace service {
 namespace {
@@ -30,7 +31,7 @@ std::string registrationForm(const std::string& user, const Draft& draft) {
          fault + formStart(user, "register") +
          fill(
              "<p class=\"field\"><label for=\"name\">Name</label>\n"
-             "<input id=\"name\" name=\"name\" value=\"{}\" required maxlength=\"64\" "
+             "<input id=\"name\" name=\"name\" value=\"{}\" required maxlength=\"{}\" "
              "autocomplete=\"off\"></p>\n"
              "<p class=\"field\"><label for=\"redirect\">Redirect address</label>\n"
              "<input id=\"redirect\" name=\"redirect\" type=\"url\" value=\"{}\" required "
@@ -38,7 +39,8 @@ std::string registrationForm(const std::string& user, const Draft& draft) {
              "aria-describedby=\"redirect-hint\"></p>\n"
              "<p class=\"hint\" id=\"redirect-hint\">Where users return to. https, or http for "
              "127.0.0.1 and localhost.</p>\n",
-             {draft.name, draft.redirect}) +
+             {draft.name, std::to_string(KELDOAUTHSERVER::bounds::kDisplayName.max),
+              draft.redirect}) +
          "<fieldset><legend>It may ask to</legend>\n" + scopeChoices(draft.scope) +
          "</fieldset>\n<div class=\"actions\"><button class=\"primary\">Register</button></div>\n"
          "</form>\n</section>\n";
