@@ -1,6 +1,6 @@
 """What once went wrong with services on these stores, and must not: a login lost
 in a crash, a name that grows, everybody logged out by one, a thief who is never
-found out. SERVICE_ROUNDS says how often what could be chance is tried."""
+found out. SERVICE_LIMIT says how many rows the tables have while they are flooded."""
 
 import ctypes
 import os
@@ -13,7 +13,6 @@ from service import (FORM, Form, Killed, as_user, challenge_of, encode, introspe
                      later, register, send, whoami)
 from trouble_test import limits
 
-ROUNDS = int(os.environ.get("SERVICE_ROUNDS", "12"))
 MOST_STEPS = 200
 
 
@@ -159,12 +158,12 @@ class Names(unittest.TestCase):
 class Floods(unittest.TestCase):
     """Nobody is logged out by what somebody else does, and everybody can log in."""
 
-    LIMIT = 24
+    LIMIT = int(os.environ.get("SERVICE_LIMIT", "24"))
     FLOOD = 3 * LIMIT
 
     def setUp(self):
-        empty("oauth_token", "oauth_grantCode")
         self.client = register()
+        empty("oauth_token", "oauth_grantCode")
         # Good only for refreshing any more: what a purge would take first.
         self.idle = self.client.tokens("bob")
 
@@ -221,6 +220,19 @@ class Floods(unittest.TestCase):
 
         self.flooded(flood)
         self.assertEqual(self.client.decide(page).status, 303)
+
+    def test_the_ninth_login_ends_the_one_renewed_longest_ago(self):
+        pairs = [self.client.tokens("alice") for _ in range(8)]
+        with later(60):
+            pairs.append(self.client.refresh(pairs.pop(0)["refresh_token"]).json)
+            self.assertEqual({whoami(pair["access_token"]).status for pair in pairs}, {200})
+        with later(120):
+            pairs.append(self.client.tokens("alice"))
+            ended = pairs.pop(0)
+            self.assertEqual(whoami(ended["access_token"]).status, 401)
+            self.assertEqual(self.client.refresh(ended["refresh_token"]).status, 400)
+            self.assertEqual({whoami(pair["access_token"]).status for pair in pairs}, {200})
+            self.assertEqual(self.client.refresh(self.idle["refresh_token"]).status, 200)
 
     def test_by_applications_that_register_themselves(self):
         self.client.tokens("alice")
