@@ -1,5 +1,7 @@
 #include "tests/fuzz/store_operations.h"
 
+#include <utility>
+
 namespace fuzz {
 
 namespace names = KELDOAUTHSERVER::names;
@@ -28,10 +30,8 @@ Argument asGiven(Argument argument) {
   return argument;
 }
 
-}  // namespace
-
-const std::vector<Change>& insertions() {
-  static const std::vector<Change> all{
+std::vector<Change> registrations() {
+  return {
       {"register",
        names::kClientInfoTable,
        {kClientId, kSecret, kRedirect, kScope, kDisplayName, kEnable},
@@ -55,6 +55,11 @@ const std::vector<Change>& insertions() {
          return s.clients.Add(t[0], t[1], t[2], t[3], out) != 0;
        },
        {names::kClientId}},
+  };
+}
+
+std::vector<Change> grants() {
+  return {
       {"store code",
        names::kGrantCodeTable,
        {kUsername, kClientId, kScope, kCode, asGiven(kExpiry), kState, asGiven(kIp)},
@@ -91,6 +96,18 @@ const std::vector<Change>& insertions() {
        kNoCode,
        [](Stores& s, long long, const Texts& t, Json::Value&) { return s.log.Add(t[0]) != 0; }},
   };
+}
+
+std::vector<Change> allInsertions() {
+  std::vector<Change> all = registrations();
+  for (Change& grant : grants()) all.push_back(std::move(grant));
+  return all;
+}
+
+}  // namespace
+
+const std::vector<Change>& insertions() {
+  static const std::vector<Change> all = allInsertions();
   return all;
 }
 
