@@ -2,36 +2,57 @@
 # runtime, dev, tools, standin.
 include(CMakePackageConfigHelpers)
 
+# Folders may be absolute; the others can be moved together with their prefix.
+foreach(name LIBDIR INCLUDEDIR)
+  if(IS_ABSOLUTE ${CMAKE_INSTALL_${name}})
+    set(exported_${name} ${CMAKE_INSTALL_${name}})
+    set(KELDOAUTH_PC_${name} ${CMAKE_INSTALL_${name}})
+  else()
+    set(exported_${name} $<INSTALL_PREFIX>/${CMAKE_INSTALL_${name}})
+    set(KELDOAUTH_PC_${name} "\${prefix}/${CMAKE_INSTALL_${name}}")
+  endif()
+endforeach()
+if(IS_ABSOLUTE ${CMAKE_INSTALL_LIBDIR})
+  set(KELDOAUTH_PC_PREFIX ${CMAKE_INSTALL_PREFIX})
+else()
+  file(RELATIVE_PATH to_prefix ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig ${CMAKE_INSTALL_PREFIX})
+  set(KELDOAUTH_PC_PREFIX "\${pcfiledir}/${to_prefix}")
+endif()
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/KeldOAuth)
+
+# Inside another project the usual folder of documents is that project's.
+set(documents_dir ${CMAKE_INSTALL_DOCDIR})
+if(NOT KELDOAUTH_IS_TOP_LEVEL)
+  set(documents_dir ${CMAKE_INSTALL_DATAROOTDIR}/doc/keldoauth)
+endif()
 
 # The platform libraries are not the package's to name: a consumer's linker finds
 # them beside the library, or where the system has them.
 target_link_options(keldoauth INTERFACE
-  $<INSTALL_INTERFACE:-Wl,-rpath-link,$<INSTALL_PREFIX>/${CMAKE_INSTALL_LIBDIR}>)
+  $<INSTALL_INTERFACE:-Wl,-rpath-link,${exported_LIBDIR}>)
+if(NOT BUILD_SHARED_LIBS)
+  # What an archive needs its consumers link.
+  target_link_directories(keldoauth INTERFACE $<INSTALL_INTERFACE:${exported_LIBDIR}>)
+  set(KELDOAUTH_PC_REQUIRES " sqlite3")
+  set(KELDOAUTH_PC_LIBS " -lkeldcore -lkeldcgi")
+endif()
 
 install(TARGETS keldoauth EXPORT KeldOAuthTargets
+  ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT dev
   LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT runtime NAMELINK_COMPONENT dev)
 if(TARGET keldcore)
   install(TARGETS keldcore keldcgi
     LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT standin)
 endif()
 
-# Headers keep their folders: they are included as "stores/oauth_token.h".
-set(public_headers
-  utils/oauth_bounds.h utils/oauth_names.h utils/oauth_utils.h
-  core/oauth_db_basic.h core/oauth_errors.h
-  core/transaction.h
-  stores/oauth_clientInfo.h stores/oauth_grantCode.h stores/oauth_log.h stores/oauth_token.h)
 foreach(header IN LISTS public_headers)
-  cmake_path(GET header PARENT_PATH folder)
+  get_filename_component(folder ${header} DIRECTORY)
   install(FILES ${header} DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keldoauth/${folder} COMPONENT dev)
 endforeach()
 
 configure_package_config_file(cmake/KeldOAuthConfig.cmake.in KeldOAuthConfig.cmake
   INSTALL_DESTINATION ${package_dir})
 write_basic_package_version_file(KeldOAuthConfigVersion.cmake COMPATIBILITY SameMajorVersion)
-file(RELATIVE_PATH KELDOAUTH_PC_TO_PREFIX
-  ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig ${CMAKE_INSTALL_PREFIX})
 configure_file(cmake/keldoauth.pc.in keldoauth.pc @ONLY)
 
 install(EXPORT KeldOAuthTargets NAMESPACE KeldOAuth:: DESTINATION ${package_dir} COMPONENT dev)
@@ -44,9 +65,9 @@ install(FILES ${CMAKE_CURRENT_BINARY_DIR}/keldoauth.pc
 
 file(GLOB documents docs/*.md)
 # Documents keep their folders, so that they find each other.
-install(FILES README.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT dev)
-install(FILES ${documents} DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs COMPONENT dev)
+install(FILES README.md CHANGELOG.md LICENSE DESTINATION ${documents_dir} COMPONENT dev)
+install(FILES ${documents} DESTINATION ${documents_dir}/docs COMPONENT dev)
 install(FILES platform/README.md platform/keldcore.h platform/keldcgi.h
-  DESTINATION ${CMAKE_INSTALL_DOCDIR}/platform COMPONENT dev)
+  DESTINATION ${documents_dir}/platform COMPONENT dev)
 install(FILES examples/first_token.cpp examples/first_login.cpp
-  DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT dev)
+  DESTINATION ${documents_dir}/examples COMPONENT dev)

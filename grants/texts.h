@@ -27,7 +27,7 @@ class Text {
   friend bool operator<(const Text& a, const Text& b) { return a.text_ < b.text_; }
 
  private:
-  std::string text_;
+  std::string text_{};
 };
 
 // Applications ----------------------------------------------------------------

@@ -1,22 +1,28 @@
 #!/usr/bin/env bash
 # Builds two consumers in one of the three ways and runs them in private mounts; or
 # looks whether every link of the installed documents leads to something.
-# Usage: run.sh BUILD-FOLDER find_package|pkg_config|subdirectory|documents
+# Usage: run.sh BUILD-FOLDER find_package|pkg_config|parent|documents
 set -euo pipefail
 
 build=$1
 way=$2
 here=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd -P)
 work=$build/install-$way
+strict=(-Wall -Wextra -Weffc++ -Wformat=2 -Wold-style-cast -Wuseless-cast -Werror)
 prefix=$work/prefix
 
 rm -rf "$work"
 mkdir -p "$work"
 libraries=$work
-if [[ $way != subdirectory ]]; then
+if [[ $way != parent ]]; then
   cmake --install "$build" --prefix "$prefix" >/dev/null
   libraries=$(dirname "$(find "$prefix" -name libkeldoauth.so.1)")
 fi
+
+fail() {
+  printf '%s\n' "$*" >&2
+  exit 1
+}
 
 run_consumers() {
   for program in consumer login; do
@@ -43,13 +49,18 @@ case $way in
     flags=()
     # It writes a blank within a path as a shell would take it.
     eval "flags=($(pkg-config --cflags --libs keldoauth))"
-    g++ -std=c++17 "$here/consumer.cpp" "${flags[@]}" -o "$work/consumer"
+    # The headers are fit for whom warnings are errors.
+    g++ -std=c++17 "${strict[@]}" "$here/consumer.cpp" "${flags[@]}" -o "$work/consumer"
     eval "flags=($(pkg-config --cflags --libs keldoauth-grants))"
-    g++ -std=c++17 "$here/../../examples/first_login.cpp" "${flags[@]}" -o "$work/login"
+    g++ -std=c++17 "${strict[@]}" "$here/../../examples/first_login.cpp" "${flags[@]}" -o "$work/login"
     ;;
-  subdirectory)
-    cmake -S "$here/subdirectory" -B "$work" -G Ninja -DKELDOAUTH_PLATFORM=standin >/dev/null
+  parent)
+    cmake -S "$here/parent" -B "$work" -G Ninja -DKELDOAUTH_PLATFORM=standin >/dev/null
     cmake --build "$work" --target consumer login >/dev/null
+    cmake --install "$work" --prefix "$prefix" >/dev/null
+    installed=$(cd "$prefix" && find . -type f | sort | xargs)
+    [[ $installed == "./bin/consumer ./bin/login" ]] || fail "the parent installed $installed"
+    libraries=$work/keldoauth
     ;;
   documents)
     exec "$here/check-links" "$prefix"

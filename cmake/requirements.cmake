@@ -1,0 +1,48 @@
+# What the parts that are to be built need. All that is missing is said at once,
+# with the way to do without it.
+find_package(SQLite3 QUIET)
+find_package(PkgConfig QUIET)
+if(PKG_CONFIG_FOUND)
+  pkg_check_modules(JSONCPP QUIET IMPORTED_TARGET jsoncpp)
+  pkg_check_modules(NETTLE QUIET IMPORTED_TARGET GLOBAL nettle)
+endif()
+
+set(KELDOAUTH_MISSING "")
+
+# keldoauth_need(FOUND THING PACKAGE [REASON]): FOUND is the name of a variable,
+# PACKAGE Debian's word for the thing.
+function(keldoauth_need found thing package)
+  if(NOT ${found})
+    string(JOIN " " line "\n  ${thing} (Debian: ${package})" ${ARGN})
+    set(KELDOAUTH_MISSING "${KELDOAUTH_MISSING}${line}" PARENT_SCOPE)
+  endif()
+endfunction()
+
+keldoauth_need(PKG_CONFIG_FOUND pkg-config pkg-config)
+keldoauth_need(SQLite3_FOUND "SQLite 3" libsqlite3-dev)
+if(PKG_CONFIG_FOUND)
+  keldoauth_need(JSONCPP_FOUND JsonCpp libjsoncpp-dev)
+  foreach(part TOOLS SERVICE)
+    if(KELDOAUTH_${part})
+      keldoauth_need(NETTLE_FOUND nettle nettle-dev
+        "for KELDOAUTH_${part}; -DKELDOAUTH_${part}=OFF does without")
+    endif()
+  endforeach()
+endif()
+if(KELDOAUTH_TOOLS)
+  find_path(KELDOAUTH_CLI11_INCLUDE_DIR CLI/CLI.hpp)
+  mark_as_advanced(KELDOAUTH_CLI11_INCLUDE_DIR)
+  keldoauth_need(KELDOAUTH_CLI11_INCLUDE_DIR CLI11 libcli11-dev
+    "for KELDOAUTH_TOOLS; -DKELDOAUTH_TOOLS=OFF does without")
+endif()
+
+if(KELDOAUTH_MISSING)
+  message(FATAL_ERROR "keldoauth: these are missing:${KELDOAUTH_MISSING}")
+endif()
+
+if(KELDOAUTH_TESTS AND NOT (BUILD_SHARED_LIBS AND KELDOAUTH_TOOLS AND KELDOAUTH_EXAMPLES
+    AND KELDOAUTH_INSTALL))
+  message(FATAL_ERROR "KELDOAUTH_TESTS are about the shared library, the command line, the "
+    "examples and the installed copy: BUILD_SHARED_LIBS, KELDOAUTH_TOOLS, KELDOAUTH_EXAMPLES and "
+    "KELDOAUTH_INSTALL must be on")
+endif()

@@ -1,0 +1,1 @@
+#error "the library took this for a header of its own"

@@ -1,0 +1,1 @@
+int ofItsOwn() { return 0; }
