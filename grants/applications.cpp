@@ -70,6 +70,7 @@ std::optional<Refusal> faultOfWords(const RegistryWords& words) {
 template <typename Kind>
 std::vector<std::string> textsOf(const std::vector<Kind>& list) {
   std::vector<std::string> texts;
+  texts.reserve(list.size());
   for (const Kind& item : list) texts.push_back(item.text());
   return texts;
 }
