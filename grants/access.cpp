@@ -25,9 +25,10 @@ constexpr std::size_t kMostSubjects = 16;
 
 // Entries -----------------------------------------------------------------------
 
-/// What a row is known by: of a login its family, which refreshing keeps.
+/// What a row is known by: of a login its family, which refreshing keeps. A
+/// code that was redeemed meanwhile is another thing.
 std::string markOf(const CodeRow& code) {
-  return rows::hexDigest(code.storedCode);
+  return rows::hexDigest(code.storedCode + code.storedState);
 }
 
 std::string markOf(const TokenRow& token) {
@@ -149,22 +150,23 @@ Ended liveOf(Store& store, const Conditions& conditions) {
   return {static_cast<int>(live[0]), static_cast<int>(live[1])};
 }
 
-/// All of it in one transaction, with `entry` in the log when some of it was
+/// All of it in one transaction, with an entry in the log when some of it was
 /// live.
-Ended endAll(Store& store, const Conditions& conditions, const std::string& entry) {
+template <typename Note>
+Ended endAll(Store& store, const Conditions& conditions, const Note& note) {
   Whole whole(store);
   const Ended ended = liveOf(store, conditions);
   store.eraseWhere(names::kGrantCodeTable, conditions.codes);
   store.eraseWhere(names::kTokenTable, conditions.tokens);
-  if (ended.codes + ended.tokens > 0) rows::note(store, entry);
+  if (ended.codes + ended.tokens > 0) note();
   whole.commit();
   return ended;
 }
 
-std::string wordOf(Store& store, const ApplicationId& application) {
-  const auto found = rows::findApplication(store, application.text());
-  return rows::applicationWord(
-      found ? std::optional<ApplicationName>(found->shown.name) : std::nullopt, application.text());
+rows::Subject subjectOf(Store& store, const std::string& application) {
+  const auto found = rows::findApplication(store, application);
+  if (!found) return {{}, application, false};
+  return {found->shown.name, application, found->shown.registeredItself};
 }
 
 std::string endedWord(Rows rows) {
@@ -185,8 +187,7 @@ void noteEach(Store& store, const Subjects& subjects, const Actor& by) {
   std::size_t written = 0;
   for (const auto& [subject, count] : subjects) {
     if (++written > kMostSubjects) break;
-    rows::note(store, "Access ended" + wordOf(store, ApplicationId(subject.first)) +
-                          rows::userWord(subject.second) + rows::actorWord(by));
+    rows::noteEnd(store, subjectOf(store, subject.first), subject.second, rows::actorWord(by));
   }
   if (subjects.size() <= kMostSubjects) return;
   rows::note(store, "Access ended of " + std::to_string(subjects.size() - kMostSubjects) + " more" +
@@ -253,8 +254,8 @@ Ended Access::end(const AccessHandle& handle, const Actor& by) {
 }
 
 Ended Access::end(const std::vector<AccessHandle>& handles, const Actor& by) {
-  const long long now = currentTime();
   Whole whole(store_);
+  const long long now = currentTime();
   Ended ended{0, 0};
   Subjects subjects;
   for (const AccessHandle& handle : handles) {
@@ -268,26 +269,33 @@ Ended Access::end(const std::vector<AccessHandle>& handles, const Actor& by) {
 
 Ended Access::endUser(const User& user, const Actor& by, Rows rows) {
   if (!canBe(user, {})) return {0, 0};
-  return endAll(store_, conditionsOf(user, {}, rows),
-                allEndedWord(rows) + rows::userWord(user.text()) + rows::actorWord(by));
+  return endAll(store_, conditionsOf(user, {}, rows), [&] {
+    rows::note(store_, allEndedWord(rows) + rows::userWord(user.text()) + rows::actorWord(by));
+  });
 }
 
 Ended Access::endUserWith(const User& user, const ApplicationId& application, const Actor& by,
                           Rows rows) {
   if (!canBe(user, application)) return {0, 0};
-  return endAll(store_, conditionsOf(user, application, rows),
-                endedWord(rows) + wordOf(store_, application) + rows::userWord(user.text()) +
-                    rows::actorWord(by));
+  return endAll(store_, conditionsOf(user, application, rows), [&] {
+    rows::noteEnd(store_, subjectOf(store_, application.text()), user.text(), rows::actorWord(by),
+                  endedWord(rows));
+  });
 }
 
 Ended Access::endApplication(const ApplicationId& application, const Actor& by, Rows rows) {
   if (!canBe({}, application)) return {0, 0};
-  return endAll(store_, conditionsOf({}, application, rows),
-                allEndedWord(rows) + wordOf(store_, application) + rows::actorWord(by));
+  return endAll(store_, conditionsOf({}, application, rows), [&] {
+    const rows::Subject subject = subjectOf(store_, application.text());
+    rows::note(store_, allEndedWord(rows) +
+                           rows::applicationWord(subject.name, subject.identifier) +
+                           rows::actorWord(by));
+  });
 }
 
 Ended Access::endEverything(const Actor& by, Rows rows) {
-  return endAll(store_, conditionsOf({}, {}, rows), allEndedWord(rows) + rows::actorWord(by));
+  return endAll(store_, conditionsOf({}, {}, rows),
+                [&] { rows::note(store_, allEndedWord(rows) + rows::actorWord(by)); });
 }
 
 }  // namespace KELDOAUTHSERVER::grants

@@ -139,6 +139,13 @@ Json::Value rowOf(const NewApplication& application, const std::string& identifi
   return row;
 }
 
+Removed removeGrants(Store& store, const ApplicationId& identifier) {
+  const std::string isIts = rows::isOneOf(names::kClientId, {Store::sealed(identifier.text())});
+  const long long codes = store.countErased(names::kGrantCodeTable, isIts);
+  const long long tokens = store.countErased(names::kTokenTable, isIts);
+  return {static_cast<int>(codes), static_cast<int>(tokens)};
+}
+
 std::vector<Application> shown(const Json::Value& found) {
   std::vector<Application> applications;
   for (const Json::Value& row : found) applications.push_back(rows::applicationOf(row).shown);
@@ -163,6 +170,8 @@ Outcome<Registered> Applications::add(const NewApplication& application, const A
   rows::makeRoomForApplication(store_, application.registersItself, currentTime());
   Store::insert(store_.applications,
                 rowOf(application, identifier.text(), isPublic ? secretOfNobody() : secret.text()));
+  // What one of this identifier had, that another program removed, is not its.
+  if (application.identifier) removeGrants(store_, identifier);
   noteRegistration(store_, application, identifier, by);
   whole.commit();
   return Registered{identifier, isPublic ? std::optional<Secret>() : secret};
@@ -305,12 +314,10 @@ Outcome<Removed> Applications::remove(const ApplicationId& identifier, const Act
   const auto found = rows::findApplication(store_, identifier.text());
   if (!found) return kGone;
   Store::erase(store_.applications, conditionOf(found->shown));
-  const std::string isIts = rows::isOneOf(names::kClientId, {Store::sealed(identifier.text())});
-  const long long codes = store_.eraseWhere(names::kGrantCodeTable, isIts);
-  const long long tokens = store_.eraseWhere(names::kTokenTable, isIts);
+  const Removed removed = removeGrants(store_, identifier);
   rows::note(store_, "Application removed" + wordOf(found->shown) + rows::actorWord(by));
   whole.commit();
-  return Removed{static_cast<int>(codes), static_cast<int>(tokens)};
+  return removed;
 }
 
 }  // namespace KELDOAUTHSERVER::grants

@@ -53,7 +53,7 @@ void Audit::record(const std::string& what, const Actor& by) {
 
 long long Audit::clear(const Actor& by) {
   Whole whole(store_);
-  const long long gone = store_.eraseWhere(names::kLogTable);
+  const long long gone = store_.countErased(names::kLogTable);
   rows::note(store_, "Audit log cleared" + rows::actorWord(by));
   whole.commit();
   return gone;

@@ -114,13 +114,14 @@ std::optional<rows::TokenRow> loginOf(Store& store, const rows::Spent& spent) {
 
 Refusal endReplayed(Store& store, Whole& whole, const ApplicationRow& application,
                     const CodeRow& code, long long now) {
-  const long long age = now - code.state->spent->time;
-  if (age >= 0 && age < store.policy.grace) return grantFault(Why::kUsedBefore);
+  if (isWithinGrace(code.state->spent->time, now, store.policy)) {
+    return grantFault(Why::kUsedBefore);
+  }
   if (const auto login = loginOf(store, *code.state->spent)) {
     rows::erase(store, *login);
-    rows::note(store, "Access ended" +
-                          rows::applicationWord(application.shown.name, code.application) +
-                          rows::userWord(login->user) + rows::kAfterReplay);
+    rows::noteEnd(store,
+                  {application.shown.name, code.application, application.shown.registeredItself},
+                  login->user, rows::kAfterReplay);
     whole.commit();
   }
   return grantFault(Why::kReplayed);
@@ -132,7 +133,7 @@ void spend(Store& store, const CodeRow& code, const rows::Stored& login, long lo
   state.spent = rows::Spent{now, login.row, login.family};
   Json::Value modified;
   modified[names::kState] = doubled(pack(state));
-  modified[names::kExpiredTime] = std::to_string(state.issued + store.policy.family);
+  modified[names::kExpiredTime] = std::to_string(later(state.issued, store.policy.family));
   Store::change(store.codes, conditionOf(code), modified);
 }
 
@@ -156,12 +157,12 @@ std::optional<Refusal> Codes::faultOf(const CodeRequest& request) {
 
 Outcome<IssuedCode> Codes::issue(const CodeRequest& request) {
   if (const auto fault = faultOf(request)) return *fault;
+  Whole whole(store_);
   const long long now = currentTime();
   const IssuedCode issued{
       Code(rows::randomDigits(kIdentifierLength)),
       now + request.lifetime.value_or(getExpiredPeriod(names::kGrantCodeExpired))};
 
-  Whole whole(store_);
   const auto application = rows::actingApplication(store_, request.application);
   if (!application) return application.refusal();
   if (const auto fault = grants::faultOf(request, application->shown)) return *fault;
@@ -175,9 +176,9 @@ Outcome<Pair> Codes::redeem(const Redemption& redemption) {
   if (const auto why = faultOfTexts(redemption)) return grantFault(*why);
   if (!rows::isPeer(redemption.from.text())) return requestFault(Why::kBadPeer);
   if (!rows::isLifetime(redemption.lifetime)) return requestFault(Why::kOutOfBounds);
-  const long long now = currentTime();
 
   Whole whole(store_);
+  const long long now = currentTime();
   const auto application = rows::actingApplication(store_, redemption.application);
   if (!application) return application.refusal();
   const auto code = rows::findShownCode(store_, redemption.code.text());

@@ -19,12 +19,14 @@ struct Policy {
 
   // Shares of a table, as one part in so many.
 
-  int userPart = 4;            // one user: a quarter of the codes, of the tokens
+  int userPart = 4;            // one user: a quarter of the codes, of the tokens;
+                               // as much for the own tokens of all applications
+                               // that registered themselves together
   int applicationPart = 2;     // one application: half of them
   int selfRegisteredPart = 2;  // applications that registered themselves: half
                                // of the registry
 
-  // Seconds -----------------------------------------------------------------
+  // Seconds: 0 to a hundred years; a number outside counts as the nearest ------
 
   /// A login that nobody refreshed for so long after its access token expired
   /// is dead.

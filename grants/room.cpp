@@ -1,5 +1,6 @@
 #include "grants/room.h"
 
+#include <algorithm>
 #include <string>
 
 #include "grants/rows/room_rules.h"
@@ -25,6 +26,7 @@ struct Conditions {
 
 Conditions deadFor(long long grace, Rows rows, const Policy& policy) {
   const long long now = currentTime();
+  grace = std::max(grace, 0LL);
   const std::string none = "0";
   return {rows == Rows::kTokens ? none : rows::isDeadCode(now, grace),
           rows == Rows::kCodes ? none : rows::isDeadToken(policy, now, grace)};
@@ -54,10 +56,10 @@ Purged Room::purgeable(long long grace, Rows rows) const {
 }
 
 Purged Room::purge(long long grace, Rows rows) {
-  const Conditions dead = deadFor(grace, rows, store_.policy);
   Whole whole(store_);
-  const Purged purged{store_.eraseWhere(names::kGrantCodeTable, dead.codes),
-                      store_.eraseWhere(names::kTokenTable, dead.tokens)};
+  const Conditions dead = deadFor(grace, rows, store_.policy);
+  const Purged purged{store_.countErased(names::kGrantCodeTable, dead.codes),
+                      store_.countErased(names::kTokenTable, dead.tokens)};
   whole.commit();
   return purged;
 }

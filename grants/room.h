@@ -38,7 +38,7 @@ class Room {
   /// What `purge` would remove.
   [[nodiscard]] Purged purgeable(long long grace = 0, Rows rows = Rows::kAll) const;
 
-  /// Removes what has been dead for `grace` seconds (0 or more): codes that
+  /// Removes what has been dead for `grace` seconds (0 if below): codes that
   /// expired, logins that nobody can refresh any more, own tokens that expired.
   /// One transaction, one statement a table, and no audit entry.
   Purged purge(long long grace = 0, Rows rows = Rows::kAll);

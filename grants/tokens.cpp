@@ -63,21 +63,22 @@ bool isCurrent(const TokenRow& login, const std::string& shown) {
 
 /// Whether the login's token was this one until a moment ago.
 bool isJustReplaced(const TokenRow& login, const std::string& shown, long long now,
-                    long long grace) {
-  const long long age = now - login.state->issued;
-  return age >= 0 && age < grace &&
+                    const Policy& policy) {
+  return isWithinGrace(login.state->issued, now, policy) &&
          rows::equalSecrets(login.state->refreshBefore, rows::markOf(shown));
 }
 
-std::string endedWord(const std::optional<ApplicationName>& name, const TokenRow& token) {
-  return "Access ended" + rows::applicationWord(name, token.application) +
-         rows::userWord(token.isOwn() ? std::nullopt : std::optional<std::string>(token.user));
+void noteEnd(Store& store, const ApplicationRow& application, const TokenRow& token,
+             const std::string& by) {
+  rows::noteEnd(store,
+                {application.shown.name, token.application, application.shown.registeredItself},
+                token.isOwn() ? std::nullopt : std::optional<std::string>(token.user), by);
 }
 
 Refusal endReplayed(Store& store, Whole& whole, const ApplicationRow& application,
                     const TokenRow& login) {
   rows::erase(store, login);
-  rows::note(store, endedWord(application.shown.name, login) + rows::kAfterReplay);
+  noteEnd(store, application, login, rows::kAfterReplay);
   whole.commit();
   return grantFault(Why::kReplayed);
 }
@@ -97,7 +98,7 @@ Bearer bearerOf(const TokenRow& token, const Application& application, const std
           application.name,
           token.isOurs() ? std::optional<long long>(token.state->issued) : std::nullopt,
           expires,
-          CallerText(token.state ? token.state->text : "")};
+          CallerText(token.isOurs() ? token.state->text : "")};
 }
 
 Outcome<Bearer> verifyAt(Store& store, const std::string& shown, long long now) {
@@ -151,8 +152,8 @@ std::optional<TokenRow> rowOf(Store& store, const ApplicationId& asking, const s
 
 Outcome<Pair> Tokens::issue(const LoginRequest& request) {
   if (const auto fault = faultOf(request)) return *fault;
-  const long long now = currentTime();
   Whole whole(store_);
+  const long long now = currentTime();
   const auto application = rows::actingApplication(store_, request.application);
   if (!application) return application.refusal();
   if (!rows::isScopeWithin(request.scope.text(), application->shown.scope.text())) return kWider;
@@ -169,9 +170,9 @@ Outcome<Pair> Tokens::refresh(const Refresh& refresh) {
   const std::string& shown = refresh.token.text();
   if (rows::hasNul(shown)) return grantFault(Why::kHasNul);
   if (const auto fault = faultOf(refresh.scope)) return *fault;
-  const long long now = currentTime();
 
   Whole whole(store_);
+  const long long now = currentTime();
   const auto application = rows::actingApplication(store_, refresh.application);
   if (!application) return application.refusal();
   const auto text = rows::read(shown);
@@ -180,7 +181,7 @@ Outcome<Pair> Tokens::refresh(const Refresh& refresh) {
   if (!login) return grantFault(Why::kUnknown);
   if (login->application != refresh.application.text()) return grantFault(Why::kOtherApplication);
   if (!isCurrent(*login, shown)) {
-    if (isJustReplaced(*login, shown, now, store_.policy.grace)) {
+    if (isJustReplaced(*login, shown, now, store_.policy)) {
       return grantFault(Why::kUsedBefore);
     }
     return endReplayed(store_, whole, *application, *login);
@@ -198,9 +199,9 @@ Outcome<Pair> Tokens::refresh(const Refresh& refresh) {
 Outcome<Pair> Tokens::issueToItself(const OwnTokenRequest& request) {
   if (const auto fault = faultOf(request.from, request.lifetime)) return *fault;
   if (const auto fault = faultOf(request.scope)) return *fault;
-  const long long now = currentTime();
 
   Whole whole(store_);
+  const long long now = currentTime();
   const auto application = rows::actingApplication(store_, request.application);
   if (!application) return application.refusal();
   if (application->shown.kind == ApplicationKind::kPublic) {
@@ -208,8 +209,16 @@ Outcome<Pair> Tokens::issueToItself(const OwnTokenRequest& request) {
   }
   const Scope scope = request.scope.value_or(application->shown.scope);
   if (!rows::isScopeWithin(scope.text(), application->shown.scope.text())) return kWider;
-  const rows::Stored token = rows::storeToken(
-      store_, {{}, request.application, scope, {}, request.from, request.lifetime, now}, now);
+  const rows::Stored token = rows::storeToken(store_,
+                                              {{},
+                                               request.application,
+                                               scope,
+                                               {},
+                                               request.from,
+                                               request.lifetime,
+                                               now,
+                                               application->shown.registeredItself},
+                                              now);
   whole.commit();
   return token.pair;
 }
@@ -243,7 +252,7 @@ Outcome<Revoked> Tokens::revoke(const ApplicationId& asking, const AnyToken& tok
   if (!found) return Revoked{false};
   if (found->application != asking.text()) return grantFault(Why::kOtherApplication);
   rows::erase(store_, *found);
-  rows::note(store_, endedWord(application->shown.name, *found) + rows::kByItself);
+  noteEnd(store_, *application, *found, rows::kByItself);
   whole.commit();
   return Revoked{true};
 }

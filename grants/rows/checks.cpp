@@ -1,6 +1,7 @@
 #include "grants/rows/checks.h"
 
 #include <arpa/inet.h>
+#include <net/if.h>
 
 #include <algorithm>
 #include <array>
@@ -9,6 +10,7 @@
 namespace KELDOAUTHSERVER::grants::rows {
 namespace {
 
+constexpr Bounds kPeerScope{0, IF_NAMESIZE - 1};
 constexpr long long kLongestLifetime = 100LL * 365 * 24 * 60 * 60;
 
 bool isAlpha(char c) {
@@ -60,8 +62,9 @@ std::optional<Why> faultOf(std::initializer_list<Bounded> texts) {
 bool isPeer(const std::string& text) {
   if (text.empty() || isNumeric(AF_INET, text)) return !hasNul(text);
   const std::size_t percent = text.find('%');
-  if (percent != std::string::npos && !areOf(std::string_view(text).substr(percent + 1), "-._")) {
-    return false;
+  if (percent != std::string::npos) {
+    const std::string_view scope = std::string_view(text).substr(percent + 1);
+    if (!isWithin(scope, kPeerScope) || !areOf(scope, "-._")) return false;
   }
   return !hasNul(text) && isNumeric(AF_INET6, text.substr(0, percent));
 }

@@ -26,7 +26,8 @@ struct Bounded {
 };
 std::optional<Why> faultOf(std::initializer_list<Bounded> texts);
 
-/// An IPv4 or IPv6 address, with a scope of letters, digits and "-._" perhaps.
+/// An IPv4 or IPv6 address, with a scope of up to 15
+/// letters, digits and "-._" perhaps.
 bool isPeer(const std::string& text);
 
 /// An absolute address in printable ASCII without a blank, and without what

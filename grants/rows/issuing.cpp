@@ -20,7 +20,7 @@ long long expiryOf(const std::optional<long long>& lifetime, long long now) {
 /// No access token outlives the login.
 long long expiryWithin(const Policy& policy, const std::optional<long long>& lifetime,
                        long long login, long long now) {
-  return std::min(expiryOf(lifetime, now), login + policy.family);
+  return std::min(expiryOf(lifetime, now), later(login, policy.family));
 }
 
 Json::Value rowOf(const NewToken& token, const TokenState& state, const Pair& pair,
@@ -59,7 +59,8 @@ Stored storeLogin(Store& store, const NewToken& token, long long now) {
 
 /// As refresh token it gets the mark of random digits that nobody is told.
 Stored storeOwn(Store& store, const NewToken& token, long long now) {
-  const long long row = makeRoomForOwnToken(store, token.application.text(), now);
+  const long long row =
+      makeRoomForOwnToken(store, token.application.text(), token.ofSelfRegistered, now);
   const Pair pair{AccessToken(randomDigits(kIdentifierLength)),
                   {},
                   {},

@@ -20,6 +20,7 @@ struct NewToken {
   PeerAddress from;
   std::optional<long long> lifetime;
   long long login;  // when the user agreed
+  bool ofSelfRegistered = false;
 };
 
 struct Stored {

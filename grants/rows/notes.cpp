@@ -1,12 +1,13 @@
 #include "grants/rows/notes.h"
 
 #include <charconv>
+#include <cstdint>
 #include <string_view>
 
-#include "core/oauth_errors.h"
 #include "grants/audit.h"
 #include "grants/rows/quotes.h"
 #include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
 
 namespace KELDOAUTHSERVER::grants::rows {
 namespace {
@@ -15,18 +16,18 @@ constexpr std::size_t kShortForm = 8;
 constexpr std::string_view kCountStart = " (";
 constexpr std::string_view kCountEnd = " times)";
 
-std::string counted(int times) {
+std::string counted(long long times) {
   return std::string(kCountStart) + std::to_string(times) + std::string(kCountEnd);
 }
 
 /// How often an entry with this behind it has been written; 0 when it is
 /// another's.
-int timesIn(std::string_view rest) {
+long long timesIn(std::string_view rest) {
   if (rest.empty()) return 1;
   const std::size_t frame = kCountStart.size() + kCountEnd.size();
   if (rest.size() <= frame || rest.substr(0, kCountStart.size()) != kCountStart) return 0;
   const std::string_view digits = rest.substr(kCountStart.size(), rest.size() - frame);
-  int times = 0;
+  std::uint32_t times = 0;
   std::from_chars(digits.data(), digits.data() + digits.size(), times);
   return counted(times) == rest ? times : 0;
 }
@@ -51,7 +52,7 @@ bool countAgain(Store& store, const std::string& subject, bool hasDetail) {
   for (const Json::Value& row : recent(store, subject)) {
     const std::string text = undoubled(row[names::kMsg].asString());
     const std::size_t at = countAt(text, subject.size(), hasDetail);
-    const int times = timesIn(std::string_view(text).substr(at));
+    const long long times = timesIn(std::string_view(text).substr(at));
     if (times == 0) continue;
     Json::Value condition;
     condition[names::kId] = row[names::kId];
@@ -61,6 +62,20 @@ bool countAgain(Store& store, const std::string& subject, bool hasDetail) {
     return Store::change(store.log, condition, modified);
   }
   return false;
+}
+
+/// Not by the log's own Add: that drops whole seconds, oldest first by the
+/// clock, and so, after one that was set back, the entry itself.
+void write(Store& store, const std::string& text) {
+  Json::Value row;
+  row[names::kMsg] = doubled(text);
+  row[names::kTimestamp] = Json::Value();
+  row[names::kId] = Json::Value();
+  Store::insert(store.log, row);
+  const std::string oldest = "(SELECT id FROM " + std::string(names::kLogTable) + " " +
+                             kNewestFirst + " LIMIT 1 OFFSET " +
+                             std::to_string(getTableRowMax(names::kLogMax)) + ")";
+  store.eraseWhere(names::kLogTable, "id<=" + oldest);
 }
 
 }  // namespace
@@ -80,11 +95,16 @@ std::string actorWord(const Actor& by) {
 }
 
 void note(Store& store, const std::string& subject, const std::string& detail) {
-  if (countAgain(store, subject, !detail.empty())) return;
-  store.log.SetErrCode(errors::kNone.code);
-  store.log.SetErrMsg("");
-  if (store.log.Add(subject + detail) == 0) {
-    throw Trouble(store.log.GetErrCode(), store.log.GetErrMsg());
+  if (!countAgain(store, subject, !detail.empty())) write(store, subject + detail);
+}
+
+void noteEnd(Store& store, const Subject& application, const std::optional<std::string>& user,
+             const std::string& by, const std::string& what) {
+  const std::string word = applicationWord(application.name, application.identifier);
+  if (application.registeredItself) {
+    note(store, what + " of one that registered itself" + userWord(user) + by, word);
+  } else {
+    note(store, what + word + userWord(user) + by);
   }
 }
 

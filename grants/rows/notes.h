@@ -15,6 +15,13 @@ namespace KELDOAUTHSERVER::grants::rows {
 /// The tail of a look into the log.
 inline constexpr char kNewestFirst[] = "ORDER BY id DESC";
 
+/// Of an entry that is about one.
+struct Subject {
+  std::optional<ApplicationName> name;
+  std::string identifier;
+  bool registeredItself;
+};
+
 /// "[Photo Frame 1a2b3c4d]"; without a name "[removed 1a2b3c4d]".
 std::string applicationWord(const std::optional<ApplicationName>& name,
                             const std::string& identifier);
@@ -31,6 +38,12 @@ inline constexpr char kAfterReplay[] = " after a replay";
 /// Writes `subject` and `detail`, or counts it when there is an entry for the
 /// subject within the policy's pause. The detail is that of the first.
 void note(Store& store, const std::string& subject, const std::string& detail = "");
+
+/// "Access ended[Photo Frame 1a2b3c4d] for [alice] by [bob]". Anybody can let
+/// any number of applications register themselves, and end what they have: for
+/// each user, those have one subject together.
+void noteEnd(Store& store, const Subject& application, const std::optional<std::string>& user,
+             const std::string& by, const std::string& what = "Access ended");
 
 }  // namespace KELDOAUTHSERVER::grants::rows
 

@@ -44,11 +44,11 @@ Json::Value rowCondition(long long row) {
 }  // namespace
 
 bool CodeRow::isOurs() const {
-  return state && isMark(storedCode);
+  return state.has_value();
 }
 
 bool TokenRow::isOurs() const {
-  return state && isMark(storedAccess);
+  return state.has_value();
 }
 
 bool TokenRow::isOwn() const {
@@ -56,13 +56,13 @@ bool TokenRow::isOwn() const {
 }
 
 const std::string& TokenRow::loginScope() const {
-  return state && !state->loginScope.empty() ? state->loginScope : scope;
+  return isOurs() && !state->loginScope.empty() ? state->loginScope : scope;
 }
 
 long long TokenRow::ends(const Policy& policy) const {
   if (isOwn()) return expires;
-  const long long unused = expires + policy.idle;
-  return isOurs() ? std::min(unused, state->login + policy.family) : unused;
+  const long long unused = later(expires, policy.idle);
+  return isOurs() ? std::min(unused, later(state->login, policy.family)) : unused;
 }
 
 ApplicationRow applicationOf(const Json::Value& row) {
@@ -80,21 +80,25 @@ ApplicationRow applicationOf(const Json::Value& row) {
       words};
 }
 
+/// What another program stored may be a stranger's text, made up to look like
+/// ours: only a row whose text was digested here has a state.
 CodeRow codeOf(const Json::Value& row) {
   const std::string state = row[names::kState].asString();
+  const std::string code = row[names::kCode].asString();
   return {decimalValue(row[names::kId]),
           textIn(row, names::kUsername),
           textIn(row, names::kClientId),
           textIn(row, names::kScope),
           textIn(row, names::kIp),
           decimalValue(row[names::kExpiredTime]),
-          unpackCode(undoubled(state)),
-          row[names::kCode].asString(),
+          isMark(code) ? unpackCode(undoubled(state)) : std::nullopt,
+          code,
           state};
 }
 
 TokenRow tokenOf(const Json::Value& row) {
   const std::string state = row[names::kState].asString();
+  const std::string access = row[names::kAccessToken].asString();
   return {decimalValue(row[names::kId]),
           textIn(row, names::kUsername),
           textIn(row, names::kClientId),
@@ -102,8 +106,8 @@ TokenRow tokenOf(const Json::Value& row) {
           textIn(row, names::kFlowType),
           textIn(row, names::kIp),
           decimalValue(row[names::kExpiredTime]),
-          unpackToken(undoubled(state)),
-          row[names::kAccessToken].asString(),
+          isMark(access) ? unpackToken(undoubled(state)) : std::nullopt,
+          access,
           row[names::kRefreshToken].asString(),
           state};
 }

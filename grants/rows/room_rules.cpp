@@ -27,6 +27,13 @@ std::string expiry() {
   return "CAST(" + std::string(names::kExpiredTime) + " AS INTEGER)";
 }
 
+/// When a row was issued or refreshed last. Of another program's row that is its
+/// expiry less the lifetime that the settings give.
+std::string renewal(const char* digested, const char* lifetimeKey) {
+  return "CASE WHEN substr(" + std::string(digested) + ",1,7)='sha256:' THEN " + issuedTime() +
+         " ELSE " + expiry() + "-" + std::to_string(getExpiredPeriod(lifetimeKey)) + " END";
+}
+
 /// What an insertion asks of its table, in conditions of SQL.
 struct Claim {
   const char* table;
@@ -63,9 +70,9 @@ Crowd count(Store& store, const Claim& claim) {
 
 /// Removes the first `most` of the rows that meet `condition`; how many went.
 long long evict(Store& store, const Claim& claim, const std::string& condition, long long most) {
-  return store.eraseWhere(claim.table, "id IN (SELECT id FROM " + std::string(claim.table) +
-                                           " WHERE " + condition + " ORDER BY " + claim.order +
-                                           " LIMIT " + std::to_string(most) + ")");
+  return store.countErased(claim.table, "id IN (SELECT id FROM " + std::string(claim.table) +
+                                            " WHERE " + condition + " ORDER BY " + claim.order +
+                                            " LIMIT " + std::to_string(most) + ")");
 }
 
 /// Whether something of the claimant's own had to go.
@@ -92,7 +99,7 @@ bool evictOwn(Store& store, const Claim& claim, const Crowd& crowd, long long li
 }
 
 void clearDead(Store& store, const Claim& claim, long long rows, long long limit) {
-  rows -= store.eraseWhere(claim.table, claim.isDead);
+  rows -= store.countErased(claim.table, claim.isDead);
   if (rows < limit) return;
   if (claim.yields.empty()) fail(claim.whenFull);
   const long long needed = rows - limit + 1;
@@ -115,7 +122,7 @@ Claim tokenClaim(const Store& store, const std::string& application, long long n
   Claim claim{names::kTokenTable, names::kTokenMax, errors::kTokenFull, "", "", "", "", "", "", 1};
   claim.isDead = isDeadToken(store.policy, now);
   claim.isOfApplication = isOf(application);
-  claim.order = expiry() + ",id";
+  claim.order = renewal(names::kAccessToken, names::kTokenExpired) + ",id";
   return claim;
 }
 
@@ -146,8 +153,9 @@ void makeRoomForCode(Store& store, const std::string& user, const std::string& a
   makeRoom(store,
            {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull, isDeadCode(now),
             "(NOT " + isSpentCode() + " AND " + isOfUser + " AND " + isOfApplication + ")",
-            isOfUser, isOfApplication, isSpentCode() + " DESC," + expiry() + ",id", isSpentCode(),
-            store.policy.codesOfOne});
+            isOfUser, isOfApplication,
+            isSpentCode() + " DESC," + renewal(names::kCode, names::kGrantCodeExpired) + ",id",
+            isSpentCode(), store.policy.codesOfOne});
 }
 
 long long makeRoomForLogin(Store& store, const std::string& user, const std::string& application,
@@ -160,9 +168,13 @@ long long makeRoomForLogin(Store& store, const std::string& user, const std::str
   return makeRoom(store, claim);
 }
 
-long long makeRoomForOwnToken(Store& store, const std::string& application, long long now) {
+long long makeRoomForOwnToken(Store& store, const std::string& application, bool registeredItself,
+                              long long now) {
   Claim claim = tokenClaim(store, application, now);
-  claim.isOfUser = "0";
+  claim.isOfUser = registeredItself
+                       ? "(" + isOwnToken() + " AND client_id IN (SELECT client_id FROM " +
+                             names::kClientInfoTable + " WHERE " + selfCondition() + "))"
+                       : "0";
   claim.isOfPair = "(" + isOwnToken() + " AND " + claim.isOfApplication + ")";
   claim.pairBound = store.policy.tokensOfItself;
   return makeRoom(store, claim);
@@ -184,7 +196,7 @@ void makeRoomForApplication(Store& store, bool registersItself, long long now) {
                              isDeadCode(now) + " AND NOT " + isSpentCode() + ")" + live +
                              names::kTokenTable + " WHERE NOT " + isDeadToken(store.policy, now) +
                              ")";
-  const long long gone = store.eraseWhere(
+  const long long gone = store.countErased(
       names::kClientInfoTable, "id IN (SELECT id FROM " + std::string(names::kClientInfoTable) +
                                    " WHERE " + unused + " ORDER BY id LIMIT " +
                                    std::to_string(found[1] - part + 1) + ")");

@@ -33,7 +33,10 @@ void makeRoomForCode(Store& store, const std::string& user, const std::string& a
 /// Both give the id that the row gets.
 long long makeRoomForLogin(Store& store, const std::string& user, const std::string& application,
                            long long now);
-long long makeRoomForOwnToken(Store& store, const std::string& application, long long now);
+/// The own tokens of all applications that registered themselves count as one
+/// user's: anybody can register any number of them.
+long long makeRoomForOwnToken(Store& store, const std::string& application, bool registeredItself,
+                              long long now);
 
 void makeRoomForApplication(Store& store, bool registersItself, long long now);
 

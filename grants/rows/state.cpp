@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "utils/oauth_bounds.h"
+#include "utils/oauth_names.h"
 
 namespace KELDOAUTHSERVER::grants::rows {
 namespace {
@@ -75,9 +76,19 @@ std::string anyMark() {
 
 }  // namespace
 
+std::string issuedTime() {
+  const std::string state = names::kState;
+  return "CAST(substr(" + state + ",instr(" + state + ",':')+1,CAST(substr(" + state + "," +
+         std::to_string(kStart + 1) + ") AS INTEGER)) AS INTEGER)";
+}
+
 std::string pack(const CodeState& state) {
-  Fields fields{state.redirect,  state.isNamed ? "1" : "0",    state.method,
-                state.challenge, std::to_string(state.issued), state.text};
+  Fields fields{std::to_string(state.issued),
+                state.redirect,
+                state.isNamed ? "1" : "0",
+                state.method,
+                state.challenge,
+                state.text};
   if (!state.spent) return joined(kCodeStart, fields);
   fields.push_back(std::to_string(state.spent->time));
   fields.push_back(std::to_string(state.spent->tokenRow));
@@ -86,8 +97,8 @@ std::string pack(const CodeState& state) {
 }
 
 std::string pack(const TokenState& state) {
-  return joined(kTokenStart, {std::to_string(state.login), std::to_string(state.redeemed),
-                              std::to_string(state.issued), state.family, state.refreshBefore,
+  return joined(kTokenStart, {std::to_string(state.issued), std::to_string(state.login),
+                              std::to_string(state.redeemed), state.family, state.refreshBefore,
                               state.accessBefore, state.loginScope, state.text});
 }
 
@@ -97,11 +108,11 @@ std::optional<CodeState> unpackCode(std::string_view text) {
   if (!isSpent && start != kCodeStart) return {};
   const std::optional<Fields> fields =
       split(text.substr(kStart), isSpent ? kSpentFields : kCodeFields);
-  if (!fields || ((*fields)[1] != "1" && (*fields)[1] != "0")) return {};
+  if (!fields || ((*fields)[2] != "1" && (*fields)[2] != "0")) return {};
 
-  const std::optional<long long> issued = numberOf<long long>((*fields)[4]);
+  const std::optional<long long> issued = numberOf<long long>((*fields)[0]);
   if (!issued) return {};
-  CodeState state{(*fields)[0], (*fields)[1] == "1", (*fields)[2], (*fields)[3],
+  CodeState state{(*fields)[1], (*fields)[2] == "1", (*fields)[3], (*fields)[4],
                   *issued,      (*fields)[5]};
   if (isSpent && !readSpent(*fields, state)) return {};
   return state;
@@ -111,9 +122,9 @@ std::optional<TokenState> unpackToken(std::string_view text) {
   if (text.substr(0, kStart) != kTokenStart) return {};
   const std::optional<Fields> fields = split(text.substr(kStart), kTokenFields);
   if (!fields) return {};
-  const std::optional<long long> login = numberOf<long long>((*fields)[0]);
-  const std::optional<long long> redeemed = numberOf<long long>((*fields)[1]);
-  const std::optional<long long> issued = numberOf<long long>((*fields)[2]);
+  const std::optional<long long> issued = numberOf<long long>((*fields)[0]);
+  const std::optional<long long> login = numberOf<long long>((*fields)[1]);
+  const std::optional<long long> redeemed = numberOf<long long>((*fields)[2]);
   if (!login || !redeemed || !issued) return {};
   return TokenState{*login,       *redeemed,    *issued,      (*fields)[3],
                     (*fields)[4], (*fields)[5], (*fields)[6], (*fields)[7]};

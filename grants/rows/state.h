@@ -2,14 +2,17 @@
 // ours. A text begins with what it is and its version, and then has one field
 // after the other, each as its length, a colon and its bytes as they are:
 //
-//   c1  a code: redirect address, whether it was named (1 or 0), method of the
-//       challenge (S or P; empty without), challenge, when issued, caller's text
+//   c1  a code: when issued, redirect address, whether it was named (1 or 0),
+//       method of the challenge (S or P; empty without), challenge, caller's
+//       text
 //   s1  a code that was spent: the same, then when it was spent, its token's
 //       row and the family's mark
-//   t1  a token: when its code was issued, redeemed, when the present pair was
-//       issued, mark of the family, marks of the refresh and access token
+//   t1  a token: when the present pair was issued, when its code was, and was
+//       redeemed, mark of the family, marks of the refresh and access token
 //       before, scope of the login where the row has a narrower one, caller's
 //       text
+//
+// The time of issue goes first, where a statement finds it.
 //
 // Nothing else in the library or above it reads or writes these texts.
 
@@ -51,6 +54,9 @@ struct TokenState {
 
 /// How the text of a spent code begins.
 inline constexpr char kSpentStart[] = "s1";
+
+/// An expression of SQL: the time of issue in a text that `pack` wrote.
+std::string issuedTime();
 
 std::string pack(const CodeState& state);
 std::string pack(const TokenState& state);

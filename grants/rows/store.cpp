@@ -1,6 +1,8 @@
 #include "grants/rows/store.h"
 
+#include <algorithm>
 #include <initializer_list>
+#include <limits>
 #include <utility>
 
 #include "core/oauth_errors.h"
@@ -12,6 +14,14 @@ namespace KELDOAUTHSERVER::grants {
 namespace {
 
 constexpr char kNotReady[] = "DB is not ready!!";
+constexpr long long kLongest = 100LL * 365 * 24 * 60 * 60;
+
+Policy sane(Policy policy) {
+  for (long long* seconds : {&policy.idle, &policy.family, &policy.grace, &policy.auditPause}) {
+    *seconds = std::clamp(*seconds, 0LL, kLongest);
+  }
+  return policy;
+}
 
 /// What SQLite would say of a random failure that left no code.
 Trouble troubleOf(const OAUTHDBBasic& table) {
@@ -46,7 +56,7 @@ Json::Value select(OAUTHDBBasic& table, Json::Value request) {
 }  // namespace
 
 Store::Store(const Policy& given)
-    : policy(given),
+    : policy(sane(given)),
       applications(names::kClientInfoTable),
       codes(names::kGrantCodeTable, applications),
       tokens(names::kTokenTable, applications),
@@ -110,10 +120,14 @@ bool Store::erase(OAUTHDBBasic& table, const Json::Value& condition) {
   return foundRow(table, table.DBDel(request));
 }
 
-long long Store::eraseWhere(const char* table, const std::string& condition) {
+void Store::eraseWhere(const char* table, const std::string& condition) {
   const std::string statement = std::string("DELETE FROM ") + table + " WHERE " + condition;
   clearError(applications);
   if (applications.DBCmd(statement, nullptr, nullptr) == 0) throw troubleOf(applications);
+}
+
+long long Store::countErased(const char* table, const std::string& condition) {
+  eraseWhere(table, condition);
   return numbers("SELECT changes()").front();
 }
 
@@ -154,6 +168,17 @@ void Whole::commit() {
   throw troubleOf(store_.applications.GetErrCode() != errors::kNone.code
                       ? static_cast<OAUTHDBBasic&>(store_.applications)
                       : store_.log);
+}
+
+// Values ------------------------------------------------------------------------
+
+long long later(long long time, long long seconds) {
+  const long long last = std::numeric_limits<long long>::max() - seconds;
+  return std::min(time, last) + seconds;
+}
+
+bool isWithinGrace(long long time, long long now, const Policy& policy) {
+  return time <= now && time > now - policy.grace;
 }
 
 }  // namespace KELDOAUTHSERVER::grants

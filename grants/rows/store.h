@@ -27,7 +27,7 @@ class Store {
   /// Throws Trouble when the store is not ready.
   explicit Store(const Policy& policy);
 
-  const Policy policy;
+  const Policy policy;             // its seconds within their bounds
   OAUTHDBClientInfo applications;  // whose connection it is
   OAUTHDBGrantCode codes;
   OAUTHDBToken tokens;
@@ -53,8 +53,10 @@ class Store {
   static bool change(OAUTHDBBasic& table, const Json::Value& condition,
                      const Json::Value& modified);
   static bool erase(OAUTHDBBasic& table, const Json::Value& condition);
-  /// Removes the rows that meet a condition of SQL, or all; how many there were.
-  long long eraseWhere(const char* table, const std::string& condition = "1");
+  /// Removes the rows that meet a condition of SQL.
+  void eraseWhere(const char* table, const std::string& condition);
+  /// The same, or all of them; how many there were.
+  long long countErased(const char* table, const std::string& condition = "1");
 
   /// An application's identifier as the columns "client_id" hold it.
   static std::string sealed(const std::string& identifier);
@@ -64,7 +66,8 @@ class Store {
 };
 
 /// Several steps as one: all of them when `commit` returns, none otherwise.
-/// Takes the write lock at once. Throws Trouble.
+/// Takes the write lock at once. Throws Trouble. The clock is to be read after
+/// that: what an operation compares it with was written under the lock.
 class Whole {
  public:
   explicit Whole(Store& store);
@@ -76,6 +79,13 @@ class Whole {
   Store& store_;
   std::optional<Transaction> transaction_;
 };
+
+/// As late as can be where the sum is later than that.
+long long later(long long time, long long seconds);
+
+/// Whether something that was used at `time` comes again as from a client that
+/// tries twice.
+bool isWithinGrace(long long time, long long now, const Policy& policy);
 
 }  // namespace KELDOAUTHSERVER::grants
 

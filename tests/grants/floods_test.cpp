@@ -1,6 +1,8 @@
 // Nobody can push others out: floods, and what becomes of everybody else.
 
+#include "stores/oauth_token.h"
 #include "tests/grants/grants_test.h"
+#include "utils/oauth_names.h"
 
 namespace grants_test {
 namespace {
@@ -208,6 +210,30 @@ TEST_F(FullSizeFloodsTest, AHundredAndTwentyFiveUsersOfOneApplication) {
   expectOthersUnharmed();
 }
 
+TEST_F(FloodsTest, WhatGoesFirstWasRenewedLongestAgoHoweverLongItLasts) {
+  std::vector<Pair> pairs;
+  for (int i = 0; i < 8; ++i) {
+    pairs.push_back(*grants().tokens.issue({kAlice, frame_, kScope, {}, {}, kDay}));
+    support::Clock::advance(1);
+  }
+  for (int i = 0; i < 4; ++i) {  // from now on they last for ten minutes
+    pairs.push_back(login(frame_));
+    support::Clock::advance(1);
+  }
+  for (std::size_t i = 0; i < pairs.size(); ++i) EXPECT_EQ(isGood(pairs[i]), i >= 4) << i;
+}
+
+TEST_F(FloodsTest, AnotherProgramsRowsTakeTheirTurn) {
+  Json::Value out;
+  KELDOAUTHSERVER::OAUTHDBToken foreign(KELDOAUTHSERVER::names::kTokenTable);
+  foreign.Add("alice", frame_.text(), "profile", "password", "state", "", out);
+  support::Clock::advance(1);
+  std::vector<Pair> pairs;
+  for (int i = 0; i < 8; ++i) pairs.push_back(login(frame_));
+  EXPECT_FALSE(isGood(AccessToken(out[KELDOAUTHSERVER::names::kAccessToken].asString())));
+  for (const Pair& pair : pairs) EXPECT_TRUE(isGood(pair));
+}
+
 // Applications that register themselves ------------------------------------------------
 
 class SelfRegistrationTest : public FloodsTest {
@@ -252,6 +278,36 @@ TEST_F(SelfRegistrationTest, AreCountedInOneEntry) {
   EXPECT_THAT(self, HasSubstr("Application registered itself[Self 0 "));
   EXPECT_THAT(self, HasSubstr("] (20 times)"));
   EXPECT_EQ(entries().size(), 3U);
+}
+
+TEST_F(SelfRegistrationTest, TheirOwnTokensHaveAQuarterOfTheTableTogether) {
+  writeSettings(R"({"client_info_max": 100, "token_max": 40})");
+  for (int i = 0; i < 45; ++i) {
+    const ApplicationId mine = addItself(i).identifier;
+    ASSERT_TRUE(grants().tokens.issueToItself({mine}));
+    support::Clock::advance(1);
+  }
+  EXPECT_EQ(rows("oauth_token WHERE flow_type='client_credentials'"), "10");
+  EXPECT_TRUE(grants().tokens.issueToItself({frame_}));
+  expectOthersUnharmed();
+}
+
+TEST_F(SelfRegistrationTest, DoNotWashTheAuditLogOut) {
+  writeSettings(R"({"client_info_max": 10, "log_max": 20})");
+  for (int i = 0; i < 60; ++i) {
+    const ApplicationId mine = addItself(i).identifier;
+    const Pair own = *grants().tokens.issueToItself({mine});
+    EXPECT_TRUE(grants().tokens.revoke(mine, AnyToken(own.access.text()))->wasThere);
+    const Pair pair = login(mine);
+    EXPECT_TRUE(grants().tokens.revoke(mine, AnyToken(pair.access.text()))->wasThere);
+    login(mine);
+    EXPECT_EQ(grants().access.endUserWith(kAlice, mine, Actor("alice")).tokens, 1);
+  }
+  EXPECT_THAT(entries(), Contains(HasSubstr("registered[Photo Frame")));
+  EXPECT_THAT(entries(), Contains(HasSubstr("Access ended of one that registered itself for "
+                                            "[alice] by itself[Self 0 ")));
+  EXPECT_THAT(entries(), Contains(::testing::EndsWith("] (60 times)")));
+  expectOthersUnharmed();
 }
 
 }  // namespace

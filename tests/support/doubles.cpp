@@ -24,6 +24,7 @@ namespace {
 struct ClockState {
   std::optional<long long> fixed;
   int calls = 0;
+  std::function<void()> onRead = {};
 };
 ClockState clockState;
 
@@ -114,6 +115,9 @@ void Clock::advance(long long seconds) {
 void Clock::release() {
   clockState = {};
 }
+void Clock::onRead(std::function<void()> body) {
+  clockState.onRead = std::move(body);
+}
 int Clock::calls() {
   return clockState.calls;
 }
@@ -188,6 +192,7 @@ extern "C" {
 
 time_t time(time_t* result) noexcept {
   ++clockState.calls;
+  if (clockState.onRead) clockState.onRead();
   const auto now = static_cast<time_t>(clockState.fixed.value_or(support::realSeconds()));
   if (result != nullptr) *result = now;
   return now;

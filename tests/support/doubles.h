@@ -18,6 +18,8 @@ class Clock {
   static void setTo(long long seconds);
   static void advance(long long seconds);
   static void release();
+  /// Runs `body` at every call of time(), until the release.
+  static void onRead(std::function<void()> body);
   /// Calls of time() since the last release.
   static int calls();
 };
