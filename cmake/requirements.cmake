@@ -1,6 +1,7 @@
 # What the parts that are to be built need. All that is missing is said at once,
 # with the way to do without it.
-find_package(SQLite3 QUIET)
+# The first that knows synchronous=EXTRA: an older one takes it for NORMAL.
+find_package(SQLite3 3.12 QUIET)
 find_package(PkgConfig QUIET)
 if(PKG_CONFIG_FOUND)
   pkg_check_modules(JSONCPP QUIET IMPORTED_TARGET jsoncpp)
@@ -19,7 +20,7 @@ function(keldoauth_need found thing package)
 endfunction()
 
 keldoauth_need(PKG_CONFIG_FOUND pkg-config pkg-config)
-keldoauth_need(SQLite3_FOUND "SQLite 3" libsqlite3-dev)
+keldoauth_need(SQLite3_FOUND "SQLite 3.12" libsqlite3-dev)
 if(PKG_CONFIG_FOUND)
   keldoauth_need(JSONCPP_FOUND JsonCpp libjsoncpp-dev)
   foreach(part TOOLS SERVICE)

@@ -85,6 +85,13 @@ TEST_F(Restore, IntoAStoreInWalMode) {
   expectNextProgramReady();
 }
 
+TEST_F(Restore, OfACopyInWalModeLeavesTheStoreInItsOwn) {
+  execute(kCopy, "PRAGMA journal_mode=WAL");
+  EXPECT_THAT(restore(), ExitsWith(cli::kOk));
+  EXPECT_EQ(contentOf(), then_);
+  EXPECT_EQ(valueIn(kDatabase, "PRAGMA journal_mode"), "delete");
+}
+
 TEST_F(Restore, OfACopyWithAWriteAheadLogBesideIt) {
   sqlite3* db = nullptr;
   sqlite3_open(kCopy, &db);

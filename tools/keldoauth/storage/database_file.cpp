@@ -136,6 +136,9 @@ void DatabaseFile::copyTo(DatabaseFile& target) {
   // By its contract the latter passes over a lock that did not go away.
   if (finished != SQLITE_OK) throw target.failure();
   if (copied != SQLITE_DONE) throw target.failure(copied);
+  // Like a draft, a copy in memory is not in the journal mode of where it came
+  // from: what it is restored to keeps its own.
+  if (target.use_ == Use::kMemory) target.execute("PRAGMA temp_store=MEMORY; VACUUM");
 }
 
 std::string DatabaseFile::stranger() {
