@@ -122,7 +122,7 @@ std::string accessItem(const std::string& admin, const Shown& shown, const Holde
   return fill("<li class=\"card\">\n<h3>{}</h3>\n", {name}) + badgeOf(held.state) + "<dl>" +
          timeRow("Since", held.since) +
          timeRow("Renewed", held.renewed > held.since ? held.renewed : 0) +
-         timeRow("Ends if unused", held.ends) +
+         timeRow(shown.user.empty() ? "Ends" : "Ends if unused", held.ends) +
          fill("<dt>Grants</dt><dd>{}</dd></dl>\n", {std::to_string(held.entries)}) +
          scopeTags(held.scope) + "<div class=\"actions\">\n" +
          revokeForm(admin, "revoke", shown, client.text()) +

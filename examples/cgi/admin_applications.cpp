@@ -86,8 +86,9 @@ std::string applicationItem(const std::string& user, const grants::Application& 
 Answer applicationsPage(const grants::Grants& store, const std::string& admin,
                         const std::string& done, const Draft& draft) {
   std::string items;
-  for (const grants::Application& client : store.applications.all())
+  for (const grants::Application& client : store.applications.all()) {
     items += applicationItem(admin, client);
+  }
   const std::string list = items.empty() ? "<p class=\"empty\">No application is registered.</p>\n"
                                          : "<ul class=\"cards\">\n" + items + "</ul>\n";
   const std::string registered =
