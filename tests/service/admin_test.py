@@ -19,6 +19,14 @@ def submit(action, token=None, **fields):
                 {**FORM, **as_user("admin")})
 
 
+def register_by_hand(name):
+    """An application that the administrator has registered, with two scopes."""
+    answer = submit("register", name=name, redirect=service.CALLBACK,
+                    **{"scope.profile": "1", "scope.files.read": "1"})
+    identifier, secret = re.findall(r"<code[^>]*>([0-9a-f]{64})</code>", answer.text)
+    return service.Client(identifier, secret)
+
+
 class Page(unittest.TestCase):
     def test_is_for_administrators_alone(self):
         self.assertEqual(send("GET", "/admin").status, 401)
@@ -111,7 +119,7 @@ class Applications(unittest.TestCase):
 
 class Access(unittest.TestCase):
     def test_revoking_ends_every_grant_to_the_application(self):
-        client = register(client_name="Revoked", scope="profile files.read")
+        client = register_by_hand("Revoked")
         pairs = [client.tokens("bob"), client.tokens("bob", scope="profile files.read")]
         code, verifier = client.log_in("bob")
         page = show("?view=access&user=bob").text
@@ -127,6 +135,15 @@ class Access(unittest.TestCase):
         self.assertEqual(client.redeem(code, verifier).status, 400)
         self.assertIn(f"Access ended[Revoked {client.id[:8]}] for [bob] by [admin]",
                       show("?view=log").text)
+
+    def test_those_that_registered_themselves_share_an_entry_for_a_user(self):
+        for _ in range(2):
+            client = register()
+            client.tokens("o'neil")
+            submit("revoke", client=client.id, user="o'neil")
+        entry = "Access ended of one that registered itself for [o&#39;neil] by [admin]"
+        page = show("?view=log&filter=neil").text
+        self.assertEqual(page.count(entry), 1)
 
     def test_access_of_another_user_or_application_is_not_touched(self):
         client = register()
