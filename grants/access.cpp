@@ -60,43 +60,49 @@ bool isLive(const TokenRow& token, const Policy& policy, long long now) {
   return token.ends(policy) >= now || token.expires >= now;
 }
 
+// Member by member: an aggregate with conditional texts in it is not taken down
+// rightly by every compiler when memory runs out halfway.
+
 AccessEntry entryOf(const CodeRow& code, const Names& names, long long now) {
   const bool isOurs = code.isOurs();
-  return {{AccessHandle::Table::kCodes, code.row, markOf(code)},
-          code.isSpent() ? AccessEntry::Kind::kSpent : AccessEntry::Kind::kCode,
-          User(code.user),
-          ApplicationId(code.application),
-          nameOf(names, code.application),
-          Scope(code.scope),
-          isOurs ? code.state->issued : 0,
-          isOurs ? code.state->issued : 0,
-          code.expires,
-          code.expires,
-          PeerAddress(code.from),
-          "",
-          CallerText(isOurs ? code.state->text : rows::undoubled(code.storedState)),
-          code.expires <= now,
-          !isOurs};
+  AccessEntry entry{};
+  entry.handle = {AccessHandle::Table::kCodes, code.row, markOf(code)};
+  entry.kind = code.isSpent() ? AccessEntry::Kind::kSpent : AccessEntry::Kind::kCode;
+  entry.user = User(code.user);
+  entry.application = ApplicationId(code.application);
+  entry.applicationName = nameOf(names, code.application);
+  entry.scope = Scope(code.scope);
+  entry.since = entry.renewed = isOurs ? code.state->issued : 0;
+  entry.expires = entry.ends = code.expires;
+  entry.from = PeerAddress(code.from);
+  entry.text = CallerText(rows::undoubled(code.storedState));
+  if (isOurs) entry.text = CallerText(code.state->text);
+  entry.isDead = code.expires <= now;
+  entry.isForeign = !isOurs;
+  return entry;
 }
 
 AccessEntry entryOf(const TokenRow& token, const Names& names, const Policy& policy,
                     long long now) {
   const bool isOurs = token.isOurs();
-  return {{AccessHandle::Table::kTokens, token.row, markOf(token)},
-          token.isOwn() ? AccessEntry::Kind::kOwn : AccessEntry::Kind::kLogin,
-          token.isOwn() ? std::optional<User>() : User(token.user),
-          ApplicationId(token.application),
-          nameOf(names, token.application),
-          Scope(token.loginScope()),
-          isOurs ? token.state->login : 0,
-          isOurs ? token.state->issued : 0,
-          token.expires,
-          token.ends(policy),
-          PeerAddress(token.from),
-          token.flow,
-          CallerText(isOurs ? token.state->text : rows::undoubled(token.storedState)),
-          !isLive(token, policy, now),
-          !isOurs};
+  AccessEntry entry{};
+  entry.handle = {AccessHandle::Table::kTokens, token.row, markOf(token)};
+  entry.kind = token.isOwn() ? AccessEntry::Kind::kOwn : AccessEntry::Kind::kLogin;
+  if (!token.isOwn()) entry.user = User(token.user);
+  entry.application = ApplicationId(token.application);
+  entry.applicationName = nameOf(names, token.application);
+  entry.scope = Scope(token.loginScope());
+  entry.since = isOurs ? token.state->login : 0;
+  entry.renewed = isOurs ? token.state->issued : 0;
+  entry.expires = token.expires;
+  entry.ends = token.ends(policy);
+  entry.from = PeerAddress(token.from);
+  entry.flow = token.flow;
+  entry.text = CallerText(rows::undoubled(token.storedState));
+  if (isOurs) entry.text = CallerText(token.state->text);
+  entry.isDead = !isLive(token, policy, now);
+  entry.isForeign = !isOurs;
+  return entry;
 }
 
 // Conditions of SQL ---------------------------------------------------------------

@@ -174,7 +174,8 @@ Outcome<Registered> Applications::add(const NewApplication& application, const A
   if (application.identifier) removeGrants(store_, identifier);
   noteRegistration(store_, application, identifier, by);
   whole.commit();
-  return Registered{identifier, isPublic ? std::optional<Secret>() : secret};
+  if (isPublic) return Registered{identifier, {}};
+  return Registered{identifier, secret};
 }
 
 // Look-ups ----------------------------------------------------------------------

@@ -27,9 +27,10 @@ struct Conditions {
 Conditions deadFor(long long grace, Rows rows, const Policy& policy) {
   const long long now = currentTime();
   grace = std::max(grace, 0LL);
-  const std::string none = "0";
-  return {rows == Rows::kTokens ? none : rows::isDeadCode(now, grace),
-          rows == Rows::kCodes ? none : rows::isDeadToken(policy, now, grace)};
+  Conditions dead{"0", "0"};
+  if (rows != Rows::kTokens) dead.codes = rows::isDeadCode(now, grace);
+  if (rows != Rows::kCodes) dead.tokens = rows::isDeadToken(policy, now, grace);
+  return dead;
 }
 
 }  // namespace

@@ -90,15 +90,18 @@ Why whyUnknown(Store& store, const std::string& shown) {
 
 // Looking up --------------------------------------------------------------------
 
+/// Member by member, as the entries of a list are.
 Bearer bearerOf(const TokenRow& token, const Application& application, const std::string& scope,
                 long long expires) {
-  return {token.isOwn() ? std::optional<User>() : User(token.user),
-          Scope(scope),
-          application.identifier,
-          application.name,
-          token.isOurs() ? std::optional<long long>(token.state->issued) : std::nullopt,
-          expires,
-          CallerText(token.isOurs() ? token.state->text : "")};
+  Bearer bearer{};
+  if (!token.isOwn()) bearer.user = User(token.user);
+  bearer.scope = Scope(scope);
+  bearer.application = application.identifier;
+  bearer.applicationName = application.name;
+  if (token.isOurs()) bearer.issued = token.state->issued;
+  bearer.expires = expires;
+  if (token.isOurs()) bearer.text = CallerText(token.state->text);
+  return bearer;
 }
 
 Outcome<Bearer> verifyAt(Store& store, const std::string& shown, long long now) {

@@ -142,7 +142,7 @@ TEST_P(MemoryTroublesTest, AreNeverAnAnswer) {
   FailingMemory memory(GetParam().memory);
   for (const Operation& operation : everyOperation()) {
     study(operation);
-    throwEverywhere(memory, support::isLongForm() ? 1 : 37);
+    throwEverywhere(memory, support::isLongForm() ? 1 : 11);
   }
   RecordProperty("trials", trials_);
 }
