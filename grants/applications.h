@@ -17,7 +17,8 @@ namespace KELDOAUTHSERVER::grants {
 class Store;
 
 /// A confidential application has a secret. A public one, whose every user
-/// holds its code, has none.
+/// holds its code, has none: its tokens end when they come again, and it gets
+/// none for itself.
 enum class ApplicationKind { kConfidential, kPublic };
 
 struct Application {
@@ -53,7 +54,8 @@ struct NewApplication {
   std::optional<Secret> secret = {};
 };
 
-/// The secret is told this once; none for a public application.
+/// What a new application has to be told. The secret is told this once, or
+/// asked for with secretOf; none for a public application.
 struct Registered {
   ApplicationId identifier;
   std::optional<Secret> secret;
@@ -68,6 +70,7 @@ struct ApplicationChange {
   std::optional<bool> needsPkce = {};
 };
 
+/// Rows that went with an application, dead and spent ones included.
 struct Removed {
   int codes;
   int tokens;
@@ -88,8 +91,12 @@ class Applications {
 
   // Look-ups ------------------------------------------------------------------
 
+  // A text that no application can have finds none, without a look at the store.
+
+  /// Nothing when it is not registered, or not any more.
   std::optional<Application> find(const ApplicationId& identifier) const;
-  /// Several applications may have one name.
+  /// Several applications may have one name, byte by byte the same; in the order
+  /// in which they registered, as are all.
   std::vector<Application> named(const ApplicationName& name) const;
   std::vector<Application> all() const;
 

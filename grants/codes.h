@@ -45,11 +45,15 @@ struct CodeRequest {
   bool waivesPkce = false;
 };
 
+/// What goes to the application, by way of the user.
 struct IssuedCode {
-  Code code;
+  Code code;          // told this once
   long long expires;  // Unix seconds; it is good before this one
 };
 
+/// What an application shows at the token endpoint. A redirect address must be
+/// the one of the request, byte by byte, and be there when it was named; a
+/// verifier must be there when there was a challenge, and only then.
 struct Redemption {
   ApplicationId application;  // who shows the code, authenticated
   Code code;

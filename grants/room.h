@@ -1,4 +1,13 @@
-// How full the store is, and clearing away what is dead.
+// How full the store is, and clearing away what is dead:
+//
+//   a code     from its expiry on; one that was redeemed is remembered until the
+//              login that came from it has to end, which is its expiry then
+//   a login    when nobody has refreshed it for the policy's idle time after its
+//              access token expired
+//   own token  after its expiry
+//
+// Rows of other programs die as logins do. The stores' own Purge goes by the
+// expiry alone and ends logins that could still be refreshed.
 
 #ifndef KELDOAUTH_GRANTS_ROOM_H
 #define KELDOAUTH_GRANTS_ROOM_H

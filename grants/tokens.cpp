@@ -17,7 +17,6 @@ namespace KELDOAUTHSERVER::grants {
 namespace {
 
 using rows::ApplicationRow;
-using rows::RefreshText;
 using rows::TokenRow;
 
 Refusal requestFault(Why why) {
