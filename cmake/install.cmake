@@ -37,6 +37,7 @@ if(NOT BUILD_SHARED_LIBS)
   set(KELDOAUTH_PC_LIBS " -lkeldcore -lkeldcgi")
 endif()
 
+install(TARGETS keldoauth_headers keldoauth_flavour EXPORT KeldOAuthTargets)
 install(TARGETS keldoauth EXPORT KeldOAuthTargets
   ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT dev
   LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT runtime NAMELINK_COMPONENT dev)
@@ -54,6 +55,22 @@ configure_package_config_file(cmake/KeldOAuthConfig.cmake.in KeldOAuthConfig.cma
   INSTALL_DESTINATION ${package_dir})
 write_basic_package_version_file(KeldOAuthConfigVersion.cmake COMPATIBILITY SameMajorVersion)
 configure_file(cmake/keldoauth.pc.in keldoauth.pc @ONLY)
+
+# The static flavour, with the JsonCpp that it was built with.
+if(TARGET keldoauth_static)
+  target_link_directories(keldoauth_static INTERFACE
+    $<INSTALL_INTERFACE:${exported_LIBDIR}>)
+  install(TARGETS keldoauth_static EXPORT KeldOAuthStaticTargets
+    ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT dev)
+  install(FILES ${KELDOAUTH_STATIC_JSONCPP}
+    DESTINATION ${CMAKE_INSTALL_LIBDIR} RENAME libkeldoauth_jsoncpp.a COMPONENT dev)
+  install(EXPORT KeldOAuthStaticTargets NAMESPACE KeldOAuth::
+    DESTINATION ${package_dir} COMPONENT dev)
+  list(JOIN JSONCPP_CFLAGS " " KELDOAUTH_PC_JSONCPP_CFLAGS)
+  configure_file(cmake/keldoauth-static.pc.in keldoauth-static.pc @ONLY)
+  install(FILES ${CMAKE_CURRENT_BINARY_DIR}/keldoauth-static.pc
+    DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)
+endif()
 
 install(EXPORT KeldOAuthTargets NAMESPACE KeldOAuth:: DESTINATION ${package_dir} COMPONENT dev)
 install(FILES

@@ -64,3 +64,19 @@ require_private_mounts() {
   quietly "$project/tests/support/sandbox.sh" true ||
     die "no private mounts here: run as root, or as a user who may create user namespaces"
 }
+
+# private_apt FOLDER ARCHITECTURE: an apt of its own in the array "apt", for what
+# FOLDER/etc/sources.list names. It keeps the host's way to the network, and
+# nothing else of it.
+private_apt() {
+  local folder=$1 architecture=$2
+  mkdir -p "$folder"/{lists/partial,cache/archives/partial,etc/preferences.d,etc/apt.conf.d}
+  : >"$folder/status"
+  apt-config dump Acquire >"$folder/etc/apt.conf.d/acquire"
+  # shellcheck disable=SC2034
+  apt=(env "APT_CONFIG=/dev/null" apt-get -q -y
+    -o "Dir::Etc=$folder/etc" -o "Dir::Etc::sourceparts=/dev/null"
+    -o "Dir::State=$folder" -o "Dir::State::status=$folder/status" -o "Dir::Cache=$folder/cache"
+    -o "APT::Architecture=$architecture" -o "APT::Architectures::=$architecture"
+    -o APT::Install-Recommends=false -o APT::Sandbox::User=)
+}

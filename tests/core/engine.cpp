@@ -52,9 +52,15 @@ constexpr char kClockGettime[] = "clock_gettime";
 constexpr char kNanosleep[] = "nanosleep";
 #endif
 
+/// SQLite's functions go by another name where SQLite is part of this program.
 template <typename Function>
 Function original(const char* name) {
-  return reinterpret_cast<Function>(dlsym(RTLD_NEXT, name));
+  const support::Uncounted uncounted;
+  void* function = dlsym(RTLD_NEXT, name);
+  if (function == nullptr) {
+    function = dlsym(RTLD_DEFAULT, ("built_in_" + std::string(name)).c_str());
+  }
+  return reinterpret_cast<Function>(function);
 }
 
 int realClock(clockid_t clock, timespec* now) {

@@ -43,6 +43,14 @@ std::string ElfFile::text(std::int64_t tag) const {
   return hasEntry(tag) ? string(number(tag)) : "";
 }
 
+std::vector<std::string> ElfFile::needed() const {
+  std::vector<std::string> names;
+  for (const ElfW(Dyn) & entry : dynamic_) {
+    if (entry.d_tag == DT_NEEDED) names.push_back(string(entry.d_un.d_val));
+  }
+  return names;
+}
+
 bool ElfFile::imports(const std::string& name) const {
   const auto symbols = table<ElfW(Sym)>(SHT_DYNSYM);
   return std::any_of(symbols.begin(), symbols.end(), [&](const ElfW(Sym) & symbol) {

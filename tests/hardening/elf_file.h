@@ -30,6 +30,9 @@ class ElfFile {
   /// The text of a dynamic entry, empty when it is absent.
   [[nodiscard]] std::string text(std::int64_t tag) const;
 
+  /// The libraries that it names, in their order.
+  [[nodiscard]] std::vector<std::string> needed() const;
+
   /// Whether it takes a symbol of this name from another file.
   [[nodiscard]] bool imports(const std::string& name) const;
 

@@ -20,7 +20,10 @@ namespace {
 
 namespace fs = std::filesystem;
 using ::testing::AnyOf;
+using ::testing::Each;
 using ::testing::HasSubstr;
+using ::testing::IsSupersetOf;
+using ::testing::StartsWith;
 
 enum class Kind { kLibrary, kProgram };
 
@@ -101,6 +104,19 @@ std::string nameOf(const ::testing::TestParamInfo<BuiltFile>& file) {
 }
 
 INSTANTIATE_TEST_SUITE_P(BuiltFiles, HardeningTest, ::testing::ValuesIn(builtFiles()), nameOf);
+
+// The static flavour --------------------------------------------------------------
+
+#ifdef HARDENING_STATIC_PROGRAM
+TEST(StaticFlavourTest, LoadsThePlatformAndTheCLibraryOnly) {
+  const ElfFile program(HARDENING_STATIC_PROGRAM);
+  EXPECT_THAT(program.needed(), IsSupersetOf({StartsWith("libkeldcore."), StartsWith("libkeldcgi."),
+                                              StartsWith("libc.")}));
+  EXPECT_THAT(program.needed(),
+              Each(AnyOf(StartsWith("libkeldcore."), StartsWith("libkeldcgi."), StartsWith("libc."),
+                         StartsWith("libm."), StartsWith("ld-linux"))));
+}
+#endif
 
 // Stack protector -----------------------------------------------------------------
 

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Builds two consumers in one of the three ways and runs them in private mounts; or
+# Builds two consumers in one of the four ways and runs them in private mounts; or
 # looks whether every link of the installed documents leads to something.
-# Usage: run.sh BUILD-FOLDER find_package|pkg_config|parent|documents
+# Usage: run.sh BUILD-FOLDER find_package|pkg_config|static|parent|documents
 set -euo pipefail
 
 build=$1
@@ -30,6 +30,14 @@ run_consumers() {
   done
 }
 
+# loads_little PROGRAM...: of all that it was made of, only what is to be shared.
+loads_little() {
+  for program in "$@"; do
+    ! readelf -dW "$program" | grep -E 'NEEDED.*(keldoauth|jsoncpp|sqlite3|stdc|gcc)' ||
+      fail "$program loads that"
+  done
+}
+
 case $way in
   find_package)
     # Whether or not JsonCpp says where it is, without pkg-config, and by a
@@ -51,8 +59,28 @@ case $way in
     eval "flags=($(pkg-config --cflags --libs keldoauth))"
     # The headers are fit for whom warnings are errors.
     g++ -std=c++17 "${strict[@]}" "$here/consumer.cpp" "${flags[@]}" -o "$work/consumer"
-    eval "flags=($(pkg-config --cflags --libs keldoauth-grants))"
+    eval "flags=($(pkg-config --cflags --libs keldoauth-grants keldoauth))"
     g++ -std=c++17 "${strict[@]}" "$here/../../examples/first_login.cpp" "${flags[@]}" -o "$work/login"
+    ;;
+  static)
+    # The program chooses, by a property or by the name of a pkg-config file.
+    cmake -S "$here/find_package" -B "$work" -G Ninja -DCMAKE_PREFIX_PATH="$prefix" \
+      -DCONSUMER_STATIC=ON >/dev/null
+    cmake --build "$work" >/dev/null
+    run_consumers
+    loads_little "$work/consumer" "$work/login"
+    export PKG_CONFIG_PATH=$libraries/pkgconfig
+    eval "flags=($(pkg-config --cflags --libs keldoauth-static))"
+    g++ -std=c++17 "$here/consumer.cpp" "${flags[@]}" -o "$work/consumer"
+    eval "flags=($(pkg-config --cflags --libs keldoauth-grants keldoauth-static))"
+    g++ -std=c++17 "$here/../../examples/first_login.cpp" "${flags[@]}" -o "$work/login"
+    loads_little "$work/consumer" "$work/login"
+    # Both at once would be two copies of SQLite in a process.
+    if cmake -S "$here/find_package" -B "$work/both" -DCMAKE_PREFIX_PATH="$prefix" \
+      -DCONSUMER_STATIC=ON -DCONSUMER_BOTH=ON >/dev/null 2>"$work/refusal"; then
+      fail "a program may link both flavours"
+    fi
+    grep -q KELDOAUTH_FLAVOUR "$work/refusal"
     ;;
   parent)
     cmake -S "$here/parent" -B "$work" -G Ninja -DKELDOAUTH_PLATFORM=standin >/dev/null
