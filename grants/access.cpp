@@ -60,8 +60,8 @@ bool isLive(const TokenRow& token, const Policy& policy, long long now) {
   return token.ends(policy) >= now || token.expires >= now;
 }
 
-// Member by member: an aggregate with conditional texts in it is not taken down
-// rightly by every compiler when memory runs out halfway.
+// Member by member: of an aggregate with another one written out in it, GCC 12
+// destroys the inner members twice when memory runs out behind them.
 
 AccessEntry entryOf(const CodeRow& code, const Names& names, long long now) {
   const bool isOurs = code.isOurs();

@@ -1,6 +1,7 @@
 #include "grants/rows/read_rows.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "core/oauth_errors.h"
 #include "grants/rows/checks.h"
@@ -69,15 +70,19 @@ ApplicationRow applicationOf(const Json::Value& row) {
   const std::string secret = textIn(row, names::kClientSecret);
   const bool isPublic = secret.rfind(kPublicStart, 0) == 0;
   RegistryWords words = unpackWords(textIn(row, names::kRedirectUri));
-  return {
-      {ApplicationId(textIn(row, names::kClientId)),
-       ApplicationName(textIn(row, names::kDisplayName)),
-       isPublic ? ApplicationKind::kPublic : ApplicationKind::kConfidential,
-       row[names::kEnable].asString() == kEnabled, allOf<RedirectAddress>(words.addresses),
-       allOf<LogoutAddress>(words.logoutAddresses), Scope(textIn(row, names::kScope)),
-       isPublic || !words.isPkceOptional, words.registeredItself, decimalValue(row[names::kId])},
-      secret,
-      words};
+  // By a name, not nested: GCC 12 would destroy its members twice when memory
+  // runs out behind it.
+  Application shown{ApplicationId(textIn(row, names::kClientId)),
+                    ApplicationName(textIn(row, names::kDisplayName)),
+                    isPublic ? ApplicationKind::kPublic : ApplicationKind::kConfidential,
+                    row[names::kEnable].asString() == kEnabled,
+                    allOf<RedirectAddress>(words.addresses),
+                    allOf<LogoutAddress>(words.logoutAddresses),
+                    Scope(textIn(row, names::kScope)),
+                    isPublic || !words.isPkceOptional,
+                    words.registeredItself,
+                    decimalValue(row[names::kId])};
+  return {std::move(shown), secret, std::move(words)};
 }
 
 /// What another program stored may be a stranger's text, made up to look like
