@@ -80,7 +80,7 @@ install(FILES
 install(FILES ${CMAKE_CURRENT_BINARY_DIR}/keldoauth.pc
   DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)
 
-file(GLOB documents docs/*.md)
+file(GLOB documents CONFIGURE_DEPENDS docs/*.md)
 # Documents keep their folders, so that they find each other.
 install(FILES README.md CHANGELOG.md LICENSE DESTINATION ${documents_dir} COMPONENT dev)
 install(FILES ${documents} DESTINATION ${documents_dir}/docs COMPONENT dev)
