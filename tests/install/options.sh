@@ -92,7 +92,7 @@ case $subject in
     export PKG_CONFIG_PATH=$lib/pkgconfig
     read -ra flags <<<"$(pkg-config --cflags --libs keldoauth)"
     g++ -std=c++17 "$here/consumer.cpp" "${flags[@]}" -o consumer
-    read -ra flags <<<"$(pkg-config --cflags --libs keldoauth-grants)"
+    read -ra flags <<<"$(pkg-config --cflags --libs keldoauth-grants keldoauth)"
     g++ -std=c++17 "$project/examples/first_login.cpp" "${flags[@]}" -o login
     for program in found/consumer found/login consumer login; do
       LD_LIBRARY_PATH=$lib "./$program"
