@@ -26,7 +26,7 @@ struct Policy {
   int selfRegisteredPart = 2;  // applications that registered themselves: half
                                // of the registry
 
-  // Seconds: 0 to a hundred years; a number outside counts as the nearest ------
+  // Seconds: 0 to a hundred years; a number outside counts as the nearest ---
 
   /// A login that nobody refreshed for so long after its access token expired
   /// is dead.
