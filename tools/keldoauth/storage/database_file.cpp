@@ -21,8 +21,9 @@ constexpr int kPatienceSeconds = 30;
 /// Everything that a table of the store has.
 std::string selectFrom(const schema::Table& table) {
   std::string columns;
-  for (const char* column : table.columns)
+  for (const char* column : table.columns) {
     columns += (columns.empty() ? "" : ",") + std::string(column);
+  }
   return "SELECT " + columns + " FROM " + table.name;
 }
 

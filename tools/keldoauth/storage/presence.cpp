@@ -36,8 +36,9 @@ bool lacksTables() {
   if (opened != SQLITE_OK) return false;
 
   std::string sql = "SELECT 1 FROM sqlite_master WHERE type='table' AND name IN (''";
-  for (const schema::Table* table : schema::kTables)
+  for (const schema::Table* table : schema::kTables) {
     sql.append(",'").append(table->name).append("'");
+  }
   sql += ")";
   bool isFound = false;
   return sqlite3_exec(raw, sql.c_str(), noteRow, &isFound, nullptr) == SQLITE_OK && !isFound;
