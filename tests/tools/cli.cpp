@@ -22,6 +22,8 @@
 #include <sstream>
 
 #include "core/oauth_db_basic.h"
+#include "stores/oauth_grantCode.h"
+#include "stores/oauth_token.h"
 
 namespace cli {
 namespace {
@@ -128,6 +130,7 @@ Arguments commandLine(const std::string& program, const Arguments& arguments) {
 void CliTest::SetUp() {
   World::SetUp();
   ::unsetenv("COLUMNS");
+  ::setenv("SUDO_USER", "carol", 1);
 }
 
 Outcome CliTest::run(const Arguments& arguments, const std::string& input) {
@@ -219,10 +222,35 @@ Json::Value CliTest::issueCode(const Arguments& more) {
 }
 
 Json::Value CliTest::issueToken(const Arguments& more) {
-  Arguments arguments{"token",   "issue",  "--client", "1",      "--username",  "alice",
-                      "--scope", "photos", "--state",  "state1", "--flow-type", "implicit"};
+  Arguments arguments{"token", "issue",   "--client", "1",       "--username",
+                      "alice", "--scope", "photos",   "--state", "state1"};
   arguments.insert(arguments.end(), more.begin(), more.end());
   return json(arguments)["token"];
+}
+
+std::string CliTest::storeForeignCode(const std::string& username, const std::string& scope) {
+  KELDOAUTHSERVER::OAUTHDBGrantCode codes("oauth_grantCode");
+  Json::Value code;
+  codes.Add(username, json({"client", "show", "1"})["client"]["client_id"].asString(), scope,
+            "state1", "192.0.2.1", code);
+  return code["code"].asString();
+}
+
+Json::Value CliTest::storeForeignToken(const std::string& username, const std::string& scope) {
+  KELDOAUTHSERVER::OAUTHDBToken tokens("oauth_token");
+  Json::Value pair;
+  tokens.Add(username, json({"client", "show", "1"})["client"]["client_id"].asString(), scope,
+             "implicit", "state1", "192.0.2.1", pair);
+  return pair;
+}
+
+void CliTest::multiply(const std::string& table, int rows) {
+  const std::string columns = table == "oauth_grantCode"
+                                  ? "code || i, expired_time"
+                                  : "refresh_token, access_token || i, expired_time, flow_type";
+  sql("WITH RECURSIVE n(i) AS (SELECT 2 UNION ALL SELECT i+1 FROM n WHERE i<" +
+      std::to_string(rows) + ") INSERT INTO " + table + " SELECT username, client_id, scope, " +
+      columns + ", state, ip, i FROM " + table + ", n WHERE id=1");
 }
 
 void CliTest::expireIn(const std::string& table, int id, long long seconds) {

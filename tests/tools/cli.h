@@ -83,6 +83,15 @@ class CliTest : public support::World {
   static Json::Value issueCode(const Arguments& more = {});
   static Json::Value issueToken(const Arguments& more = {});
 
+  /// Rows in the clear for client 1, as another program stores them. The code,
+  /// and the pair of tokens.
+  static std::string storeForeignCode(const std::string& username = "alice",
+                                      const std::string& scope = "photos");
+  static Json::Value storeForeignToken(const std::string& username = "alice",
+                                       const std::string& scope = "photos");
+  /// Copies of row 1 of a table of codes or tokens, with ids up to `rows`.
+  static void multiply(const std::string& table, int rows);
+
   /// Moves the expiry of a row to `seconds` from now.
   static void expireIn(const std::string& table, int id, long long seconds);
   static std::string rowCount(const std::string& table);

@@ -36,7 +36,10 @@ TEST_F(ClientCommand, AddAnswersWithTheStoredRow) {
   const Json::Value client = addClient();
   EXPECT_EQ(client["id"], Json::Value(1));
   EXPECT_EQ(client["enabled"], Json::Value(true));
-  EXPECT_EQ(client["redirect_uri"], "frame.example.org/back");
+  EXPECT_EQ(client["redirect_uri"], "https://frame.example.org/back");
+  EXPECT_EQ(client["redirect_uris"].size(), 1U);
+  EXPECT_EQ(client["public"], Json::Value(false));
+  EXPECT_EQ(client["pkce_required"], Json::Value(true));
   EXPECT_EQ(client["scope"], "profile photos");
   EXPECT_EQ(client["display_name"], "Photo Frame");
 }
@@ -52,8 +55,9 @@ TEST_F(ClientCommand, AddTellsPeopleIdentifierAndSecret) {
 }
 
 TEST_F(ClientCommand, AddWritesTheAuditLog) {
-  addClient();
-  EXPECT_EQ(sqlText("SELECT msg FROM oauth_log"), "Application registed[Photo Frame]");
+  const std::string start = addClient()["client_id"].asString().substr(0, 8);
+  EXPECT_EQ(sqlText("SELECT msg FROM oauth_log"),
+            "Application registered[Photo Frame " + start + "] by [carol]");
 }
 
 TEST_F(ClientCommand, AddTakesAnIdentifier) {
@@ -68,8 +72,8 @@ TEST_F(ClientCommand, AddRefusesAnIdentifierThatExists) {
   ASSERT_THAT(run(arguments), ExitsWith(kOk));
   const Outcome again = run(arguments);
   EXPECT_THAT(again, ExitsWith(kRefused));
-  EXPECT_THAT(again.err, HasSubstr("UNIQUE constraint failed: oauth_clientInfo.client_id (19)"));
-  EXPECT_THAT(again.err, HasSubstr("hint: another row has this identifier already"));
+  EXPECT_EQ(again.err, "keldoauth: client add: the identifier is taken (-2)\n");
+  EXPECT_EQ(rowCount("oauth_clientInfo"), "1");
 }
 
 TEST_F(ClientCommand, AddDisabled) {
@@ -115,8 +119,8 @@ TEST_F(ClientCommand, AddNamesTheValueThatIsRefused) {
     std::string hint;
   };
   const std::vector<Case> cases{
-      {addArguments("https://ab", "x", "n"),
-       "--redirect-uri without its scheme: 3 to 2048 bytes, not 2"},
+      {addArguments("app:/" + std::string(2044, 'x'), "x", "n"),
+       "the addresses together: at most 2048 bytes, not 2049"},
       {addArguments("app:/back", "", "n"), "--scope: 1 to 2048 bytes, not 0"},
       {addArguments("app:/back", std::string(2049, 'x'), "n"),
        "--scope: 1 to 2048 bytes, not 2049"},
@@ -125,10 +129,59 @@ TEST_F(ClientCommand, AddNamesTheValueThatIsRefused) {
   for (const Case& refused : cases) {
     const Outcome outcome = run(refused.arguments);
     EXPECT_THAT(outcome, ExitsWith(kRefused));
-    EXPECT_EQ(outcome.err,
-              "keldoauth: client add: Bad parameters (-2)\nhint: " + refused.hint + "\n");
+    EXPECT_THAT(outcome.err, StartsWith("keldoauth: client add: "));
+    EXPECT_THAT(outcome.err, EndsWith(" (-2)\nhint: " + refused.hint + "\n"));
   }
   EXPECT_EQ(rowCount("oauth_clientInfo"), "0");
+}
+
+TEST_F(ClientCommand, AddRefusesAnAddressThatIsNone) {
+  for (const char* address : {"nowhere", "https://two words", "https://x\x1b"}) {
+    const Outcome outcome = run(addArguments(address, "x", "n"));
+    EXPECT_THAT(outcome, ExitsWith(kRefused));
+    EXPECT_THAT(outcome.err, HasSubstr("hint: an address has a scheme, such as https://"));
+  }
+  EXPECT_EQ(rowCount("oauth_clientInfo"), "0");
+}
+
+TEST_F(ClientCommand, AddTakesSeveralAddresses) {
+  Arguments arguments = addArguments("https://a.example.org", "x", "n");
+  arguments.insert(arguments.end(), {"--redirect-uri", "app:/b", "--logout-uri", "https://out"});
+  const Json::Value client = json(arguments)["client"];
+  EXPECT_EQ(client["redirect_uri"], "https://a.example.org app:/b");
+  EXPECT_EQ(client["redirect_uris"][1], "app:/b");
+  EXPECT_EQ(client["logout_uris"][0], "https://out");
+  EXPECT_EQ(shown(client)["redirect_uris"], client["redirect_uris"]);
+}
+
+TEST_F(ClientCommand, AddNeedsAnAddressOrTheWordThatThereIsNone) {
+  EXPECT_THAT(run({"client", "add", "--scope", "x", "--name", "n"}), ExitsWith(kUsage));
+  EXPECT_THAT(run({"client", "add", "--scope", "x", "--name", "n", "--no-redirect-uri",
+                   "--redirect-uri", "app:/"}),
+              ExitsWith(kUsage));
+  EXPECT_EQ(json({"client", "add", "--scope", "x", "--name", "n",
+                  "--no-redirect-uri"})["client"]["redirect_uris"],
+            Json::Value(Json::arrayValue));
+}
+
+TEST_F(ClientCommand, APublicClientHasNoSecret) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.emplace_back("--public");
+  const Json::Value client = json(arguments)["client"];
+  EXPECT_EQ(client["public"], Json::Value(true));
+  EXPECT_EQ(client["client_secret"], Json::Value());
+  EXPECT_THAT(run({"client", "show", "1", "--reveal"}).out,
+              HasSubstr("client secret  none, it is public\n"));
+  EXPECT_THAT(run({"client", "renew-secret", "1", "--yes"}), ExitsWith(kRefused));
+}
+
+TEST_F(ClientCommand, PkceIsRequiredUnlessSaidOtherwise) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--pkce", "optional"});
+  EXPECT_EQ(json(arguments)["client"]["pkce_required"], Json::Value(false));
+  EXPECT_EQ(json({"client", "edit", "1", "--pkce", "required"})["client"]["pkce_required"],
+            Json::Value(true));
+  EXPECT_THAT(run({"client", "edit", "1", "--pkce", "maybe"}), ExitsWith(kUsage));
 }
 
 TEST_F(ClientCommand, AddNamesASecretOfAnotherLength) {
@@ -205,12 +258,46 @@ TEST_F(ClientCommand, ADigitsOnlyIdentifierIsNoRowId) {
   EXPECT_EQ(json({"client", "show", support::id64('1')})["client"]["id"], Json::Value(1));
 }
 
-TEST_F(ClientCommand, OtherNamesOfClientsAreUsageErrors) {
+TEST_F(ClientCommand, OtherTextsAreNamesOfNoClient) {
   makeStore();
-  for (const std::string client :
-       {"abc", "-1", "1x", "0x1", " 1", "9223372036854775808", "", "+1"}) {
-    EXPECT_THAT(run({"client", "show", "--", client}), ExitsWith(kUsage)) << client;
+  for (const std::string client : {"abc", "-1", "1x", "0x1", " 1", "9223372036854775808", "+1"}) {
+    EXPECT_THAT(run({"client", "show", "--", client}), ExitsWith(kNotFound)) << client;
   }
+  EXPECT_THAT(run({"client", "show", ""}), ExitsWith(kUsage));
+}
+
+TEST_F(ClientCommand, ShowByName) {
+  const Json::Value client = addClient("O'Neil's frame");
+  EXPECT_EQ(json({"client", "show", "O'Neil's frame"})["client"], shown(client));
+}
+
+TEST_F(ClientCommand, ANameThatSeveralHaveIsRefusedWithTheList) {
+  const std::string first = addClient()["client_id"].asString().substr(0, 6);
+  const std::string second = addClient()["client_id"].asString().substr(0, 6);
+  const Outcome outcome = run({"client", "remove", "Photo Frame", "--yes"});
+  EXPECT_THAT(outcome, ExitsWith(kUsage));
+  EXPECT_EQ(outcome.err,
+            "keldoauth: client remove: 2 clients are named Photo Frame\n"
+            "hint: name one by its row id: 1 (" +
+                first + "…), 2 (" + second + "…)\n");
+  EXPECT_EQ(rowCount("oauth_clientInfo"), "2");
+}
+
+TEST_F(ClientCommand, DigitsAreARowIdAndNeverAName) {
+  addClient("Photo Frame");
+  addClient("1");
+  EXPECT_EQ(json({"client", "show", "1"})["client"]["display_name"], "Photo Frame");
+  addClient("7");
+  EXPECT_THAT(run({"client", "show", "7"}), ExitsWith(kNotFound));
+}
+
+TEST_F(ClientCommand, AnIdentifierGoesBeforeANameThatLooksLikeIt) {
+  Arguments arguments = addArguments("app:/back", "x", "Player");
+  arguments.insert(arguments.end(), {"--client-id", support::id64('c')});
+  ASSERT_THAT(run(arguments), ExitsWith(kOk));
+  addClient("Other");
+  sql("UPDATE oauth_clientInfo SET display_name='" + support::id64('c') + "' WHERE id=2");
+  EXPECT_EQ(json({"client", "show", support::id64('c')})["client"]["id"], Json::Value(1));
 }
 
 // edit --------------------------------------------------------------------------
@@ -260,7 +347,29 @@ TEST_F(ClientCommand, EditNamesTheValueThatIsRefused) {
   const Outcome refused = run({"client", "edit", "1", "--name", ""});
   EXPECT_THAT(refused, ExitsWith(kRefused));
   EXPECT_EQ(refused.err,
-            "keldoauth: client edit: Bad parameters (-2)\nhint: --name: 1 to 64 bytes, not 0\n");
+            "keldoauth: client edit: a value is too short or too long (-2)\n"
+            "hint: --name: 1 to 64 bytes, not 0\n");
+}
+
+TEST_F(ClientCommand, EditTakesOtherAddresses) {
+  addClient();
+  const Json::Value after = json(
+      {"client", "edit", "--redirect-uri", "app:/a", "--redirect-uri", "app:/b", "1"})["client"];
+  EXPECT_EQ(after["redirect_uri"], "app:/a app:/b");
+  EXPECT_EQ(json({"client", "edit", "1", "--no-redirect-uri"})["client"]["redirect_uri"], "");
+}
+
+// renew-secret --------------------------------------------------------------------
+
+TEST_F(ClientCommand, RenewSecretTellsAnother) {
+  const std::string before = addClient()["client_secret"].asString();
+  const Json::Value client = json({"client", "renew-secret", "Photo Frame", "--yes"})["client"];
+  EXPECT_THAT(client["client_secret"].asString(), MatchesRegex("[0-9a-f]{64}"));
+  EXPECT_NE(client["client_secret"], before);
+  EXPECT_EQ(json({"client", "show", "1", "--reveal"})["client"]["client_secret"],
+            client["client_secret"]);
+  EXPECT_THAT(run({"client", "renew-secret", "1", "-y"}).out,
+              StartsWith("Renewed the secret of client 1 (Photo Frame).\n"));
 }
 
 // enable, disable, remove ---------------------------------------------------------
@@ -292,13 +401,51 @@ TEST_F(ClientCommand, RemoveTakesTheRowAway) {
   EXPECT_EQ(sqlText("SELECT display_name FROM oauth_clientInfo"), "Player");
 }
 
-TEST_F(ClientCommand, RemoveLeavesCodesAndTokens) {
+TEST_F(ClientCommand, RemoveTakesCodesAndTokens) {
   addClient();
   issueCode();
   issueToken();
-  EXPECT_EQ(run({"client", "remove", "1", "-y"}).out, "Removed client 1 (Photo Frame).\n");
-  EXPECT_EQ(rowCount("oauth_grantCode"), "1");
-  EXPECT_EQ(rowCount("oauth_token"), "1");
+  EXPECT_EQ(run({"client", "remove", "1", "-y"}).out,
+            "Removed client 1 (Photo Frame) with 1 code and 1 token.\n");
+  EXPECT_EQ(rowCount("oauth_grantCode"), "0");
+  EXPECT_EQ(rowCount("oauth_token"), "0");
+}
+
+TEST_F(ClientCommand, RevokeEndsWhatItHasAndKeepsIt) {
+  addClient();
+  addClient("Player");
+  issueCode();
+  issueToken();
+  ASSERT_THAT(
+      run({"token", "issue", "--client", "Player", "--username", "alice", "--scope", "photos"}),
+      ExitsWith(kOk));
+  EXPECT_EQ(run({"client", "revoke", "Photo Frame", "--yes"}).out,
+            "Revoked 1 code and 1 token of client 1 (Photo Frame).\n");
+  EXPECT_EQ(rowCount("oauth_clientInfo"), "2");
+  EXPECT_EQ(rowCount("oauth_grantCode"), "0");
+  EXPECT_EQ(json({"token", "list"})["tokens"][0]["client_name"], "Player");
+  const Json::Value again = json({"client", "revoke", "1", "--yes"});
+  EXPECT_EQ(again["codes"], Json::Value(0));
+  EXPECT_EQ(again["tokens"], Json::Value(0));
+}
+
+TEST_F(ClientCommand, EveryChangeIsInTheAuditLogWithItsAuthor) {
+  addClient();
+  issueToken();
+  ::setenv("SUDO_USER", "mallory] by [root", 1);
+  for (const char* verb : {"disable", "enable"}) run({"client", verb, "1"});
+  run({"client", "edit", "1", "--scope", "photos"});
+  for (const char* verb : {"renew-secret", "revoke", "remove"}) run({"client", verb, "1", "-y"});
+  std::vector<std::string> found;
+  for (const support::Row& row : sql("SELECT msg FROM oauth_log ORDER BY id")) {
+    const std::string msg = row.at("msg");
+    EXPECT_THAT(msg, EndsWith(found.empty() ? "] by [carol]" : "] by [mallory) by (root]"));
+    found.push_back(msg.substr(0, msg.find('[')));
+  }
+  EXPECT_THAT(found,
+              testing::ElementsAre("Application registered", "Application disabled",
+                                   "Application enabled", "Application changed", "Secret renewed",
+                                   "All access ended", "Application removed"));
 }
 
 TEST_F(ClientCommand, RemoveOfAnUnknownClientDoesNotAsk) {

@@ -86,11 +86,30 @@ TEST_F(CodeCommand, IssueToAnUnknownClient) {
   EXPECT_EQ(rowCount(kTable), "0");
 }
 
-TEST_F(CodeCommand, IssueToADisabledClientIsNoted) {
+TEST_F(CodeCommand, IssueToADisabledClientIsRefused) {
   run({"client", "disable", "1"});
   const Outcome issued = run(issueArguments());
-  EXPECT_THAT(issued, ExitsWith(kOk));
-  EXPECT_EQ(issued.err, "keldoauth: note: client 1 is disabled\n");
+  EXPECT_THAT(issued, ExitsWith(kRefused));
+  EXPECT_EQ(issued.err, "keldoauth: code issue: the application is disabled\n");
+  EXPECT_EQ(rowCount(kTable), "0");
+}
+
+TEST_F(CodeCommand, IssueByTheNameOfTheClient) {
+  Arguments arguments = issueArguments();
+  arguments[3] = "Photo Frame";
+  EXPECT_EQ(json(arguments)["code"]["client_name"], "Photo Frame");
+}
+
+TEST_F(CodeCommand, IssueNeedsAScopeOfTheClients) {
+  Arguments arguments = issueArguments();
+  arguments[7] = "photos everything";
+  EXPECT_THAT(run(arguments), ExitsWith(kRefused));
+  EXPECT_EQ(rowCount(kTable), "0");
+}
+
+TEST_F(CodeCommand, IssueKeepsNoUsableCode) {
+  const std::string code = issueCode()["code"].asString();
+  EXPECT_THAT(readFile(kDatabase), Not(HasSubstr(code)));
 }
 
 TEST_F(CodeCommand, IssueNamesTheValueThatIsRefused) {
@@ -103,14 +122,14 @@ TEST_F(CodeCommand, IssueNamesTheValueThatIsRefused) {
       {5, "", "--username: 1 to 256 bytes, not 0"},
       {5, std::string(257, 'u'), "--username: 1 to 256 bytes, not 257"},
       {7, std::string(2049, 's'), "--scope: 1 to 2048 bytes, not 2049"},
-      {9, "", "--state: 1 to 2048 bytes, not 0"},
+      {9, std::string(513, 's'), "--state: at most 512 bytes, not 513"},
   };
   for (const Case& refused : cases) {
     Arguments arguments = issueArguments();
     arguments[refused.position] = refused.value;
     const Outcome outcome = run(arguments);
     EXPECT_THAT(outcome, ExitsWith(kRefused));
-    EXPECT_EQ(outcome.err, "keldoauth: code issue: refused, without an error code\nhint: " +
+    EXPECT_EQ(outcome.err, "keldoauth: code issue: a value is too short or too long (-2)\nhint: " +
                                refused.hint + "\n");
   }
 }
@@ -120,16 +139,28 @@ TEST_F(CodeCommand, IssueNamesABadAddress) {
   arguments.insert(arguments.end(), {"--ip", "999.1.1.1"});
   const Outcome refused = run(arguments);
   EXPECT_THAT(refused, ExitsWith(kRefused));
-  EXPECT_THAT(refused.err, HasSubstr("hint: --ip: neither an IPv4 nor an IPv6 address\n"));
+  EXPECT_EQ(refused.err, "keldoauth: code issue: the IP address is none (-2)\n");
 }
 
 TEST_F(CodeCommand, IssueToAFullTable) {
   writeSettings(R"({"grantcode_max": 1})");
+  addClient("Player");
   issueCode();
-  const Outcome full = run(issueArguments());
+  Arguments arguments = issueArguments();
+  arguments[3] = "Player";
+  arguments[5] = "bob";
+  const Outcome full = run(arguments);
   EXPECT_THAT(full, ExitsWith(kRefused));
-  EXPECT_THAT(full.err, HasSubstr("code issue: GrantCode Table is full (-5)\n"));
-  EXPECT_THAT(full.err, HasSubstr("keldoauth code purge"));
+  EXPECT_EQ(full.err,
+            "keldoauth: code issue: GrantCode Table is full (-5)\n"
+            "hint: nothing in it is dead: end or remove what nobody needs, or raise grantcode_max "
+            "in the settings (at most 10000)\n");
+}
+
+TEST_F(CodeCommand, IssueBeyondAUsersShareTakesTheUsersOldest) {
+  for (int i = 0; i < 4; ++i) issueCode();
+  EXPECT_EQ(rowCount(kTable), "3");
+  EXPECT_THAT(run({"code", "show", "1"}), ExitsWith(kNotFound));
 }
 
 // list and show -------------------------------------------------------------------
@@ -142,15 +173,14 @@ TEST_F(CodeCommand, ListIsATable) {
   issueCode();
   const std::vector<std::string> shown = lines(run({"code", "list"}).out);
   ASSERT_THAT(shown, SizeIs(2));
-  EXPECT_THAT(shown[0], MatchesRegex("ID +USERNAME +CLIENT ID +SCOPE +CODE +EXPIRES +LEFT"));
-  EXPECT_THAT(shown[1], MatchesRegex("1 +alice +[0-9a-f]{64} +photos +[0-9a-f]{6}… "
-                                     " 20..-..-..T..:..:..Z  (10m|9m 5.s)"));
+  EXPECT_THAT(shown[0], MatchesRegex("ID +USERNAME +CLIENT +SCOPE +EXPIRES +LEFT"));
+  EXPECT_THAT(shown[1], MatchesRegex("1 +alice +Photo Frame +photos +20..-..-..T..:..:..Z +"
+                                     "(10m|9m 5.s)"));
 }
 
-TEST_F(CodeCommand, ListMasksCodes) {
-  const std::string code = issueCode()["code"].asString();
-  EXPECT_EQ(json({"code", "list"})["codes"][0]["code"], code.substr(0, 6) + kMask);
-  EXPECT_EQ(json({"code", "list", "--reveal"})["codes"][0]["code"], code);
+TEST_F(CodeCommand, ListHasNoCodesBecauseNobodyKeepsThem) {
+  issueCode();
+  EXPECT_EQ(json({"code", "list"})["codes"][0]["code"], Json::Value());
 }
 
 TEST_F(CodeCommand, ListMarksExpiredCodes) {
@@ -162,11 +192,14 @@ TEST_F(CodeCommand, ListMarksExpiredCodes) {
 
 TEST_F(CodeCommand, ListOfOneUser) {
   issueCode();
-  issueCode({"--expires-in", "5"});
-  sql("UPDATE oauth_grantCode SET username='O''''Neil' WHERE id=2");
+  storeForeignCode("O'Neil");
+  storeForeignCode("x");
+  sql("UPDATE oauth_grantCode SET username='O''Neil' WHERE id=3");
   const Json::Value listed = json({"code", "list", "--username", "O'Neil"})["codes"];
-  ASSERT_EQ(listed.size(), 1U);
-  EXPECT_EQ(listed[0]["username"], "O''Neil");
+  ASSERT_EQ(listed.size(), 2U);
+  EXPECT_EQ(listed[0]["username"], "O'Neil");
+  EXPECT_EQ(listed[1]["username"], "O'Neil");
+  EXPECT_EQ(listed[1]["foreign"], Json::Value(true));
 }
 
 TEST_F(CodeCommand, ListOfOneClient) {
@@ -182,9 +215,12 @@ TEST_F(CodeCommand, ListOfOneClient) {
 
 TEST_F(CodeCommand, ListOfARemovedClient) {
   issueCode();
-  run({"client", "remove", "1", "--yes"});
+  sql("DELETE FROM oauth_clientInfo");
   const std::string identifier = client_["client_id"].asString();
-  EXPECT_EQ(json({"code", "list", "--client", identifier})["codes"].size(), 1U);
+  const Json::Value codes = json({"code", "list", "--client", identifier})["codes"];
+  ASSERT_EQ(codes.size(), 1U);
+  EXPECT_EQ(codes[0]["client_name"], Json::Value());
+  EXPECT_THAT(run({"code", "list"}).out, HasSubstr("removed " + identifier.substr(0, 6) + "…"));
 }
 
 TEST_F(CodeCommand, ListOfExpiredOnes) {
@@ -198,9 +234,8 @@ TEST_F(CodeCommand, ListOfExpiredOnes) {
 
 TEST_F(CodeCommand, ShowByRowIdAndByCode) {
   const std::string code = issueCode()["code"].asString();
-  EXPECT_EQ(shown("1")["code"], code.substr(0, 6) + kMask);
   EXPECT_EQ(json({"code", "show", "--code-file", "-"}, code + "\n")["code"], shown("1"));
-  EXPECT_EQ(json({"code", "show", "1", "--reveal"})["code"]["code"], code);
+  EXPECT_EQ(shown("1")["code"], Json::Value());
 }
 
 TEST_F(CodeCommand, ShowNeedsExactlyOneName) {
@@ -215,17 +250,24 @@ TEST_F(CodeCommand, ShowOfAnUnknownCode) {
   EXPECT_THAT(run({"code", "show", "--code-file", "-"}, support::id64('a')), ExitsWith(kNotFound));
 }
 
-TEST_F(CodeCommand, ShowOfACodeOfAnotherLength) {
-  const Outcome outcome = run({"code", "show", "--code-file", "-"}, "abc");
+TEST_F(CodeCommand, ShowOfATextThatIsNoCode) {
+  EXPECT_THAT(run({"code", "show", "--code-file", "-"}, "abc"), ExitsWith(kNotFound));
+  const Outcome outcome = run({"code", "show", "--code-file", "-"}, "\n");
   EXPECT_THAT(outcome, ExitsWith(kRefused));
-  EXPECT_EQ(outcome.err,
-            "keldoauth: code show: Bad parameters (-2)\nhint: the code: 64 bytes, not 3\n");
+  EXPECT_EQ(outcome.err, "keldoauth: code show: Code: the text is empty\n");
+}
+
+TEST_F(CodeCommand, WhatStandsInTheFileIsNoCode) {
+  issueCode();
+  const std::string stored = sqlText("SELECT code FROM oauth_grantCode");
+  EXPECT_THAT(run({"code", "show", "--code-file", "-"}, stored), ExitsWith(kNotFound));
+  EXPECT_THAT(run({"code", "redeem"}, stored), ExitsWith(kInvalid));
 }
 
 TEST_F(CodeCommand, ShowOfAnExpiryThatIsNoNumber) {
   issueCode();
   sql("UPDATE oauth_grantCode SET expired_time='never'");
-  EXPECT_EQ(shown("1")["expired_time"], "never");
+  EXPECT_EQ(shown("1")["expired_time"], Json::Value(0));
   EXPECT_EQ(shown("1")["expires_at"], "1970-01-01T00:00:00Z");
   EXPECT_EQ(shown("1")["expired"], Json::Value(true));
 }
@@ -250,15 +292,26 @@ TEST_F(CodeCommand, TimesBeyond2038) {
 // edit ----------------------------------------------------------------------------
 
 TEST_F(CodeCommand, EditChangesWhatIsGiven) {
-  issueCode();
+  storeForeignCode();
   support::Row expected = row(1);
   expected["scope"] = "all";
   EXPECT_EQ(json({"code", "edit", "1", "--scope", "all"})["code"]["scope"], "all");
   EXPECT_EQ(row(1), expected);
 }
 
-TEST_F(CodeCommand, EditOfTheExpiryKeepsQuotesAsTheyAre) {
+TEST_F(CodeCommand, EditOfTheServicesOwnCodeIsRefused) {
   issueCode();
+  const support::Row before = row(1);
+  const Outcome refused = run({"code", "edit", "1", "--scope", "all"});
+  EXPECT_THAT(refused, ExitsWith(kRefused));
+  EXPECT_EQ(refused.err,
+            "keldoauth: code edit: code 1 was issued by this service, and says what was agreed to\n"
+            "hint: end it ('keldoauth code revoke 1'), and issue another\n");
+  EXPECT_EQ(row(1), before);
+}
+
+TEST_F(CodeCommand, EditOfTheExpiryKeepsQuotesAsTheyAre) {
+  storeForeignCode();
   for (const std::string name : {"O''Neil", "O''''Neil"}) {
     sql("UPDATE oauth_grantCode SET username='" + name + "'");
     support::Row expected = row(1);
@@ -270,14 +323,14 @@ TEST_F(CodeCommand, EditOfTheExpiryKeepsQuotesAsTheyAre) {
 }
 
 TEST_F(CodeCommand, EditToAnotherClient) {
-  issueCode();
+  storeForeignCode();
   const Json::Value other = addClient("Player");
   EXPECT_EQ(json({"code", "edit", "1", "--client", "2"})["code"]["client_id"], other["client_id"]);
   EXPECT_THAT(run({"code", "edit", "1", "--client", "3"}), ExitsWith(kNotFound));
 }
 
 TEST_F(CodeCommand, EditThatIsRefusedChangesNothing) {
-  issueCode();
+  storeForeignCode();
   const support::Row before = row(1);
   const Outcome refused = run({"code", "edit", "1", "--state", "", "--expires-in", "5"});
   EXPECT_THAT(refused, ExitsWith(kRefused));
@@ -294,14 +347,47 @@ TEST_F(CodeCommand, EditWithoutAChangeAndOfAnUnknownCode) {
 
 TEST_F(CodeCommand, RedeemOnce) {
   const std::string code = issueCode()["code"].asString();
-  const Json::Value redeemed = json({"code", "redeem"}, code)["code"];
-  EXPECT_EQ(redeemed["username"], "alice");
-  EXPECT_EQ(redeemed["client_id"], client_["client_id"]);
-  EXPECT_EQ(rowCount(kTable), "0");
+  const Json::Value answer = json({"code", "redeem"}, code);
+  EXPECT_EQ(answer["code"]["username"], "alice");
+  EXPECT_EQ(answer["code"]["client_id"], client_["client_id"]);
+  EXPECT_EQ(answer["token"]["username"], "alice");
+  EXPECT_EQ(answer["token"]["state"], "state1");
+  EXPECT_THAT(run({"token", "verify"}, answer["token"]["access_token"].asString()), ExitsWith(kOk));
+  EXPECT_EQ(json({"code", "list"})["codes"].size(), 0U);
+  EXPECT_EQ(json({"code", "list", "--redeemed"})["codes"][0]["kind"], "redeemed");
 
   const Outcome again = run({"code", "redeem"}, code);
   EXPECT_THAT(again, ExitsWith(kInvalid));
-  EXPECT_EQ(again.err, "keldoauth: code redeem: code is unknown or was redeemed before\n");
+  EXPECT_EQ(again.err, "keldoauth: code redeem: the code is not good: it was used before\n");
+}
+
+TEST_F(CodeCommand, RedeemNeedsTheAddressThatTheCodeWasAskedWith) {
+  const std::string code =
+      issueCode({"--redirect-uri", "https://frame.example.org/back"})["code"].asString();
+  EXPECT_THAT(run({"code", "redeem"}, code), ExitsWith(kInvalid));
+  EXPECT_THAT(run({"code", "redeem", "--redirect-uri", "https://frame.example.org/"}, code),
+              ExitsWith(kInvalid));
+  EXPECT_THAT(run({"code", "redeem", "--redirect-uri", "https://frame.example.org/back"}, code),
+              ExitsWith(kOk));
+}
+
+TEST_F(CodeCommand, RedeemRefusesACodeOfADisabledOrRemovedClient) {
+  const std::string code = issueCode()["code"].asString();
+  run({"client", "disable", "1"});
+  const Outcome disabled = run({"code", "redeem"}, code);
+  EXPECT_THAT(disabled, ExitsWith(kInvalid));
+  EXPECT_EQ(disabled.err,
+            "keldoauth: code redeem: the code is not good: the application is disabled\n");
+  sql("DELETE FROM oauth_clientInfo");
+  EXPECT_THAT(run({"code", "redeem"}, code), ExitsWith(kInvalid));
+}
+
+TEST_F(CodeCommand, RedeemRefusesAnotherProgramsCode) {
+  const std::string code = storeForeignCode();
+  const Outcome outcome = run({"code", "redeem"}, code);
+  EXPECT_THAT(outcome, ExitsWith(kInvalid));
+  EXPECT_THAT(outcome.err, HasSubstr("it was issued by another program"));
+  EXPECT_EQ(rowCount(kTable), "1");
 }
 
 TEST_F(CodeCommand, RedeemOnceOfEightAtTheSameMoment) {
@@ -309,7 +395,7 @@ TEST_F(CodeCommand, RedeemOnceOfEightAtTheSameMoment) {
   const Outcome all = runEightTimes({"code", "redeem"}, code);
   EXPECT_THAT(lines(all.out), testing::Contains("Redeemed code 1 of alice.").Times(1));
   EXPECT_THAT(lines(all.err), SizeIs(7));
-  EXPECT_THAT(lines(all.err), testing::Each(HasSubstr("redeemed before")));
+  EXPECT_THAT(lines(all.err), testing::Each(HasSubstr("used before")));
 }
 
 TEST_F(CodeCommand, RedeemFromAFile) {
@@ -328,7 +414,7 @@ TEST_F(CodeCommand, RedeemRefusesAnExpiredCodeAndKeepsIt) {
   expireIn(kTable, 1, -1);
   const Outcome expired = run({"code", "redeem"}, code);
   EXPECT_THAT(expired, ExitsWith(kInvalid));
-  EXPECT_EQ(expired.err, "keldoauth: code redeem: code is expired\n");
+  EXPECT_EQ(expired.err, "keldoauth: code redeem: the code is not good: it has expired\n");
   EXPECT_EQ(rowCount(kTable), "1");
 }
 
@@ -339,17 +425,56 @@ TEST_F(CodeCommand, RedeemRefusesACodeThatWasJustRevoked) {
 }
 
 TEST_F(CodeCommand, RedeemTellsABadLookupFromABadCode) {
-  EXPECT_THAT(run({"code", "redeem"}, "abc"), ExitsWith(kRefused));
+  EXPECT_THAT(run({"code", "redeem"}, "abc"), ExitsWith(kInvalid));
+  EXPECT_THAT(run({"code", "redeem"}, ""), ExitsWith(kRefused));
+  sql("DROP TABLE oauth_grantCode; CREATE VIEW oauth_grantCode AS SELECT * FROM missing");
+  EXPECT_THAT(run({"code", "redeem"}, "abc"), ExitsWith(kUnavailable));
 }
 
 // revoke and remove ---------------------------------------------------------------
 
-TEST_F(CodeCommand, RevokeLetsItExpireAndKeepsTheRow) {
+TEST_F(CodeCommand, RevokeEndsIt) {
   issueCode();
-  const Json::Value revoked = json({"code", "revoke", "1", "--yes"})["code"];
-  EXPECT_EQ(revoked["expired"], Json::Value(true));
-  EXPECT_LE(revoked["expired_time"].asInt64(), ::time(nullptr));
-  EXPECT_EQ(rowCount(kTable), "1");
+  const Json::Value answer = json({"code", "revoke", "1", "--yes"});
+  EXPECT_EQ(answer["code"]["id"], Json::Value(1));
+  EXPECT_EQ(answer["ended"], Json::Value(1));
+  EXPECT_EQ(rowCount(kTable), "0");
+}
+
+TEST_F(CodeCommand, RevokeSeveral) {
+  for (int i = 0; i < 3; ++i) issueCode();
+  const Json::Value answer = json({"code", "revoke", "1", "3", "1", "--yes"});
+  EXPECT_EQ(answer["ended"], Json::Value(2));
+  EXPECT_EQ(answer["codes"].size(), 2U);
+  EXPECT_EQ(sqlText("SELECT id FROM oauth_grantCode"), "2");
+}
+
+TEST_F(CodeCommand, RevokeOfAUserLeavesOthersAndTokens) {
+  issueCode();
+  storeForeignCode("bob");
+  issueToken();
+  EXPECT_EQ(run({"code", "revoke", "--username", "alice", "--yes"}).out, "Revoked 1 code.\n");
+  EXPECT_EQ(sqlText("SELECT username FROM oauth_grantCode"), "bob");
+  EXPECT_EQ(rowCount("oauth_token"), "1");
+}
+
+TEST_F(CodeCommand, RevokeOfAllLeavesTokens) {
+  issueCode();
+  storeForeignCode("bob");
+  issueToken();
+  EXPECT_EQ(json({"code", "revoke", "--all", "-y"})["ended"], Json::Value(2));
+  EXPECT_EQ(rowCount(kTable), "0");
+  EXPECT_EQ(rowCount("oauth_token"), "1");
+  EXPECT_EQ(run({"code", "revoke", "--all"}).out, "There is nothing to revoke.\n");
+}
+
+TEST_F(CodeCommand, RevokeNeedsOneWayOfNaming) {
+  for (const Arguments& command :
+       {Arguments{"code", "revoke"}, Arguments{"code", "revoke", "1", "--all"},
+        Arguments{"code", "revoke", "--all", "--username", "x"},
+        Arguments{"code", "revoke", "1", "--code-file", "-"}}) {
+    EXPECT_THAT(run(command, "x"), ExitsWith(kUsage));
+  }
 }
 
 TEST_F(CodeCommand, RevokeByCode) {
@@ -358,14 +483,21 @@ TEST_F(CodeCommand, RevokeByCode) {
               HasSubstr("Revoked code 1 of alice"));
 }
 
-TEST_F(CodeCommand, RemoveTakesTheRowAway) {
+TEST_F(CodeCommand, RemoveTakesDeadAndRedeemedRowsToo) {
+  ASSERT_THAT(run({"code", "redeem"}, issueCode()["code"].asString()), ExitsWith(kOk));
   issueCode();
-  EXPECT_EQ(json({"code", "remove", "1", "--yes"})["code"]["id"], Json::Value(1));
+  expireIn(kTable, 2, -5);
+  EXPECT_EQ(json({"code", "remove", "1", "--yes"})["code"]["kind"], "redeemed");
+  EXPECT_EQ(run({"code", "remove", "2", "--yes"}).out,
+            "Removed code 2 of alice; its row is gone.\n");
   EXPECT_EQ(rowCount(kTable), "0");
 }
 
 TEST_F(CodeCommand, RevokeAndRemoveOfAnUnknownCode) {
+  issueCode();
   EXPECT_THAT(run({"code", "revoke", "4", "--yes"}), ExitsWith(kNotFound));
+  EXPECT_THAT(run({"code", "revoke", "1", "4", "--yes"}), ExitsWith(kNotFound));
+  EXPECT_EQ(rowCount(kTable), "1");
   EXPECT_THAT(run({"code", "remove", "4", "--yes"}), ExitsWith(kNotFound));
 }
 
@@ -378,6 +510,7 @@ TEST_F(CodeCommand, PurgeRemovesWhatExpired) {
   const Json::Value answer = json({"code", "purge", "--yes"});
   ASSERT_EQ(answer["purged"].size(), 1U);
   EXPECT_EQ(answer["purged"][0]["id"], Json::Value(1));
+  EXPECT_EQ(answer["count"], Json::Value(1));
   EXPECT_EQ(answer["dry_run"], Json::Value(false));
   EXPECT_EQ(sqlText("SELECT id FROM oauth_grantCode"), "2");
 }

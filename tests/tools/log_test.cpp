@@ -91,7 +91,7 @@ TEST_F(LogCommand, ListOfMatchingEntries) {
   write({"client added", "client removed", "it's 100%"});
   EXPECT_THAT(listed({"--contains", "removed"}), testing::ElementsAre("client removed"));
   EXPECT_THAT(listed({"--contains", "c%d"}), SizeIs(2));
-  EXPECT_THAT(listed({"--contains", "'"}), testing::ElementsAre("it''s 100%"));
+  EXPECT_THAT(listed({"--contains", "'"}), testing::ElementsAre("it's 100%"));
   EXPECT_THAT(listed({"--contains", "client", "--last", "1"}),
               testing::ElementsAre("client removed"));
 }
@@ -108,10 +108,47 @@ TEST_F(LogCommand, ListWithABadCount) {
   }
 }
 
-TEST_F(LogCommand, ClearDeletesAll) {
+TEST_F(LogCommand, ClearDeletesAllAndSaysWhoDidIt) {
   write({"one", "two"});
   EXPECT_EQ(json({"log", "clear", "--yes"})["cleared"], Json::Value(2));
-  EXPECT_EQ(rowCount("oauth_log"), "0");
+  EXPECT_EQ(sqlText("SELECT msg FROM oauth_log"), "Audit log cleared by [carol]");
+}
+
+TEST_F(LogCommand, ListOfATime) {
+  write({"one", "two", "three"});
+  EXPECT_THAT(listed({"--since", "1970-01-01T00:03:20Z"}), testing::ElementsAre("two", "three"));
+  EXPECT_THAT(listed({"--until", "1970-01-01 00:03:20"}), testing::ElementsAre("one", "two"));
+  EXPECT_THAT(listed({"--since", "1970-01-01T00:02", "--until", "1970-01-01T00:04"}),
+              testing::ElementsAre("two"));
+  EXPECT_THAT(listed({"--since", "1970-01-02"}), SizeIs(0));
+}
+
+TEST_F(LogCommand, ListOfTheLastHour) {
+  write({"old"});
+  ASSERT_THAT(add("new"), ExitsWith(kOk));
+  EXPECT_THAT(listed({"--since", "1h"}), testing::ElementsAre("new"));
+  EXPECT_THAT(listed({"--since", "1w 2d 3h4m5s"}), testing::ElementsAre("new"));
+  EXPECT_THAT(listed({"--until", "1h"}), testing::ElementsAre("old"));
+}
+
+TEST_F(LogCommand, ListOfATimeThatIsNone) {
+  makeStore();
+  for (const std::string text : {"", "1", "h", "1x", "-1h", "1 h", "yesterday", "2026-02-30",
+                                 "2026-13-01", "2026-01-01T25:00", "2026-01-01T", "26-01-01",
+                                 "1969-12-31", "99999999999999999999d", "2026-01-31T08:15+01"}) {
+    const Outcome outcome = run({"log", "list", "--since=" + text});
+    EXPECT_THAT(outcome, ExitsWith(kUsage)) << text;
+  }
+}
+
+TEST_F(LogCommand, LongEntriesGoOnInTheNextLine) {
+  ::setenv("COLUMNS", "40", 1);
+  write({"one two three four five"});
+  EXPECT_EQ(run({"log", "list"}).out,
+            "TIME                  MESSAGE\n"
+            "1970-01-01T00:01:40Z  one two three four\n"
+            "                      five\n");
+  ::unsetenv("COLUMNS");
 }
 
 TEST_F(LogCommand, ClearOfAnEmptyLogDoesNotAsk) {

@@ -24,6 +24,16 @@ class Output : public CliTest {
     return line.substr(start, line.find("  ", start) - start);
   }
 
+  /// Characters of Chinese and Japanese take two.
+  static std::size_t columnsOf(const std::string& line) {
+    std::size_t columns = 0;
+    for (const char c : line) {
+      const auto byte = static_cast<unsigned char>(c);
+      if ((byte & 0xC0U) != 0x80U) columns += byte >= 0xE3U ? 2 : 1;
+    }
+    return columns;
+  }
+
   static bool isPlainAscii(const std::string& text) {
     return std::all_of(text.begin(), text.end(),
                        [](signed char c) { return c >= ' ' && c != '\x7f'; });
@@ -73,7 +83,7 @@ INSTANTIATE_TEST_SUITE_P(
         Shown{"TurnsTheText", "abc\u202Efed", "abc\\u{202e}fed"},
         Shown{"Invisible", "ad\u200Bmin", "ad\\u{200b}min"},
         Shown{"LineSeparator", "a\u2028b", "a\\u{2028}b"},
-        Shown{"Backslash", "AD\\alice", "AD\\alice"}, Shown{"Quotes", "\"O'Neil\"", "\"O''Neil\""},
+        Shown{"Backslash", "AD\\alice", "AD\\alice"}, Shown{"Quotes", "\"O'Neil\"", "\"O'Neil\""},
         Shown{"Wide", "日本語", "日本語"}, Shown{"Combining", "e\u0301t\u00e9", "e\u0301t\u00e9"},
         Shown{"Emoji", "👨\u200D👩", "👨\u200D👩"}),
     [](const auto& test) { return test.param.what; });
@@ -138,7 +148,7 @@ TEST_F(Output, RowIdsOf64Bits) {
 // Tables --------------------------------------------------------------------------
 
 TEST_F(Output, TablesFitTheTerminal) {
-  addClient("日本語日本語日本語");
+  addClient("日本語日本語日本語日本語日本語日本語");
   issueToken();
   for (const char* group : {"client", "token"}) {
     const Outcome shown = runOnTerminal({group, "list"}, {}, 80);
@@ -153,6 +163,37 @@ TEST_F(Output, TablesFitTheTerminal) {
   }
 }
 
+/// The widths of the lines that a terminal of 40 columns shows.
+TEST_F(Output, TablesFitFortyColumns) {
+  addClient("日本語日本語日本語 and a long name in Latin");
+  issueCode();
+  issueToken({"--ip", "2001:db8:1111:2222:3333:4444:5555:6666"});
+  for (const Arguments& command :
+       {Arguments{"client", "list"}, Arguments{"code", "list"}, Arguments{"token", "list"},
+        Arguments{"user", "list"}, Arguments{"user", "show", "alice"}, Arguments{"log", "list"},
+        Arguments{"code", "purge", "--dry-run"}}) {
+    SCOPED_TRACE(testing::PrintToString(command));
+    const Outcome shown = runOnTerminal(command, {}, 40);
+    EXPECT_THAT(shown, ExitsWith(kOk));
+    for (const std::string& line : lines(shown.out)) EXPECT_LE(columnsOf(line), 40U) << line;
+  }
+}
+
+TEST_F(Output, ATableWithoutRoomIsARecordForEachRow) {
+  addClient();
+  issueToken();
+  issueToken();
+  ::setenv("COLUMNS", "40", 1);
+  const std::vector<std::string> shown = lines(run({"token", "list"}).out);
+  ::unsetenv("COLUMNS");
+  ASSERT_EQ(shown.size(), 15U);
+  EXPECT_EQ(shown[0], "ID        1");
+  EXPECT_EQ(shown[1], "USERNAME  alice");
+  EXPECT_EQ(shown[2], "CLIENT    Photo Frame");
+  EXPECT_EQ(shown[7], "");
+  EXPECT_EQ(shown[8], "ID        2");
+}
+
 TEST_F(Output, WideCharactersCountTwice) {
   ::setenv("COLUMNS", "51", 1);
   addClient("日本語日本語日本語日本語日本語");
@@ -165,7 +206,7 @@ TEST_F(Output, WideCharactersCountTwice) {
 }
 
 TEST_F(Output, NothingIsCutInAPipe) {
-  const std::string identifier = addClient(std::string(64, 'n'))["client_id"].asString();
+  const std::string identifier = addClient(std::string(63, 'n'))["client_id"].asString();
   EXPECT_THAT(run({"client", "list"}).out, HasSubstr(identifier));
 }
 
@@ -189,13 +230,15 @@ TEST_F(Output, NoLineEndsInBlanks) {
 
 // Masking -------------------------------------------------------------------------
 
-TEST_F(Output, ShortAndStrangeSecretsAreMaskedWhole) {
-  addClient();
-  issueCode();
-  for (const std::string code : {"abcdefg", "\x1b[31maaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaa", ""}) {
-    sql("UPDATE oauth_grantCode SET code='" + code + "'");
-    EXPECT_EQ(json({"code", "show", "1"})["code"]["code"], kMask);
-  }
+TEST_F(Output, SecretsAreMaskedWhoeverMadeThem) {
+  const Outcome added = run(
+      {"client", "add", "--no-redirect-uri", "--scope", "x", "--name", "y", "--secret-file", "-"},
+      support::id64('s'));
+  ASSERT_THAT(added, ExitsWith(kOk));
+  EXPECT_EQ(json({"client", "show", "1"})["client"]["client_secret"],
+            std::string("ssssss") + kMask);
+  const std::string other(addClient()["client_secret"].asString());
+  EXPECT_EQ(json({"client", "show", "2"})["client"]["client_secret"], other.substr(0, 6) + kMask);
 }
 
 }  // namespace

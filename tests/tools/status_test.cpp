@@ -108,6 +108,29 @@ TEST_F(Status, RowsAgainstLimits) {
   EXPECT_EQ(tables[3]["limit"], Json::Value(70));
 }
 
+TEST_F(Status, SaysWhatTheNumbersMean) {
+  addClient();
+  issueToken();
+  expireIn("oauth_token", 1, -3600);
+  ASSERT_THAT(run({"code", "redeem"}, issueCode()["code"].asString()), ExitsWith(kOk));
+  const Json::Value tables = json({"status"})["database"]["tables"];
+  EXPECT_EQ(tables[1]["redeemed"], Json::Value(1));
+  EXPECT_EQ(tables[1]["expired"], Json::Value(0));
+  EXPECT_EQ(tables[2]["expired"], Json::Value(0)) << "it can still be refreshed";
+  EXPECT_THAT(run({"status"}).out,
+              HasSubstr("1 redeemed code is kept to notice when one comes again.\n"));
+}
+
+TEST_F(Status, DeadRowsDoNotMakeATableFull) {
+  addClient();
+  issueCode();
+  multiply("oauth_grantCode", 10);
+  writeSettings(R"({"grantcode_max": 10})");
+  EXPECT_THAT(problems(), ElementsAre("oauth_grantCode: full (10 of 10 rows)"));
+  sql("UPDATE oauth_grantCode SET expired_time='5' WHERE id>2");
+  EXPECT_THAT(problems(kOk), IsEmpty());
+}
+
 TEST_F(Status, Lifetimes) {
   writeSettings(R"({"grantcode_expired": 90, "token_expired": 7200})");
   const Json::Value lifetimes = json({"status"})["lifetimes"];
@@ -246,7 +269,8 @@ TEST_F(Status, DiagnosticsThatWriteSecrets) {
 
 TEST_F(Status, TablesNearTheirLimit) {
   addClient();
-  for (int row = 0; row < 9; ++row) issueCode();
+  issueCode();
+  multiply("oauth_grantCode", 9);
   writeSettings(R"({"grantcode_max": 10, "client_info_max": 1})");
   EXPECT_THAT(problems(), ElementsAre("oauth_clientInfo: full (1 of 1 rows)",
                                       "oauth_grantCode: nearly full (9 of 10 rows)"));
@@ -274,13 +298,13 @@ TEST_F(Status, AMalformedSchema) {
 
 TEST_F(Status, AMalformedPageThatNoCountReads) {
   addClient();
-  for (int row = 0; row < 40; ++row) issueCode();
+  issueCode();
+  multiply("oauth_grantCode", 40);
   const int page = std::stoi(sqlText(
       "SELECT pageno FROM dbstat WHERE name='oauth_grantCode' AND pagetype='leaf' LIMIT 1"));
   damage(page, 0);
   const std::vector<std::string> found = problems();
-  EXPECT_THAT(found, Contains(HasSubstr("oauth_grantCode: cannot be read: database disk image is "
-                                        "malformed (11)")));
+  EXPECT_THAT(found, Contains("tables: cannot be read: database disk image is malformed (11)"));
   EXPECT_THAT(found, Contains(MatchesRegex("database: is malformed: [^\n]*")));
 }
 
@@ -321,9 +345,8 @@ TEST_F(Status, ADatabaseThatIsJustBeingMade) {
 TEST_F(Status, ATableThatCannotBeRead) {
   addClient();
   sql("DROP TABLE oauth_token; CREATE VIEW oauth_token AS SELECT * FROM missing");
-  EXPECT_THAT(
-      problems(),
-      Contains(MatchesRegex("oauth_token: cannot be read: no such table.*missing \\(1\\)")));
+  EXPECT_THAT(problems(),
+              Contains(MatchesRegex("tables: cannot be read: no such table.*missing \\(1\\)")));
   EXPECT_EQ(json({"status"}, "", kUnhealthy)["database"]["tables"][2]["rows"], Json::Value());
 }
 
@@ -434,11 +457,9 @@ class StatusOfASmallDisk : public Status {
     medium_.emplace(kStateDir);
     ::chmod(kStateDir, 0700);
     addClient();
-    issueToken({"--expires-in", "0"});
-    sql("WITH RECURSIVE n(i) AS (SELECT 2 UNION ALL SELECT i+1 FROM n WHERE i<200)"
-        "INSERT INTO oauth_token SELECT username, client_id, scope, refresh_token,"
-        " access_token || i, '5', flow_type, state, ip, i FROM oauth_token, n WHERE id=1");
-    expireIn("oauth_token", 1, -5);
+    issueToken();
+    sql("UPDATE oauth_token SET expired_time='5'");
+    multiply("oauth_token", 200);
   }
   void TearDown() override {
     medium_.reset();

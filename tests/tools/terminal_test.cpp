@@ -34,8 +34,8 @@ TEST_F(Terminal, AsksBeforeItRemoves) {
   const Outcome removed = runOnTerminal({"client", "remove", "1"}, {{"[y/N] ", "y\n"}});
   EXPECT_THAT(removed, ExitsWith(kOk));
   EXPECT_THAT(removed.out,
-              StartsWith("Remove client 1 (Photo Frame)? Its codes and tokens stay. [y/N] "));
-  EXPECT_THAT(removed.out, EndsWith("Removed client 1 (Photo Frame).\n"));
+              StartsWith("Remove client 1 (Photo Frame) with its codes and tokens? [y/N] "));
+  EXPECT_THAT(removed.out, EndsWith("Removed client 1 (Photo Frame) with 0 codes and 0 tokens.\n"));
   EXPECT_EQ(rowCount("oauth_clientInfo"), "0");
 }
 
@@ -54,7 +54,7 @@ TEST_F(Terminal, YesInFull) {
 
 TEST_F(Terminal, YesOnTheCommandLineAsksNothing) {
   const Outcome removed = runOnTerminal({"client", "remove", "1", "--yes"});
-  EXPECT_EQ(removed.out, "Removed client 1 (Photo Frame).\n");
+  EXPECT_EQ(removed.out, "Removed client 1 (Photo Frame) with 0 codes and 0 tokens.\n");
 }
 
 TEST_F(Terminal, TheQuestionIsNotPartOfTheDocument) {
@@ -70,7 +70,9 @@ TEST_F(Terminal, EveryDestructiveCommandRefusesWithoutATerminal) {
        {Arguments{"client", "remove", "1"}, Arguments{"code", "revoke", "1"},
         Arguments{"code", "remove", "1"}, Arguments{"code", "purge"},
         Arguments{"code", "purge", "--grace", "1"}, Arguments{"token", "revoke", "1"},
-        Arguments{"token", "purge"}, Arguments{"log", "clear"}}) {
+        Arguments{"token", "purge"}, Arguments{"purge"}, Arguments{"log", "clear"},
+        Arguments{"client", "revoke", "1"}, Arguments{"client", "renew-secret", "1"},
+        Arguments{"token", "revoke", "1"}}) {
     const Outcome refused = run(command, "y\n");
     EXPECT_THAT(refused, ExitsWith(kNotConfirmed));
     EXPECT_THAT(refused.err, HasSubstr("not confirmed, nothing was done\nhint: there is no "
@@ -116,7 +118,7 @@ TEST_F(Terminal, AQuestionShowsNoControlCharacters) {
       "\x1b"
       "[2Jb'");
   const Outcome asked = runOnTerminal({"client", "remove", "1"}, {{"[y/N] ", "n\n"}});
-  EXPECT_THAT(asked.out, StartsWith("Remove client 1 (a\\x1b[2Jb)?"));
+  EXPECT_THAT(asked.out, StartsWith("Remove client 1 (a\\x1b[2Jb) with"));
 }
 
 struct Meanwhile {
@@ -149,7 +151,7 @@ INSTANTIATE_TEST_SUITE_P(
         Meanwhile{"ClientRemove",
                   {"client", "remove", "1"},
                   "oauth_clientInfo",
-                  "UPDATE oauth_clientInfo SET display_name='Another'"},
+                  "UPDATE oauth_clientInfo SET client_id='another'"},
         Meanwhile{"CodeRemove",
                   {"code", "remove", "1"},
                   "oauth_grantCode",
@@ -161,15 +163,37 @@ INSTANTIATE_TEST_SUITE_P(
         Meanwhile{"TokenRevoke",
                   {"token", "revoke", "1"},
                   "oauth_token",
-                  "UPDATE oauth_token SET access_token='another'"},
+                  "UPDATE oauth_token SET access_token='another', state='another'"},
         Meanwhile{"TokenGone", {"token", "revoke", "1"}, "oauth_token", "DELETE FROM oauth_token"}),
     [](const auto& test) { return test.param.what; });
 
 TEST_F(Terminal, ARowThatChangedIsNamed) {
-  const auto change = [] { sql("UPDATE oauth_clientInfo SET scope='x'"); };
-  const Outcome outcome = runOnTerminal({"client", "remove", "1"}, {{"[y/N] ", "y\n", change}});
-  EXPECT_THAT(outcome.out, HasSubstr("keldoauth: client remove: client 1 has just changed\n"
+  issueCode();
+  const auto change = [] { sql("UPDATE oauth_grantCode SET code='x'"); };
+  const Outcome outcome = runOnTerminal({"code", "revoke", "1"}, {{"[y/N] ", "y\n", change}});
+  EXPECT_THAT(outcome.out, HasSubstr("keldoauth: code revoke: code 1 has just changed\n"
                                      "hint: nothing was done; look at it again\n"));
+}
+
+TEST_F(Terminal, OneOfSeveralThatChangedStays) {
+  issueCode();
+  issueCode();
+  const auto change = [] { sql("UPDATE oauth_grantCode SET code='x' WHERE id=2"); };
+  const Outcome outcome =
+      runOnTerminal({"code", "revoke", "1", "2"}, {{"2 codes? [y/N] ", "y\n", change}});
+  EXPECT_THAT(outcome, ExitsWith(kNotFound));
+  EXPECT_THAT(outcome.out, HasSubstr("1 of 2 codes have just changed, and stay\n"));
+  EXPECT_EQ(sqlText("SELECT id FROM oauth_grantCode"), "2");
+}
+
+TEST_F(Terminal, WhatIsEndedOfAUserIsCounted) {
+  issueCode();
+  issueToken();
+  const Outcome asked = runOnTerminal({"user", "revoke", "alice"}, {{"[y/N] ", "n\n"}});
+  EXPECT_THAT(asked.out, StartsWith("End all that alice has (2 rows)? [y/N] "));
+  EXPECT_EQ(rowCount("oauth_token"), "1");
+  EXPECT_THAT(runOnTerminal({"token", "revoke", "--username", "alice"}, {{"[y/N] ", "n\n"}}).out,
+              StartsWith("Revoke 1 token of alice? [y/N] "));
 }
 
 TEST_F(Terminal, APurgeSparesARowThatWasRenewedMeanwhile) {

@@ -1,5 +1,7 @@
 // keldoauth token.
 
+#include <map>
+
 #include "tests/tools/cli.h"
 
 namespace cli {
@@ -11,6 +13,9 @@ using testing::Not;
 using testing::SizeIs;
 
 constexpr char kTable[] = "oauth_token";
+
+/// A login is dead so long after its access token expired.
+constexpr long long kIdle = 30LL * 24 * 60 * 60;
 
 class TokenCommand : public CliTest {
  protected:
@@ -28,8 +33,8 @@ class TokenCommand : public CliTest {
   static Outcome verify(const std::string& token) { return run({"token", "verify"}, token); }
 
   static Arguments issueArguments() {
-    return {"token",   "issue",  "--client", "1",      "--username",  "alice",
-            "--scope", "photos", "--state",  "state1", "--flow-type", "implicit"};
+    return {"token", "issue",   "--client", "1",       "--username",
+            "alice", "--scope", "photos",   "--state", "state1"};
   }
 
   Json::Value client_;
@@ -40,13 +45,13 @@ class TokenCommand : public CliTest {
 TEST_F(TokenCommand, IssueShowsBothTokensInFull) {
   const Json::Value token = issueToken({"--ip", "2001:db8::1"});
   EXPECT_THAT(token["access_token"].asString(), MatchesRegex("[0-9a-f]{64}"));
-  EXPECT_THAT(token["refresh_token"].asString(), MatchesRegex("[0-9a-f]{64}"));
+  EXPECT_THAT(token["refresh_token"].asString(), MatchesRegex("[0-9a-f]{100,128}"));
   EXPECT_NE(token["access_token"], token["refresh_token"]);
   EXPECT_EQ(token["id"], Json::Value(1));
   EXPECT_EQ(token["username"], "alice");
   EXPECT_EQ(token["client_id"], client_["client_id"]);
   EXPECT_EQ(token["scope"], "photos");
-  EXPECT_EQ(token["flow_type"], "implicit");
+  EXPECT_EQ(token["flow_type"], "authorization_code");
   EXPECT_EQ(token["state"], "state1");
   EXPECT_EQ(token["ip"], "2001:db8::1");
 }
@@ -56,7 +61,7 @@ TEST_F(TokenCommand, IssueTellsPeopleBothTokens) {
   ASSERT_THAT(said, SizeIs(4));
   EXPECT_EQ(said[0], "Issued token 1 of alice.");
   EXPECT_THAT(said[1], MatchesRegex("access token   [0-9a-f]{64}"));
-  EXPECT_THAT(said[2], MatchesRegex("refresh token  [0-9a-f]{64}"));
+  EXPECT_THAT(said[2], MatchesRegex("refresh token  [0-9a-f]{100,128}"));
   EXPECT_THAT(said[3], MatchesRegex("expires        20..-..-..T..:..:..Z, in (10m|9m 5.s)"));
 }
 
@@ -84,16 +89,15 @@ TEST_F(TokenCommand, IssueNamesTheValueThatIsRefused) {
   const std::vector<Case> cases{
       {5, "", "--username: 1 to 256 bytes, not 0"},
       {7, "", "--scope: 1 to 2048 bytes, not 0"},
-      {9, std::string(2049, 's'), "--state: 1 to 2048 bytes, not 2049"},
-      {11, std::string(33, 'f'), "--flow-type: 1 to 32 bytes, not 33"},
+      {9, std::string(513, 's'), "--state: at most 512 bytes, not 513"},
   };
   for (const Case& refused : cases) {
     Arguments arguments = issueArguments();
     arguments[refused.position] = refused.value;
     const Outcome outcome = run(arguments);
     EXPECT_THAT(outcome, ExitsWith(kRefused));
-    EXPECT_EQ(outcome.err,
-              "keldoauth: token issue: Bad parameters (-2)\nhint: " + refused.hint + "\n");
+    EXPECT_EQ(outcome.err, "keldoauth: token issue: a value is too short or too long (-2)\nhint: " +
+                               refused.hint + "\n");
   }
 }
 
@@ -102,17 +106,58 @@ TEST_F(TokenCommand, IssueNamesABadAddress) {
   arguments.insert(arguments.end(), {"--ip", "nowhere"});
   const Outcome refused = run(arguments);
   EXPECT_THAT(refused, ExitsWith(kRefused));
-  EXPECT_EQ(refused.err,
-            "keldoauth: token issue: refused, without an error code\n"
-            "hint: --ip: neither an IPv4 nor an IPv6 address\n");
+  EXPECT_EQ(refused.err, "keldoauth: token issue: the IP address is none (-2)\n");
 }
 
 TEST_F(TokenCommand, IssueToAFullTable) {
   writeSettings(R"({"token_max": 1})");
+  addClient("Player");
   issueToken();
-  const Outcome full = run(issueArguments());
+  Arguments arguments = issueArguments();
+  arguments[3] = "Player";
+  arguments[5] = "bob";
+  const Outcome full = run(arguments);
   EXPECT_THAT(full, ExitsWith(kRefused));
   EXPECT_THAT(full.err, HasSubstr("token issue: Token Table is full (-5)\n"));
+  EXPECT_THAT(full.err, HasSubstr("token_max"));
+}
+
+TEST_F(TokenCommand, IssueOfAKindThatThereIsNot) {
+  Arguments arguments = issueArguments();
+  arguments.insert(arguments.end(), {"--flow-type", "implicit"});
+  const Outcome refused = run(arguments);
+  EXPECT_THAT(refused, ExitsWith(kRefused));
+  EXPECT_EQ(refused.err,
+            "keldoauth: token issue: --flow-type: there is no way to issue a token of that kind\n"
+            "hint: authorization_code or client_credentials\n");
+  EXPECT_EQ(rowCount(kTable), "0");
+}
+
+TEST_F(TokenCommand, IssueToTheClientItself) {
+  const Arguments own{"token", "issue", "--client", "1", "--flow-type", "client_credentials"};
+  const Json::Value token = json(own)["token"];
+  EXPECT_EQ(token["username"], Json::Value());
+  EXPECT_EQ(token["refresh_token"], Json::Value());
+  EXPECT_EQ(token["kind"], "own");
+  EXPECT_EQ(token["scope"], "profile photos");
+  EXPECT_THAT(run(own).out, HasSubstr("Issued token 2 of Photo Frame itself.\n"));
+  EXPECT_THAT(verify(token["access_token"].asString()).out,
+              HasSubstr("username  (client itself)\n"));
+  Arguments withUser = own;
+  withUser.insert(withUser.end(), {"--username", "alice"});
+  EXPECT_THAT(run(withUser), ExitsWith(kUsage));
+}
+
+TEST_F(TokenCommand, IssueOfALoginNeedsUserAndScope) {
+  EXPECT_THAT(run({"token", "issue", "--client", "1", "--scope", "photos"}), ExitsWith(kUsage));
+  EXPECT_THAT(run({"token", "issue", "--client", "1", "--username", "x"}), ExitsWith(kUsage));
+}
+
+TEST_F(TokenCommand, IssueKeepsNoUsableToken) {
+  const Json::Value token = issueToken();
+  const std::string file = readFile(kDatabase);
+  EXPECT_THAT(file, Not(HasSubstr(token["access_token"].asString())));
+  EXPECT_THAT(file, Not(HasSubstr(token["refresh_token"].asString())));
 }
 
 // list and show -------------------------------------------------------------------
@@ -125,17 +170,34 @@ TEST_F(TokenCommand, ListIsATable) {
   issueToken();
   const std::vector<std::string> shown = lines(run({"token", "list"}).out);
   ASSERT_THAT(shown, SizeIs(2));
-  EXPECT_THAT(shown[0],
-              MatchesRegex("ID +USERNAME +CLIENT ID +SCOPE +ACCESS +REFRESH +EXPIRES +LEFT"));
-  EXPECT_THAT(shown[1], MatchesRegex("1 +alice .* [0-9a-f]{6}…  [0-9a-f]{6}…  20.*Z  .*"));
+  EXPECT_THAT(shown[0], MatchesRegex("ID +USERNAME +CLIENT +SCOPE +EXPIRES +LEFT +ENDS IN"));
+  EXPECT_THAT(shown[1], MatchesRegex("1 +alice +Photo Frame +photos +20.*Z +(10m|9m 5.s) +"
+                                     "(30d|29d 23h)"));
 }
 
-TEST_F(TokenCommand, ListMasksBothTokens) {
-  const Json::Value token = issueToken();
-  const Json::Value listed = json({"token", "list"})["tokens"][0];
-  EXPECT_EQ(listed["access_token"], token["access_token"].asString().substr(0, 6) + kMask);
-  EXPECT_EQ(listed["refresh_token"], token["refresh_token"].asString().substr(0, 6) + kMask);
-  EXPECT_EQ(json({"token", "list", "--reveal"})["tokens"][0], token);
+TEST_F(TokenCommand, ListHasNoTokensBecauseNobodyKeepsThem) {
+  Json::Value token = issueToken();
+  token["access_token"] = Json::Value();
+  token["refresh_token"] = Json::Value();
+  EXPECT_EQ(json({"token", "list"})["tokens"][0], token);
+}
+
+TEST_F(TokenCommand, ListOfAClientByItsName) {
+  addClient("Player");
+  issueToken();
+  EXPECT_EQ(json({"token", "list", "--client", "Photo Frame"})["tokens"].size(), 1U);
+  EXPECT_EQ(json({"token", "list", "--client", "Player"})["tokens"].size(), 0U);
+  EXPECT_THAT(run({"token", "list", "--client", "Nobody"}), ExitsWith(kNotFound));
+}
+
+TEST_F(TokenCommand, ListTellsSinceWhenAndUntilWhen) {
+  const long long before = ::time(nullptr);
+  issueToken();
+  const Json::Value token = shown("1");
+  EXPECT_GE(token["since"].asInt64(), before);
+  EXPECT_EQ(token["renewed"], token["since"]);
+  EXPECT_EQ(token["ends"].asInt64(), token["expired_time"].asInt64() + 30LL * 24 * 60 * 60);
+  EXPECT_EQ(token["dead"], Json::Value(false));
 }
 
 TEST_F(TokenCommand, ListOfExpiredOnesOfAUser) {
@@ -158,10 +220,10 @@ TEST_F(TokenCommand, ShowByRowIdAndByEitherToken) {
             byId);
 }
 
-TEST_F(TokenCommand, ShowDoesNotTakeOneTokenForTheOther) {
+TEST_F(TokenCommand, ShowTakesEitherTokenFromEitherFile) {
   const Json::Value token = issueToken();
   EXPECT_THAT(run({"token", "show", "--token-file", "-"}, token["refresh_token"].asString()),
-              ExitsWith(kNotFound));
+              ExitsWith(kOk));
 }
 
 TEST_F(TokenCommand, ShowNeedsExactlyOneName) {
@@ -173,7 +235,8 @@ TEST_F(TokenCommand, ShowNeedsExactlyOneName) {
 
 TEST_F(TokenCommand, ShowOfAnUnknownToken) {
   EXPECT_THAT(run({"token", "show", "5"}), ExitsWith(kNotFound));
-  EXPECT_THAT(run({"token", "show", "--token-file", "-"}, "short"), ExitsWith(kRefused));
+  EXPECT_THAT(run({"token", "show", "--token-file", "-"}, "short"), ExitsWith(kNotFound));
+  EXPECT_THAT(run({"token", "show", "--token-file", "-"}, ""), ExitsWith(kRefused));
 }
 
 // verify --------------------------------------------------------------------------
@@ -185,7 +248,11 @@ TEST_F(TokenCommand, VerifyTellsTheHolder) {
   EXPECT_EQ(answer["token"]["username"], "alice");
   EXPECT_EQ(answer["token"]["scope"], "photos");
   EXPECT_EQ(answer["token"]["state"], "state1");
-  EXPECT_EQ(verify(token).out, "Valid.\nusername  alice\nscope     photos\nstate     state1\n");
+  EXPECT_EQ(answer["token"]["client_id"], client_["client_id"]);
+  EXPECT_EQ(answer["token"]["client_name"], "Photo Frame");
+  EXPECT_THAT(verify(token).out,
+              testing::StartsWith("Valid.\nusername  alice\nclient    Photo Frame\n"
+                                  "scope     photos\nstate     state1\nexpires   20"));
 }
 
 TEST_F(TokenCommand, VerifyFromAFile) {
@@ -196,25 +263,55 @@ TEST_F(TokenCommand, VerifyFromAFile) {
 TEST_F(TokenCommand, VerifyOfAnExpiredOrUnknownToken) {
   const std::string expired = issueToken()["access_token"].asString();
   expireIn(kTable, 1, -1);
-  for (const std::string& token : {expired, support::id64('a')}) {
+  for (const auto& [token, why] : std::map<std::string, std::string>{
+           {expired, "it has expired"}, {support::id64('a'), "it is unknown or has been ended"}}) {
     const Outcome outcome = verify(token);
     EXPECT_THAT(outcome, ExitsWith(kInvalid));
-    EXPECT_EQ(outcome.err, "keldoauth: token verify: Access Token Expired (-3)\n");
+    EXPECT_EQ(outcome.err,
+              "keldoauth: token verify: the access token is not good: " + why + " (-3)\n");
     EXPECT_EQ(outcome.out, "");
   }
+}
+
+TEST_F(TokenCommand, VerifyAndRefreshRefuseDisabledAndRemovedClients) {
+  const Json::Value token = issueToken();
+  const auto expectRefused = [&] {
+    EXPECT_THAT(verify(token["access_token"].asString()), ExitsWith(kInvalid));
+    EXPECT_THAT(run({"token", "refresh"}, token["refresh_token"].asString()), ExitsWith(kInvalid));
+  };
+  run({"client", "disable", "1"});
+  expectRefused();
+  EXPECT_THAT(verify(token["access_token"].asString()).err,
+              HasSubstr("the application is disabled (-3)"));
+  run({"client", "enable", "1"});
+  EXPECT_THAT(verify(token["access_token"].asString()), ExitsWith(kOk));
+  sql("DELETE FROM oauth_clientInfo");
+  expectRefused();
+}
+
+TEST_F(TokenCommand, VerifyTakesAnotherProgramsTokenToo) {
+  const std::string token = storeForeignToken("O'Brien")["access_token"].asString();
+  EXPECT_EQ(json({"token", "verify"}, token)["token"]["username"], "O'Brien");
+}
+
+TEST_F(TokenCommand, WhatStandsInTheFileIsNoToken) {
+  issueToken();
+  EXPECT_THAT(verify(sqlText("SELECT access_token FROM oauth_token")), ExitsWith(kInvalid));
+  EXPECT_THAT(run({"token", "refresh"}, sqlText("SELECT refresh_token FROM oauth_token")),
+              ExitsWith(kInvalid));
 }
 
 TEST_F(TokenCommand, VerifyDoesNotTakeARefreshToken) {
   EXPECT_THAT(verify(issueToken()["refresh_token"].asString()), ExitsWith(kInvalid));
 }
 
-TEST_F(TokenCommand, VerifyOfAnotherLengthIsNoVerdict) {
-  for (const std::string& token : {std::string(), std::string("abc"), std::string(65, 'a')}) {
+TEST_F(TokenCommand, VerifyOfNothingIsNoVerdict) {
+  for (const char* token : {"", "\n"}) {
     const Outcome outcome = verify(token);
     EXPECT_THAT(outcome, ExitsWith(kRefused));
-    EXPECT_THAT(outcome.err, HasSubstr("Bad parameters (-2)\nhint: the token: 64 bytes, not " +
-                                       std::to_string(token.size())));
+    EXPECT_EQ(outcome.err, "keldoauth: token verify: Access token: the text is empty\n");
   }
+  EXPECT_THAT(verify("abc"), ExitsWith(kInvalid));
 }
 
 TEST_F(TokenCommand, VerifyThatFailsIsNoVerdict) {
@@ -226,7 +323,7 @@ TEST_F(TokenCommand, VerifyThatFailsIsNoVerdict) {
 // edit ----------------------------------------------------------------------------
 
 TEST_F(TokenCommand, EditChangesWhatIsGiven) {
-  issueToken();
+  storeForeignToken();
   support::Row expected = row(1);
   expected["flow_type"] = "password";
   expected["username"] = "it's bob";
@@ -234,8 +331,17 @@ TEST_F(TokenCommand, EditChangesWhatIsGiven) {
   EXPECT_EQ(row(1), expected);
 }
 
-TEST_F(TokenCommand, EditOfTheExpiryKeepsQuotesAsTheyAre) {
+TEST_F(TokenCommand, EditOfTheServicesOwnTokenIsRefused) {
   issueToken();
+  const support::Row before = row(1);
+  const Outcome refused = run({"token", "edit", "1", "--username", "bob"});
+  EXPECT_THAT(refused, ExitsWith(kRefused));
+  EXPECT_THAT(refused.err, HasSubstr("token 1 was issued by this service"));
+  EXPECT_EQ(row(1), before);
+}
+
+TEST_F(TokenCommand, EditOfTheExpiryKeepsQuotesAsTheyAre) {
+  storeForeignToken();
   sql("UPDATE oauth_token SET scope='a''b', state='a''''b'");
   support::Row expected = row(1);
   const Json::Value edited = json({"token", "edit", "1", "--expires-in", "3000"})["token"];
@@ -244,7 +350,7 @@ TEST_F(TokenCommand, EditOfTheExpiryKeepsQuotesAsTheyAre) {
 }
 
 TEST_F(TokenCommand, EditThatIsRefusedChangesNothing) {
-  issueToken();
+  storeForeignToken();
   const support::Row before = row(1);
   EXPECT_THAT(run({"token", "edit", "1", "--flow-type", "", "--expires-in", "5"}),
               ExitsWith(kRefused));
@@ -276,7 +382,8 @@ TEST_F(TokenCommand, RefreshOnce) {
   EXPECT_THAT(run({"token", "refresh"}, token), ExitsWith(kOk));
   const Outcome again = run({"token", "refresh"}, token);
   EXPECT_THAT(again, ExitsWith(kInvalid));
-  EXPECT_EQ(again.err, "keldoauth: token refresh: refresh token is unknown or was used before\n");
+  EXPECT_EQ(again.err,
+            "keldoauth: token refresh: the refresh token is not good: it was used before\n");
 }
 
 TEST_F(TokenCommand, RefreshOnceOfEightAtTheSameMoment) {
@@ -303,9 +410,11 @@ TEST_F(TokenCommand, RefreshDoesNotTakeAnAccessToken) {
 TEST_F(TokenCommand, RefreshKeepsQuotes) {
   Arguments arguments = issueArguments();
   arguments[5] = "O'Neil";
-  const Json::Value before = json(arguments)["token"];
-  const Json::Value after = json({"token", "refresh"}, before["refresh_token"].asString())["token"];
-  EXPECT_EQ(after["username"], before["username"]);
+  Json::Value token = json(arguments)["token"];
+  for (int i = 0; i < 10; ++i) {
+    token = json({"token", "refresh"}, token["refresh_token"].asString())["token"];
+    EXPECT_EQ(token["username"], "O'Neil");
+  }
 }
 
 TEST_F(TokenCommand, RefreshWorksInAFullTable) {
@@ -316,10 +425,19 @@ TEST_F(TokenCommand, RefreshWorksInAFullTable) {
 
 TEST_F(TokenCommand, RefreshThatFailsKeepsTheOldPair) {
   const Json::Value before = issueToken();
-  sql("UPDATE oauth_token SET ip='nowhere'");
-  const Outcome refused = run({"token", "refresh"}, before["refresh_token"].asString());
-  EXPECT_THAT(refused, ExitsWith(kRefused));
+  sql("CREATE TRIGGER refuse BEFORE UPDATE ON oauth_token "
+      "BEGIN SELECT raise(ABORT, 'not now'); END");
+  EXPECT_THAT(run({"token", "refresh"}, before["refresh_token"].asString()), ExitsWith(kRefused));
+  sql("DROP TRIGGER refuse");
   EXPECT_THAT(verify(before["access_token"].asString()), ExitsWith(kOk));
+  EXPECT_THAT(run({"token", "refresh"}, before["refresh_token"].asString()), ExitsWith(kOk));
+}
+
+TEST_F(TokenCommand, RefreshRefusesAnotherProgramsToken) {
+  const Outcome outcome =
+      run({"token", "refresh"}, storeForeignToken()["refresh_token"].asString());
+  EXPECT_THAT(outcome, ExitsWith(kInvalid));
+  EXPECT_THAT(outcome.err, HasSubstr("it was issued by another program"));
 }
 
 // revoke and purge ----------------------------------------------------------------
@@ -342,6 +460,44 @@ TEST_F(TokenCommand, RevokeByEitherToken) {
   EXPECT_EQ(rowCount(kTable), "0");
 }
 
+TEST_F(TokenCommand, RevokeOfAUserWithAClient) {
+  addClient("Player");
+  const Json::Value kept = issueToken();
+  issueCode();
+  for (const char* user : {"alice", "bob"}) {
+    json({"token", "issue", "--client", "Player", "--username", user, "--scope", "photos"});
+  }
+  EXPECT_EQ(run({"token", "revoke", "--username", "alice", "--client", "Player", "--yes"}).out,
+            "Revoked 1 token.\n");
+  EXPECT_EQ(json({"token", "list"})["tokens"].size(), 2U);
+  EXPECT_EQ(json({"token", "revoke", "--client", "Player", "-y"})["ended"], Json::Value(1));
+  EXPECT_THAT(verify(kept["access_token"].asString()), ExitsWith(kOk));
+  EXPECT_EQ(rowCount("oauth_grantCode"), "1");
+}
+
+TEST_F(TokenCommand, RevokeOfAllLeavesCodes) {
+  issueToken();
+  storeForeignToken("bob");
+  issueCode();
+  EXPECT_EQ(json({"token", "revoke", "--all", "-y"})["ended"], Json::Value(2));
+  EXPECT_EQ(rowCount(kTable), "0");
+  EXPECT_EQ(rowCount("oauth_grantCode"), "1");
+}
+
+TEST_F(TokenCommand, RevokeOfSeveralIsOneEntryASubject) {
+  for (int i = 0; i < 3; ++i) issueToken();
+  EXPECT_EQ(run({"token", "revoke", "1", "2", "3", "-y"}).out, "Revoked 3 tokens.\n");
+  EXPECT_EQ(sqlText("SELECT count(*) FROM oauth_log WHERE msg LIKE 'Access ended%'"), "1");
+}
+
+TEST_F(TokenCommand, RevokeEndsALoginThatWasRefreshedMeanwhile) {
+  const std::string token = issueToken()["refresh_token"].asString();
+  const auto refresh = [&] { run({"token", "refresh"}, token); };
+  EXPECT_THAT(runOnTerminal({"token", "revoke", "1"}, {{"[y/N] ", "y\n", refresh}}),
+              ExitsWith(kOk));
+  EXPECT_EQ(rowCount(kTable), "0");
+}
+
 TEST_F(TokenCommand, RevokeOfAnUnknownToken) {
   EXPECT_THAT(run({"token", "revoke", "8", "--yes"}), ExitsWith(kNotFound));
   EXPECT_THAT(run({"token", "revoke", "--yes", "--token-file", "-"}, support::id64('a')),
@@ -350,29 +506,47 @@ TEST_F(TokenCommand, RevokeOfAnUnknownToken) {
 
 TEST_F(TokenCommand, RevokeDoesNotReveal) {
   const std::string token = issueToken()["access_token"].asString();
-  const Json::Value revoked = json({"token", "revoke", "1", "--yes"})["token"];
-  EXPECT_THAT(revoked["access_token"].asString(), Not(HasSubstr(token)));
+  EXPECT_THAT(run({"token", "revoke", "1", "--yes", "--json"}).out, Not(HasSubstr(token)));
 }
 
-TEST_F(TokenCommand, PurgeRemovesWhatExpired) {
+TEST_F(TokenCommand, PurgeRemovesWhatCannotBeRefreshedAnyMore) {
   for (int id = 1; id <= 3; ++id) issueToken();
-  expireIn(kTable, 1, -5);
-  expireIn(kTable, 3, -5);
-  EXPECT_EQ(json({"token", "purge", "--yes"})["purged"].size(), 2U);
+  expireIn(kTable, 1, -kIdle - 5);
+  expireIn(kTable, 2, -kIdle + 60);
+  expireIn(kTable, 3, -kIdle - 5);
+  const Json::Value answer = json({"token", "purge", "--yes"});
+  EXPECT_EQ(answer["purged"].size(), 2U);
+  EXPECT_EQ(answer["count"], Json::Value(2));
   EXPECT_EQ(sqlText("SELECT id FROM oauth_token"), "2");
 }
 
-TEST_F(TokenCommand, PurgeWithGraceLeavesRefreshTokensAlive) {
+TEST_F(TokenCommand, PurgeOfBothTablesAtOnce) {
+  issueToken();
+  issueCode();
+  expireIn(kTable, 1, -kIdle - 5);
+  expireIn("oauth_grantCode", 1, -5);
+  EXPECT_EQ(run({"purge", "--dry-run"}).out, "1 code and 1 token would be purged.\n");
+  EXPECT_EQ(run({"purge", "--yes", "--grace", "3600"}).out, "Nothing to purge.\n");
+  EXPECT_THAT(run({"purge"}), ExitsWith(kNotConfirmed));
+  const Json::Value answer = json({"purge", "--yes"});
+  EXPECT_EQ(answer["codes"], Json::Value(1));
+  EXPECT_EQ(answer["tokens"], Json::Value(1));
+  EXPECT_EQ(rowCount(kTable), "0");
+  EXPECT_EQ(rowCount("oauth_grantCode"), "0");
+  EXPECT_EQ(run({"purge"}).out, "Nothing to purge.\n");
+}
+
+TEST_F(TokenCommand, PurgeLeavesRefreshTokensAlive) {
   const std::string token = issueToken()["refresh_token"].asString();
   expireIn(kTable, 1, -3600);
-  EXPECT_EQ(run({"token", "purge", "--yes", "--grace", "604800"}).out, "Nothing to purge.\n");
+  EXPECT_EQ(run({"token", "purge", "--yes"}).out, "Nothing to purge.\n");
   EXPECT_THAT(run({"token", "refresh"}, token), ExitsWith(kOk));
 }
 
 TEST_F(TokenCommand, PurgeDryRunWithGrace) {
   for (int id = 1; id <= 2; ++id) issueToken();
-  expireIn(kTable, 1, -50);
-  expireIn(kTable, 2, -500);
+  expireIn(kTable, 1, -kIdle - 50);
+  expireIn(kTable, 2, -kIdle - 500);
   const Json::Value answer = json({"token", "purge", "--dry-run", "--grace", "100"});
   ASSERT_EQ(answer["purged"].size(), 1U);
   EXPECT_EQ(answer["purged"][0]["id"], Json::Value(2));

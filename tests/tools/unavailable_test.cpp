@@ -61,7 +61,8 @@ TEST_F(Unavailable, ADamagedDatabase) {
 
 TEST_F(Unavailable, ADamagedPage) {
   addClient();
-  for (int row = 0; row < 40; ++row) issueCode();
+  issueCode();
+  multiply("oauth_grantCode", 40);
   std::string file = readFile(kDatabase);
   for (std::size_t page = 6; page * 4096 < file.size(); ++page)
     file.replace(page * 4096, 8, 8, 'x');
@@ -115,7 +116,7 @@ TEST_F(Unavailable, ACipherThatFails) {
   const Outcome outcome = run(addArguments());
   EXPECT_THAT(outcome, ExitsWith(kUnavailable));
   EXPECT_EQ(outcome.err,
-            "keldoauth: client add: Data Encrypt failed (-4)\n"
+            "keldoauth: client add: Data Decrypt failed (-4)\n"
             "hint: the platform's cipher or its key cannot be used; the system log says more\n");
 }
 

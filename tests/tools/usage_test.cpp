@@ -21,15 +21,42 @@ struct Command {
 };
 
 const std::vector<Command>& allCommands() {
-  static const std::vector<Command> commands{
-      {"client", "add"},    {"client", "list"},    {"client", "show"},   {"client", "edit"},
-      {"client", "enable"}, {"client", "disable"}, {"client", "remove"}, {"code", "issue"},
-      {"code", "list"},     {"code", "show"},      {"code", "edit"},     {"code", "redeem"},
-      {"code", "revoke"},   {"code", "remove"},    {"code", "purge"},    {"token", "issue"},
-      {"token", "list"},    {"token", "show"},     {"token", "verify"},  {"token", "edit"},
-      {"token", "refresh"}, {"token", "revoke"},   {"token", "purge"},   {"log", "list"},
-      {"log", "add"},       {"log", "clear"},      {"", "status"},       {"", "backup"},
-      {"", "restore"},      {"", "rekey"}};
+  static const std::vector<Command> commands{{"client", "add"},
+                                             {"client", "list"},
+                                             {"client", "show"},
+                                             {"client", "edit"},
+                                             {"client", "renew-secret"},
+                                             {"client", "enable"},
+                                             {"client", "disable"},
+                                             {"client", "revoke"},
+                                             {"client", "remove"},
+                                             {"user", "list"},
+                                             {"user", "show"},
+                                             {"user", "revoke"},
+                                             {"code", "issue"},
+                                             {"code", "list"},
+                                             {"code", "show"},
+                                             {"code", "edit"},
+                                             {"code", "redeem"},
+                                             {"code", "revoke"},
+                                             {"code", "remove"},
+                                             {"code", "purge"},
+                                             {"token", "issue"},
+                                             {"token", "list"},
+                                             {"token", "show"},
+                                             {"token", "verify"},
+                                             {"token", "edit"},
+                                             {"token", "refresh"},
+                                             {"token", "revoke"},
+                                             {"token", "purge"},
+                                             {"log", "list"},
+                                             {"log", "add"},
+                                             {"log", "clear"},
+                                             {"", "purge"},
+                                             {"", "status"},
+                                             {"", "backup"},
+                                             {"", "restore"},
+                                             {"", "rekey"}};
   return commands;
 }
 
@@ -129,7 +156,7 @@ TEST_F(Usage, MistakesGoToStandardErrorWithAHint) {
       {{"client", "list", "--secret"}, "keldoauth: client list: unexpected argument '--secret'\n"},
       {{"client", "list", "x\n"}, "keldoauth: client list: unexpected argument 'x\\n'\n"},
       {{"client", "show"}, "keldoauth: client show: CLIENT is required\n"},
-      {{"client", "add"}, "keldoauth: client add: --redirect-uri is required\n"},
+      {{"client", "add"}, "keldoauth: client add: --scope is required\n"},
       {{"token", "purge", "--grace", "1.5"},
        "keldoauth: token purge: --grace: '1.5' is not a whole number\n"},
       {{"token", "purge", "--grace", "99999999999"},
@@ -165,6 +192,15 @@ TEST_F(Usage, AMistakeWithJsonIsADocument) {
   }
 }
 
+TEST_F(Usage, JsonIsTakenBeforeTheCommandToo) {
+  makeStore();
+  for (const Arguments& command :
+       {Arguments{"--json", "client", "list"}, Arguments{"client", "--json", "list"},
+        Arguments{"client", "list", "--json"}, Arguments{"--json", "client", "list", "--json"}}) {
+    EXPECT_EQ(run(command).out, "{\"clients\":[]}\n");
+  }
+}
+
 TEST_F(Usage, AFailureWithJsonIsADocumentAndALine) {
   makeStore();
   const Outcome outcome = run({"client", "show", "3", "--json"});
@@ -176,11 +212,12 @@ TEST_F(Usage, AFailureWithJsonIsADocumentAndALine) {
 
 TEST_F(Usage, ARefusalWithJsonHasTheLibrarysCode) {
   makeStore();
-  const Json::Value error = json({"token", "verify"}, "short", kRefused)["error"];
+  const Json::Value error = json(
+      {"client", "add", "--no-redirect-uri", "--name", "x", "--scope", ""}, "", kRefused)["error"];
   EXPECT_EQ(error["code"], Json::Value(-2));
   EXPECT_EQ(error["exit"], Json::Value(kRefused));
-  EXPECT_EQ(error["message"], "Bad parameters");
-  EXPECT_EQ(error["hint"], "the token: 64 bytes, not 5");
+  EXPECT_EQ(error["message"], "a value is too short or too long");
+  EXPECT_EQ(error["hint"], "--scope: 1 to 2048 bytes, not 0");
 }
 
 TEST_F(Usage, AnAnswerThatCannotBeWritten) {

@@ -14,6 +14,7 @@
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/presence.h"
+#include "tools/keldoauth/storage/trouble.h"
 
 namespace tool {
 namespace {
@@ -26,6 +27,7 @@ struct Group {
 
 constexpr Group kGroups[] = {
     {"client", "Registered applications", clientCommands},
+    {"user", "What users have agreed to", userCommands},
     {"code", "Grant codes", codeCommands},
     {"token", "Access and refresh tokens", tokenCommands},
     {"log", "Audit log", logCommands},
@@ -49,9 +51,11 @@ void addCommands(CLI::App& app, Invocation& invocation) {
   for (const Group& group : kGroups) {
     CLI::App* const sub = app.add_subcommand(group.name, group.summary);
     sub->require_subcommand(1);
+    declare(option::kJson, *sub, invocation.arguments);
     for (const Command& command : group.commands()) addCommand(*sub, command, invocation);
   }
-  for (const auto command : {statusCommand, backupCommand, restoreCommand, rekeyCommand}) {
+  for (const auto command :
+       {purgeCommand, statusCommand, backupCommand, restoreCommand, rekeyCommand}) {
     addCommand(app, command(), invocation);
   }
 }
@@ -121,6 +125,8 @@ ExitCode run(const std::string& name, const Invocation& invocation) {
     return answer.exit;
   } catch (const Failure& failure) {
     return report(name, failure, asJson);
+  } catch (const KELDOAUTHSERVER::grants::Trouble& trouble) {
+    return report(name, failureOf(trouble), asJson);
   } catch (const std::exception& error) {
     return report(name, Failure(kUnavailable, error.what()), asJson);
   }
@@ -144,6 +150,7 @@ ExitCode answer(int argc, char** argv) {
   CLI::App app("Administers the storage of the authorisation service.", "keldoauth");
   app.set_version_flag("--version", "keldoauth " KELDOAUTH_VERSION);
   app.require_subcommand(1);
+  declare(option::kJson, app, invocation.arguments);
   addCommands(app, invocation);
   try {
     app.parse(argc, argv);

@@ -5,6 +5,8 @@
 #include <filesystem>
 #include <iostream>
 
+#include "grants/grants.h"
+#include "tools/keldoauth/commands/audit.h"
 #include "tools/keldoauth/commands/command.h"
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/terminal.h"
@@ -12,7 +14,7 @@
 #include "tools/keldoauth/storage/database_file.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
 #include "tools/keldoauth/storage/files.h"
-#include "tools/keldoauth/storage/stores.h"
+#include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
@@ -75,7 +77,8 @@ void printBackup(const Json::Value& document, std::ostream& out) {
 
 /// Makes an empty store where there is none, as any program of the service
 /// would.
-void requireTarget() try { Log(); } catch (const Failure& failure) {
+void requireTarget() try { grants::Grants(); } catch (const grants::Trouble& trouble) {
+  const Failure failure = failureOf(trouble);
   throw Failure(failure.exit, failure.what(),
                 "if the database is damaged, move it away together with its journal", failure.code);
 }
@@ -174,6 +177,7 @@ Answer restore(const Arguments& arguments) {
   replaceStore(copy);
 
   Answer answer{describe(path, std::filesystem::file_size(path))};
+  if (!isRecorded("restore", "Database restored")) answer.exit = kUnhealthy;
   const Json::Value fits = keyFits();
   answer.document["key_fits"] = fits;
   if (fits != Json::Value(true)) {

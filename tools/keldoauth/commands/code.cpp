@@ -2,41 +2,39 @@
 
 #include <ostream>
 
+#include "tools/keldoauth/commands/access.h"
 #include "tools/keldoauth/commands/command.h"
-#include "tools/keldoauth/commands/grants.h"
+#include "tools/keldoauth/commands/edit.h"
+#include "tools/keldoauth/commands/present.h"
 #include "tools/keldoauth/console/output.h"
-#include "tools/keldoauth/console/terminal.h"
-#include "tools/keldoauth/console/text.h"
-#include "tools/keldoauth/storage/bounds.h"
-#include "tools/keldoauth/storage/stores.h"
-#include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
-#include "utils/oauth_utils.h"
 
 using namespace KELDOAUTHSERVER;
+using grants::Grants;
 
 namespace tool {
 namespace {
 
 constexpr Columns kListColumns{
     {"ID", names::kId},
-    {"USERNAME", names::kUsername, Width::kShrinks},
-    {"CLIENT ID", names::kClientId, Width::kShrinks, identifierText},
+    {"USERNAME", names::kUsername, Width::kShrinks, userText},
+    {"CLIENT", "client_name", Width::kShrinks, clientText},
     {"SCOPE", names::kScope, Width::kShrinks},
-    {"CODE", names::kCode},
     {"EXPIRES", "expires_at", Width::kFixed, expiryText},
     {"LEFT", "expired", Width::kFixed, remainingText},
 };
 
 constexpr Columns kDetailColumns{
     {"id", names::kId},
-    {"username", names::kUsername},
+    {"username", names::kUsername, Width::kFixed, userText},
+    {"client", "client_name", Width::kFixed, clientText},
     {"client id", names::kClientId, Width::kFixed, identifierText},
     {"scope", names::kScope},
-    {"code", names::kCode},
+    {"issued", "since", Width::kFixed, sinceText},
     {"expires", "expires_at", Width::kFixed, expiryAndRemainingText},
     {"state", names::kState},
     {"ip", names::kIp},
+    {"stored by", "foreign", Width::kFixed, foreignText},
 };
 
 constexpr Columns kIssuedColumns{
@@ -44,162 +42,128 @@ constexpr Columns kIssuedColumns{
     {"expires", "expires_at", Width::kFixed, expiryAndRemainingText},
 };
 
-std::string described(const Json::Value& code) {
-  return "code " + code[names::kId].asString() + " of " +
-         printable(code[names::kUsername].asString());
+constexpr Columns kPairColumns{
+    {"access token", names::kAccessToken},
+    {"refresh token", names::kRefreshToken},
+    {"expires", "expires_at", Width::kFixed, expiryAndRemainingText},
+};
+
+// Issuing and redeeming -------------------------------------------------------------
+
+/// The one address of --redirect-uri, if there is one.
+std::optional<grants::RedirectAddress> redirectOf(const Arguments& arguments) {
+  if (arguments.redirectUris.empty()) return {};
+  if (arguments.redirectUris.size() == 1) {
+    return grants::RedirectAddress(arguments.redirectUris.front());
+  }
+  throw Failure(kUsage, "a code has one --redirect-uri");
 }
 
-// Issuing -------------------------------------------------------------------------
-
-bool addTo(Codes& codes, const Arguments& given, const std::string& client, Json::Value& issued) {
-  const std::string ip = given.ip.value_or("");
-  if (!given.expiresIn) {
-    return codes.Add(*given.username, client, *given.scope, *given.state, ip, issued) != 0;
-  }
-  return codes.Add(*given.username, client, *given.scope, getRandomStr(kIdentifierLength),
-                   expiryIn(*given.expiresIn), *given.state, ip, issued) != 0;
+/// The administrator hands the code over: no challenge is needed.
+grants::CodeRequest requestOf(const Arguments& arguments, const grants::ApplicationId& client) {
+  const auto redirect = redirectOf(arguments);
+  grants::CodeRequest request{grants::User(*arguments.username), client,
+                              grants::Scope(*arguments.scope),
+                              redirect.value_or(grants::RedirectAddress())};
+  request.named = redirect ? grants::AddressNamed::kInRequest : grants::AddressNamed::kImplied;
+  request.text = grants::CallerText(arguments.state.value_or(""));
+  request.from = grants::PeerAddress(arguments.ip.value_or(""));
+  request.lifetime = arguments.expiresIn;
+  request.waivesPkce = true;
+  return request;
 }
 
 Answer issue(const Arguments& arguments) {
-  const std::string client = clientToIssueFor(arguments);
-  Codes codes;
-  Json::Value issued;
-  if (!addTo(codes, arguments, client, issued)) {
-    throw refused(codes, outOfBounds({{"--username", *arguments.username, bounds::kUsername},
-                                      {"--scope", *arguments.scope, bounds::kScope},
-                                      {"--state", *arguments.state, bounds::kState}},
-                                     arguments.ip.value_or("")));
+  Grants grants;
+  const auto client = readableClient(grants, *arguments.client).identifier;
+  const auto issued = grants.codes.issue(requestOf(arguments, client));
+  if (!issued) throw refusedRequest(issued.refusal(), faultInGrant(arguments));
+  Answer answer;
+  Json::Value& code = answer.document["code"];
+  try {
+    if (const auto entry = grants.access.find(issued->code)) code = present(*entry);
+  } catch (const grants::Trouble&) {
+    code[names::kId] = Json::Value();  // the code is told whatever becomes of its row
   }
-  Json::Value rows(Json::arrayValue);
-  const bool isFound = codes.Get(issued[names::kCode].asString(), &rows) != 0 && !rows.empty();
-  return answerRow<Codes>(isFound ? rows[0U] : issued, Secrets::kShown);
+  code[names::kCode] = issued->code.text();
+  return answer;
 }
 
 void printIssued(const Json::Value& document, std::ostream& out) {
   const Json::Value& code = document["code"];
-  out << "Issued " << described(code) << ".\n";
+  out << "Issued " << describedAccess(code) << ".\n";
   printDetails(out, code, kIssuedColumns);
 }
 
-// Looking up ----------------------------------------------------------------------
-
-/// The row of a code, null when there is none.
-Json::Value findCode(Codes& codes, const std::string& code) {
-  Json::Value rows(Json::arrayValue);
-  if (codes.Get(code, &rows) == 0) {
-    throw libraryFailure(codes, outOfBounds({{"the code", code, bounds::kIdentifier}}));
+/// In the name of the application that it was issued to.
+Answer redeem(const Arguments& arguments) {
+  const grants::Code code(readShown(arguments.codeFile.value_or("-"), "Code"));
+  grants::Redemption redemption;
+  redemption.code = code;
+  redemption.redirect = redirectOf(arguments);
+  if (arguments.verifierFile) {
+    redemption.verifier = grants::Verifier(readShown(*arguments.verifierFile, "Verifier"));
   }
-  return rows.empty() ? Json::Value() : rows[0U];
+  Grants grants;
+  const auto entry = grants.access.find(code);
+  if (!entry) throw notGood("the code", {grants::Error::kInvalidGrant, grants::Why::kUnknown});
+  redemption.application = entry->application;
+  redemption.from = entry->from;
+  const auto pair = grants.codes.redeem(redemption);
+  if (!pair) throw notGood("the code", pair.refusal());
+  Answer answer;
+  answer.document["code"] = present(*entry);
+  answer.document["token"] = presentPair(grants, *pair);
+  return answer;
 }
 
-/// The row that ID or --code-file names.
-Json::Value chosenRow(Codes& codes, const Arguments& arguments) {
-  if (arguments.id.has_value() == arguments.codeFile.has_value()) {
-    throw Failure(kUsage, "name the code by either ID or --code-file");
-  }
-  if (arguments.id) return rowById(codes, *arguments.id);
-  Json::Value row = findCode(codes, readSecret(*arguments.codeFile, "Code"));
-  if (row.isNull()) throw notFound(Codes::kNoun);
-  return row;
+void printRedeemed(const Json::Value& document, std::ostream& out) {
+  out << "Redeemed " << describedAccess(document["code"]) << ".\n";
+  printDetails(out, document["code"], kDetailColumns);
+  out << "\nIssued " << describedAccess(document["token"]) << ".\n";
+  printDetails(out, document["token"], kPairColumns);
 }
+
+// For the table ---------------------------------------------------------------------
 
 void printCodes(const Json::Value& document, std::ostream& out) {
-  printList(out, document, Codes::kPlural, kListColumns);
-}
-
-Answer show(const Arguments& arguments) {
-  Codes codes;
-  return answerRow<Codes>(chosenRow(codes, arguments), shownIf(arguments.reveal));
+  printList(out, document, "codes", kListColumns);
 }
 
 void printCode(const Json::Value& document, std::ostream& out) {
   printDetails(out, document["code"], kDetailColumns);
 }
 
-// Changing ------------------------------------------------------------------------
-
-/// The form with an expiry doubles quotes, the other one stores what it is
-/// given: run last, it leaves the values that were not to change as they were.
-bool store(Codes& codes, long long id, const Grant& grant, const Arguments& given) {
-  const auto& [username, client, scope, state] = grant;
-  if (given.expiresIn &&
-      codes.Edit(id, username, client, scope, expiryIn(*given.expiresIn), state) == 0) {
-    return false;
-  }
-  return codes.Edit(id, username, client, scope, state) != 0;
+Answer list(const Arguments& arguments) {
+  return listAccess(Table::kCodes, arguments);
 }
 
-Answer edit(const Arguments& arguments) {
-  if (!arguments.username && !arguments.client && !arguments.scope && !arguments.state &&
-      !arguments.expiresIn) {
-    throw Failure(kUsage, "nothing to change",
-                  "--username, --client, --scope, --state or --expires-in");
-  }
-  const Arguments given = withClientIdentifier(arguments);
-  Codes codes;
-  Transaction transaction(codes);
-  const Grant grant = changedGrant(rowById(codes, *given.id), given);
-  if (!store(codes, *given.id, grant, given)) {
-    throw refused(codes, outOfBounds({{"--username", grant.username, bounds::kUsername},
-                                      {"--client", grant.client, bounds::kIdentifier},
-                                      {"--scope", grant.scope, bounds::kScope},
-                                      {"--state", grant.state, bounds::kState}}));
-  }
-  transaction.commit();
-  return answerRow<Codes>(rowById(codes, *given.id), Secrets::kMasked);
+Answer show(const Arguments& arguments) {
+  return showAccess(Table::kCodes, arguments);
 }
 
 Answer revoke(const Arguments& arguments) {
-  Codes codes;
-  const Json::Value row = chosenRow(codes, arguments);
-  confirm(arguments, "Revoke " + described(row) + "?");
-  Transaction transaction(codes);
-  requireUnchanged(codes, row);
-  if (codes.Revoke(idOf(row)) == 0) throw libraryFailure(codes);
-  transaction.commit();
-  return answerRow<Codes>(rowById(codes, idOf(row)), Secrets::kMasked);
-}
-
-void printRevoked(const Json::Value& document, std::ostream& out) {
-  out << "Revoked " << described(document["code"])
-      << "; it reads as expired and goes with the next purge.\n";
-}
-
-// Removing ------------------------------------------------------------------------
-
-/// Reads, checks and removes while nobody else writes: of many that redeem a
-/// code at the same moment one succeeds.
-Answer redeem(const Arguments& arguments) {
-  const std::string code = readSecret(arguments.codeFile.value_or("-"), "Code");
-  Codes codes;
-  Transaction transaction(codes);
-  const Json::Value row = findCode(codes, code);
-  if (row.isNull()) throw Failure(kInvalid, "code is unknown or was redeemed before");
-  if (Codes::isExpired(expiryOf(row), currentTime())) throw Failure(kInvalid, "code is expired");
-  removeSeen(codes, row);
-  transaction.commit();
-  return answerRow<Codes>(row, Secrets::kMasked);
-}
-
-void printRedeemed(const Json::Value& document, std::ostream& out) {
-  out << "Redeemed " << described(document["code"]) << ".\n";
-  printCode(document, out);
+  return revokeAccess(Table::kCodes, arguments);
 }
 
 Answer remove(const Arguments& arguments) {
-  Codes codes;
-  const Json::Value row = chosenRow(codes, arguments);
-  confirm(arguments, "Remove " + described(row) + "?");
-  removeUnchanged(codes, row);
-  return answerRow<Codes>(row, Secrets::kMasked);
+  return removeAccess(Table::kCodes, arguments);
+}
+
+Answer purge(const Arguments& arguments) {
+  return purgeAccess(Table::kCodes, arguments);
+}
+
+void printRevoked(const Json::Value& document, std::ostream& out) {
+  printEnded(Table::kCodes, "Revoked", document, out);
 }
 
 void printRemoved(const Json::Value& document, std::ostream& out) {
-  out << "Removed " << described(document["code"]) << ".\n";
+  printEnded(Table::kCodes, "Removed", document, out);
 }
 
 void printPurgedCodes(const Json::Value& document, std::ostream& out) {
-  printPurged(document, Codes::kNoun, kListColumns, out);
+  printPurged(Table::kCodes, kListColumns, document, out);
 }
 
 }  // namespace
@@ -209,33 +173,33 @@ const std::vector<Command>& codeCommands() {
   static const std::vector<Command> commands{
       {"issue",
        "Issue a code",
-       {required(kClient), required(kUsername), required(kScope), required(kState), kIp, kExpiresIn,
-        kJson},
+       {required(kClient), required(kUsername), required(kScope), kCodesRedirectUri, kState, kIp,
+        kExpiresIn, kJson},
        issue,
        printIssued},
-      {"list",
-       "List codes",
-       {kOfClient, kOfUser, kExpired, kReveal, kJson},
-       listGrants<Codes>,
-       printCodes},
-      {"show", "Show one code", {kId, kCodeFile, kReveal, kJson}, show, printCode},
+      {"list", "List codes", {kOfClient, kOfUser, kExpired, kRedeemed, kJson}, list, printCodes},
+      {"show", "Show one code", {kId, kCodeFile, kJson}, show, printCode},
       {"edit",
-       "Change what a code was granted for",
-       {required(kId), kClient, kUsername, kScope, kState, kNewExpiry, kJson},
-       edit,
+       "Change what another program's code was granted for",
+       {required(kId), kClient, kUsername, kScope, kNewState, kNewExpiry, kJson},
+       editCode,
        printCode},
       {"redeem",
-       "Take a valid code out, once: read from standard input or a file",
-       {kCodeFile, kJson},
+       "Redeem a code, once, for tokens: read from standard input or a file",
+       {kCodeFile, kCodesRedirectUri, kVerifierFile, kJson},
        redeem,
        printRedeemed},
-      {"revoke", "Let a code expire now", {kId, kCodeFile, kYes, kJson}, revoke, printRevoked},
-      {"remove", "Remove a code", {kId, kCodeFile, kYes, kJson}, remove, printRemoved},
-      {"purge",
-       "Remove expired codes",
-       {kGrace, kDryRun, kReveal, kYes, kJson},
-       purgeGrants<Codes>,
-       printPurgedCodes},
+      {"revoke",
+       "End codes",
+       {kIds, kCodeFile, kOfUser, kOfClient, kAll, kYes, kJson},
+       revoke,
+       printRevoked},
+      {"remove",
+       "Delete rows of codes, dead and redeemed ones too",
+       {kIds, kCodeFile, kYes, kJson},
+       remove,
+       printRemoved},
+      {"purge", "Delete expired codes", {kGrace, kDryRun, kYes, kJson}, purge, printPurgedCodes},
   };
   return commands;
 }

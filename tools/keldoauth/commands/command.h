@@ -42,9 +42,11 @@ struct Command {
 };
 
 const std::vector<Command>& clientCommands();
+const std::vector<Command>& userCommands();
 const std::vector<Command>& codeCommands();
 const std::vector<Command>& tokenCommands();
 const std::vector<Command>& logCommands();
+const Command& purgeCommand();
 const Command& statusCommand();
 const Command& backupCommand();
 const Command& restoreCommand();

@@ -17,7 +17,8 @@
 #include <utility>
 #include <vector>
 
-#include "core/oauth_db_basic.h"
+#include "core/transaction.h"
+#include "tools/keldoauth/commands/audit.h"
 #include "tools/keldoauth/commands/command.h"
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/terminal.h"
@@ -25,7 +26,7 @@
 #include "tools/keldoauth/storage/encrypted_values.h"
 #include "tools/keldoauth/storage/files.h"
 #include "tools/keldoauth/storage/key_files.h"
-#include "tools/keldoauth/storage/stores.h"
+#include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
@@ -160,12 +161,13 @@ std::size_t convertStore(const KeyFiles& keys, NextKey& next) {
   OAUTHDBBasic store;
   requireReady(store);
   Transaction transaction(store);
+  if (!transaction.Begin()) throw libraryFailure(store);
   const Sorted sorted = sortedValues(store, keys);
   if (sorted.next.empty()) next.draw();
   convertValues(store, sorted.current);
   requireAllReadable(store);
   next.keep();
-  transaction.commit();
+  if (!transaction.Commit()) throw libraryFailure(store);
   return sorted.current.size();
 }
 
@@ -189,6 +191,7 @@ Answer rekey(const Arguments& arguments) {
   verifyStore();
   replaceKey(keys);
   answer.document["key_file"] = keys.current;
+  if (!isRecorded("rekey", "Key changed")) answer.exit = kUnhealthy;
   return answer;
 }
 

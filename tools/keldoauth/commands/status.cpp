@@ -17,15 +17,6 @@ using namespace KELDOAUTHSERVER;
 namespace tool {
 namespace {
 
-struct LogClass {
-  int bit;
-  const char* name;
-};
-constexpr LogClass kLogClasses[] = {
-    {1, "store operations"}, {2, "rows read"}, {4, "checked arguments"}, {8, "SQL statements"}};
-constexpr int kNoClass = ~15;
-constexpr int kClassesWithSecrets = 2 | 4 | 8;
-
 Json::Value inspectLifetimes() {
   Json::Value lifetimes;
   for (const char* key : {names::kGrantCodeExpired, names::kTokenExpired}) {
@@ -61,6 +52,17 @@ std::string ownerText(const Json::Value& file) {
 
 std::string limitText(const Json::Value& table) {
   return table["limit"].asString() + " (" + table["limit_key"].asString() + ")";
+}
+
+/// What the numbers of the tables mean.
+void printMeanings(const Json::Value& tables, std::ostream& out) {
+  out << "\nAn expired row is dead: no good to anybody, gone with the next purge, and no\n"
+         "obstacle to new ones. A login counts as expired once it cannot be refreshed.\n";
+  const auto redeemed = static_cast<std::size_t>(tables[1]["redeemed"].asUInt64());
+  if (redeemed > 0) {
+    out << counted(redeemed, "redeemed code") << (redeemed == 1 ? " is" : " are")
+        << " kept to notice when one comes again.\n";
+  }
 }
 
 constexpr Columns kFileColumns{
@@ -116,46 +118,18 @@ void printStatus(const Json::Value& document, std::ostream& out) {
   out << '\n';
   if (database["ready"].asBool()) {
     printTable(out, database["tables"], kTableColumns);
+    printMeanings(database["tables"], out);
   } else {
     out << "Database     " << cellText(database["message"]) << '\n';
   }
   const Json::Value& lifetimes = document["lifetimes"];
-  out << "\nLifetimes    codes " << duration(numberIn(lifetimes[names::kGrantCodeExpired]))
-      << ", access tokens " << duration(numberIn(lifetimes[names::kTokenExpired])) << '\n';
+  out << "\nLifetimes    codes " << duration(lifetimes[names::kGrantCodeExpired].asInt64())
+      << ", access tokens " << duration(lifetimes[names::kTokenExpired].asInt64()) << '\n';
   printDiagnostics(document["diagnostics"], out);
   printProblems(document["problems"], out);
 }
 
 }  // namespace
-
-void Problems::add(const std::string& subject, const std::string& message,
-                   const std::string& hint) {
-  Json::Value problem;
-  problem["subject"] = subject;
-  problem["message"] = message;
-  problem["hint"] = hint;
-  list_.append(problem);
-}
-
-Json::Value inspectDiagnostics(Problems& problems) {
-  const int level = getLogLevel();
-  Json::Value document;
-  document["debug_flag"] = isDebugEnabled();
-  document["log_level"] = level;
-  document["log_classes"] = Json::arrayValue;
-  for (const LogClass& logClass : kLogClasses) {
-    if ((level & logClass.bit) != 0) document["log_classes"].append(logClass.name);
-  }
-  if (level > 0 && (level & kNoClass) != 0) {
-    problems.add("settings", "log_level: " + std::to_string(level) + " has bits without a meaning",
-                 "1, 2, 4 and 8 are the classes");
-  }
-  if (isDebugEnabled() && (level & kClassesWithSecrets) != 0) {
-    problems.add("diagnostics", "secrets and tokens are written to the system log",
-                 "remove " + std::string(names::kDebugFlagFile) + " and restart the programs");
-  }
-  return document;
-}
 
 const Command& statusCommand() {
   static const Command command{"status",        "Show files, tables, limits and what is wrong",

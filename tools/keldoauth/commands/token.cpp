@@ -2,43 +2,45 @@
 
 #include <ostream>
 
+#include "tools/keldoauth/commands/access.h"
 #include "tools/keldoauth/commands/command.h"
-#include "tools/keldoauth/commands/grants.h"
-#include "tools/keldoauth/commands/token.h"
+#include "tools/keldoauth/commands/edit.h"
+#include "tools/keldoauth/commands/present.h"
 #include "tools/keldoauth/console/output.h"
-#include "tools/keldoauth/console/terminal.h"
-#include "tools/keldoauth/console/text.h"
-#include "tools/keldoauth/storage/bounds.h"
-#include "tools/keldoauth/storage/stores.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
+using grants::Grants;
 
 namespace tool {
 namespace {
 
+constexpr char kLoginFlow[] = "authorization_code";
+constexpr char kOwnFlow[] = "client_credentials";
+
 constexpr Columns kListColumns{
     {"ID", names::kId},
-    {"USERNAME", names::kUsername, Width::kShrinks},
-    {"CLIENT ID", names::kClientId, Width::kShrinks, identifierText},
+    {"USERNAME", names::kUsername, Width::kShrinks, userText},
+    {"CLIENT", "client_name", Width::kShrinks, clientText},
     {"SCOPE", names::kScope, Width::kShrinks},
-    {"ACCESS", names::kAccessToken},
-    {"REFRESH", names::kRefreshToken},
     {"EXPIRES", "expires_at", Width::kFixed, expiryText},
     {"LEFT", "expired", Width::kFixed, remainingText},
+    {"ENDS IN", "ends", Width::kFixed, endText},
 };
 
 constexpr Columns kDetailColumns{
     {"id", names::kId},
-    {"username", names::kUsername},
+    {"username", names::kUsername, Width::kFixed, userText},
+    {"client", "client_name", Width::kFixed, clientText},
     {"client id", names::kClientId, Width::kFixed, identifierText},
     {"scope", names::kScope},
-    {"access token", names::kAccessToken},
-    {"refresh token", names::kRefreshToken},
+    {"since", "since", Width::kFixed, sinceText},
     {"expires", "expires_at", Width::kFixed, expiryAndRemainingText},
+    {"ends unused in", "ends", Width::kFixed, endText},
     {"flow type", names::kFlowType},
     {"state", names::kState},
     {"ip", names::kIp},
+    {"stored by", "foreign", Width::kFixed, foreignText},
 };
 
 constexpr Columns kIssuedColumns{
@@ -48,72 +50,102 @@ constexpr Columns kIssuedColumns{
 };
 
 constexpr Columns kVerifiedColumns{
-    {"username", names::kUsername},
+    {"username", names::kUsername, Width::kFixed, userText},
+    {"client", "client_name"},
     {"scope", names::kScope},
     {"state", names::kState},
+    {"expires", "expires_at", Width::kFixed, expiryAndRemainingText},
 };
 
-std::string described(const Json::Value& token) {
-  return "token " + token[names::kId].asString() + " of " +
-         printable(token[names::kUsername].asString());
+// Issuing ---------------------------------------------------------------------------
+
+grants::Outcome<grants::Pair> issueLogin(Grants& grants, const grants::ApplicationId& client,
+                                         const Arguments& arguments) {
+  if (!arguments.username || !arguments.scope) {
+    throw Failure(kUsage, "a user's login needs --username and --scope");
+  }
+  grants::LoginRequest request{grants::User(*arguments.username), client,
+                               grants::Scope(*arguments.scope)};
+  request.text = grants::CallerText(arguments.state.value_or(""));
+  request.from = grants::PeerAddress(arguments.ip.value_or(""));
+  request.lifetime = arguments.expiresIn;
+  return grants.tokens.issue(request);
+}
+
+grants::Outcome<grants::Pair> issueOwn(Grants& grants, const grants::ApplicationId& client,
+                                       const Arguments& arguments) {
+  if (arguments.username || arguments.state) {
+    throw Failure(kUsage, "a client's own token has neither --username nor --state");
+  }
+  grants::OwnTokenRequest request{client};
+  if (arguments.scope) request.scope = grants::Scope(*arguments.scope);
+  request.from = grants::PeerAddress(arguments.ip.value_or(""));
+  request.lifetime = arguments.expiresIn;
+  return grants.tokens.issueToItself(request);
+}
+
+Answer issue(const Arguments& arguments) {
+  const std::string flow = arguments.flowType.value_or(kLoginFlow);
+  if (flow != kLoginFlow && flow != kOwnFlow) {
+    throw Failure(kRefused, "--flow-type: there is no way to issue a token of that kind",
+                  std::string(kLoginFlow) + " or " + kOwnFlow);
+  }
+  Grants grants;
+  const auto client = readableClient(grants, *arguments.client).identifier;
+  const auto pair = (flow == kOwnFlow ? issueOwn : issueLogin)(grants, client, arguments);
+  if (!pair) throw refusedRequest(pair.refusal(), faultInGrant(arguments));
+  Answer answer;
+  answer.document["token"] = presentPair(grants, *pair);
+  return answer;
+}
+
+/// In the name of the application that it was issued to.
+Answer refresh(const Arguments& arguments) {
+  const std::string shown = readShown(arguments.refreshTokenFile.value_or("-"), "Refresh token");
+  Grants grants;
+  const auto entry = grants.access.find(grants::AnyToken(shown));
+  if (!entry) {
+    throw notGood("the refresh token", {grants::Error::kInvalidGrant, grants::Why::kUnknown});
+  }
+  grants::Refresh request{entry->application, grants::RefreshToken(shown)};
+  request.from = entry->from;
+  request.lifetime = arguments.expiresIn;
+  const auto pair = grants.tokens.refresh(request);
+  if (!pair) throw notGood("the refresh token", pair.refusal());
+  Answer answer;
+  answer.document["token"] = presentPair(grants, *pair);
+  return answer;
 }
 
 void printIssued(const Json::Value& document, std::ostream& out) {
   const Json::Value& token = document["token"];
-  out << "Issued " << described(token) << ".\n";
+  out << "Issued " << describedAccess(token) << ".\n";
   printDetails(out, token, kIssuedColumns);
 }
 
-// Looking up ----------------------------------------------------------------------
+// Verifying -------------------------------------------------------------------------
 
-Json::Value rowInFile(Tokens& tokens, const Arguments& arguments) {
-  Json::Value row = arguments.tokenFile
-                        ? findToken(tokens, &OAUTHDBToken::GetWithAccessToken,
-                                    readSecret(*arguments.tokenFile, "Access token"))
-                        : findToken(tokens, &OAUTHDBToken::GetWithRefreshToken,
-                                    readSecret(*arguments.refreshTokenFile, "Refresh token"));
-  if (row.isNull()) throw notFound(Tokens::kNoun);
-  return row;
-}
-
-/// The row that ID, --token-file or --refresh-token-file names.
-Json::Value chosenRow(Tokens& tokens, const Arguments& arguments) {
-  const int named = static_cast<int>(arguments.id.has_value()) +
-                    static_cast<int>(arguments.tokenFile.has_value()) +
-                    static_cast<int>(arguments.refreshTokenFile.has_value());
-  if (named != 1) {
-    throw Failure(kUsage, "name the token by one of ID, --token-file and --refresh-token-file");
-  }
-  return arguments.id ? rowById(tokens, *arguments.id) : rowInFile(tokens, arguments);
-}
-
-void printTokens(const Json::Value& document, std::ostream& out) {
-  printList(out, document, Tokens::kPlural, kListColumns);
-}
-
-Answer show(const Arguments& arguments) {
-  Tokens tokens;
-  return answerRow<Tokens>(chosenRow(tokens, arguments), shownIf(arguments.reveal));
-}
-
-void printToken(const Json::Value& document, std::ostream& out) {
-  printDetails(out, document["token"], kDetailColumns);
+Json::Value present(const grants::Bearer& bearer) {
+  Json::Value shown;
+  shown[names::kUsername] = bearer.user ? Json::Value(bearer.user->text()) : Json::Value();
+  shown[names::kClientId] = bearer.application.text();
+  shown["client_name"] = bearer.applicationName.text();
+  shown[names::kScope] = bearer.scope.text();
+  shown[names::kState] = bearer.text.text();
+  shown["issued"] = secondsOrNull(bearer.issued.value_or(0));
+  shown[names::kExpiredTime] = Json::Int64(bearer.expires);
+  shown["expires_at"] = timeOrNull(bearer.expires);
+  return shown;
 }
 
 Answer verify(const Arguments& arguments) {
-  const std::string token = readSecret(arguments.tokenFile.value_or("-"), "Access token");
-  Tokens tokens;
+  const grants::AccessToken token(readShown(arguments.tokenFile.value_or("-"), "Access token"));
+  const auto bearer = Grants().tokens.verify(token);
+  if (!bearer) throw notGood("the access token", bearer.refusal());
   Answer answer;
-  Json::Value holder;
-  if (tokens.Verify(token, holder)) {
-    answer.document["valid"] = true;
-    answer.document["token"] = holder;
-    return answer;
-  }
-  const int code = holder[names::kErrCode].asInt();
-  const std::string message = holder[names::kErrMsg].asString();
-  if (code == errors::kAccessTokenExpired.code) throw Failure(kInvalid, message, "", code);
-  throw libraryFailure(code, message, outOfBounds({{"the token", token, bounds::kIdentifier}}));
+  answer.document["valid"] = true;
+  answer.document["token"] = present(*bearer);
+  return answer;
 }
 
 void printVerified(const Json::Value& document, std::ostream& out) {
@@ -121,52 +153,38 @@ void printVerified(const Json::Value& document, std::ostream& out) {
   printDetails(out, document["token"], kVerifiedColumns);
 }
 
-// Changing ------------------------------------------------------------------------
+// For the table ---------------------------------------------------------------------
 
-/// The form with an expiry doubles quotes, the other one stores what it is
-/// given: run last, it leaves the values that were not to change as they were.
-bool store(Tokens& tokens, long long id, const Grant& grant, const std::string& flowType,
-           const Arguments::Number& lifetime) {
-  const auto& [username, client, scope, state] = grant;
-  if (lifetime && !tokens.Edit(id, username, client, scope, expiryIn(*lifetime), flowType, state)) {
-    return false;
-  }
-  return tokens.Edit(id, username, client, scope, flowType, state);
+void printTokens(const Json::Value& document, std::ostream& out) {
+  printList(out, document, "tokens", kListColumns);
 }
 
-Answer edit(const Arguments& arguments) {
-  if (!arguments.username && !arguments.client && !arguments.scope && !arguments.flowType &&
-      !arguments.state && !arguments.expiresIn) {
-    throw Failure(kUsage, "nothing to change",
-                  "--username, --client, --scope, --flow-type, --state or --expires-in");
-  }
-  const Arguments given = withClientIdentifier(arguments);
-  Tokens tokens;
-  Transaction transaction(tokens);
-  const Json::Value row = rowById(tokens, *given.id);
-  const Grant grant = changedGrant(row, given);
-  const std::string flowType = given.flowType.value_or(row[names::kFlowType].asString());
-  if (!store(tokens, *given.id, grant, flowType, given.expiresIn)) {
-    throw refused(tokens, faultInToken(grant, flowType));
-  }
-  transaction.commit();
-  return answerRow<Tokens>(rowById(tokens, *given.id), Secrets::kMasked);
+void printToken(const Json::Value& document, std::ostream& out) {
+  printDetails(out, document["token"], kDetailColumns);
+}
+
+Answer list(const Arguments& arguments) {
+  return listAccess(Table::kTokens, arguments);
+}
+
+Answer show(const Arguments& arguments) {
+  return showAccess(Table::kTokens, arguments);
 }
 
 Answer revoke(const Arguments& arguments) {
-  Tokens tokens;
-  const Json::Value row = chosenRow(tokens, arguments);
-  confirm(arguments, "Revoke " + described(row) + "?");
-  removeUnchanged(tokens, row);
-  return answerRow<Tokens>(row, Secrets::kMasked);
+  return revokeAccess(Table::kTokens, arguments);
+}
+
+Answer purge(const Arguments& arguments) {
+  return purgeAccess(Table::kTokens, arguments);
 }
 
 void printRevoked(const Json::Value& document, std::ostream& out) {
-  out << "Revoked " << described(document["token"]) << "; its row is gone.\n";
+  printEnded(Table::kTokens, "Revoked", document, out);
 }
 
 void printPurgedTokens(const Json::Value& document, std::ostream& out) {
-  printPurged(document, Tokens::kNoun, kListColumns, out);
+  printPurged(Table::kTokens, kListColumns, document, out);
 }
 
 }  // namespace
@@ -176,18 +194,13 @@ const std::vector<Command>& tokenCommands() {
   static const std::vector<Command> commands{
       {"issue",
        "Issue an access and a refresh token",
-       {required(kClient), required(kUsername), required(kScope), required(kState),
-        required(kFlowType), kIp, kExpiresIn, kJson},
-       issueToken,
+       {required(kClient), kUsername, kScope, kState, kFlow, kIp, kExpiresIn, kJson},
+       issue,
        printIssued},
-      {"list",
-       "List tokens",
-       {kOfClient, kOfUser, kExpired, kReveal, kJson},
-       listGrants<Tokens>,
-       printTokens},
+      {"list", "List tokens", {kOfClient, kOfUser, kExpired, kJson}, list, printTokens},
       {"show",
        "Show one pair of tokens",
-       {kId, kTokenFile, kRefreshTokenFile, kReveal, kJson},
+       {kId, kTokenFile, kRefreshTokenFile, kJson},
        show,
        printToken},
       {"verify",
@@ -196,24 +209,24 @@ const std::vector<Command>& tokenCommands() {
        verify,
        printVerified},
       {"edit",
-       "Change what a pair was granted for",
-       {required(kId), kClient, kUsername, kScope, kState, kFlowType, kNewExpiry, kJson},
-       edit,
+       "Change what another program's pair was granted for",
+       {required(kId), kClient, kUsername, kScope, kNewState, kNewFlowType, kNewExpiry, kJson},
+       editToken,
        printToken},
       {"refresh",
        "Replace a pair by a new one, once: refresh token from standard input or a file",
        {kRefreshTokenFile, kExpiresIn, kJson},
-       refreshToken,
+       refresh,
        printIssued},
       {"revoke",
-       "Remove a pair: neither of its tokens is good any more",
-       {kId, kTokenFile, kRefreshTokenFile, kYes, kJson},
+       "End pairs: neither of their tokens is good any more",
+       {kIds, kTokenFile, kRefreshTokenFile, kOfUser, kOfClient, kAll, kYes, kJson},
        revoke,
        printRevoked},
       {"purge",
-       "Remove expired pairs, refresh tokens included",
-       {kGrace, kDryRun, kReveal, kYes, kJson},
-       purgeGrants<Tokens>,
+       "Delete expired pairs, once they cannot be refreshed any more",
+       {kGrace, kDryRun, kYes, kJson},
+       purge,
        printPurgedTokens},
   };
   return commands;

@@ -1,9 +1,11 @@
 #include "tools/keldoauth/console/clock.h"
 
 #include <array>
+#include <charconv>
 #include <cstdio>
-#include <cstdlib>
 #include <ctime>
+#include <string_view>
+#include <system_error>
 
 namespace tool {
 namespace {
@@ -11,6 +13,7 @@ namespace {
 constexpr long long kMinute = 60;
 constexpr long long kHour = 60 * kMinute;
 constexpr long long kDay = 24 * kHour;
+constexpr long long kWeek = 7 * kDay;
 
 struct Date {
   long long year;
@@ -36,6 +39,16 @@ Date dateOf(long long days) {
           static_cast<int>(dayOfYear - (153 * monthFromMarch + 2) / 5 + 1)};
 }
 
+/// The way back, of a year after 1.
+long long daysUntil(const Date& date) {
+  const long long year = date.month <= 2 ? date.year - 1 : date.year;
+  const long long yearOfEra = year % 400;
+  const long long monthFromMarch = date.month > 2 ? date.month - 3 : date.month + 9;
+  const long long dayOfYear = (153 * monthFromMarch + 2) / 5 + date.day - 1;
+  return year / 400 * 146097 + yearOfEra * 365 + yearOfEra / 4 - yearOfEra / 100 + dayOfYear -
+         719468;
+}
+
 struct Unit {
   long long seconds;
   char letter;
@@ -46,15 +59,64 @@ std::string amount(long long seconds, const Unit& unit) {
   return std::to_string(seconds / unit.seconds) + unit.letter;
 }
 
+/// 0 where there are no digits.
+int digitsAt(std::string_view text, std::size_t position, std::size_t count) {
+  int number = 0;
+  std::from_chars(text.data() + position, text.data() + position + count, number);
+  return number;
+}
+
+/// What is left out is the start of the day or minute. Whatever is no date, the
+/// 31st of April for one, does not come back as it was.
+std::optional<long long> isoMoment(std::string text) {
+  constexpr std::string_view kMidnight = "0000-00-00T00:00:00Z";
+  constexpr std::size_t kDateLength = 10;
+  constexpr std::size_t kMinuteLength = 16;
+  if (!text.empty() && text.back() == 'Z') text.pop_back();
+  const std::size_t length = text.size();
+  const bool isWhole =
+      length == kDateLength || length == kMinuteLength || length == kMidnight.size() - 1;
+  if (!isWhole) return {};
+  text += kMidnight.substr(length);
+  if (text[kDateLength] == ' ') text[kDateLength] = 'T';
+  const Date date{digitsAt(text, 0, 4), digitsAt(text, 5, 2), digitsAt(text, 8, 2)};
+  if (date.year < 1970) return {};
+  const long long seconds = daysUntil(date) * kDay + digitsAt(text, 11, 2) * kHour +
+                            digitsAt(text, 14, 2) * kMinute + digitsAt(text, 17, 2);
+  return isoTime(seconds) == text ? std::optional<long long>(seconds) : std::nullopt;
+}
+
+/// 0 for a letter that is no unit's.
+long long secondsOf(char unit) {
+  if (unit == 'w') return kWeek;
+  for (const Unit& known : kUnits) {
+    if (known.letter == unit) return known.seconds;
+  }
+  return 0;
+}
+
+/// The sum of "1h", "30m" and so on, blanks between them allowed.
+std::optional<long long> durationIn(const std::string& text) {
+  constexpr long long kLongest = 100 * 366 * kDay;
+  long long sum = 0;
+  const char* at = text.data();
+  const char* const end = at + text.size();
+  while (at != end) {
+    long long amount = 0;
+    const auto [unit, error] = std::from_chars(at, end, amount);
+    const long long seconds = error == std::errc() && unit != end ? secondsOf(*unit) : 0;
+    if (seconds == 0 || amount < 0 || amount > (kLongest - sum) / seconds) return {};
+    sum += amount * seconds;
+    at = unit + 1;
+    while (at != end && *at == ' ') ++at;
+  }
+  return text.empty() ? std::nullopt : std::optional<long long>(sum);
+}
+
 }  // namespace
 
 long long currentTime() {
   return static_cast<long long>(std::time(nullptr));
-}
-
-long long numberIn(const Json::Value& text) {
-  if (text.isIntegral()) return text.asInt64();
-  return text.isString() ? std::strtoll(text.asCString(), nullptr, 10) : 0;
 }
 
 std::string isoTime(long long seconds) {
@@ -77,6 +139,12 @@ std::string duration(long long seconds) {
     return amount(seconds, kUnits[i]) + (isWhole ? "" : " " + amount(rest, kUnits[i + 1]));
   }
   return amount(seconds, kUnits.back());
+}
+
+std::optional<long long> momentIn(const std::string& text, long long now) {
+  if (const auto moment = isoMoment(text)) return moment;
+  const auto ago = durationIn(text);
+  return ago ? std::optional<long long>(now - *ago) : std::nullopt;
 }
 
 }  // namespace tool

@@ -8,20 +8,16 @@
 #include <stdexcept>
 #include <string>
 
-namespace KELDOAUTHSERVER {
-class OAUTHDBBasic;
-}
-
 namespace tool {
 
 /// Scripts branch on these; the manual page lists them.
 enum ExitCode : int {
   kOk = 0,
   kUsage = 1,         // the command line or an input file makes no sense
-  kRefused = 2,       // the library does not accept the values, or the table is full
+  kRefused = 2,       // the values are not accepted, or the table is full
   kNotFound = 3,      // no such client, code or token
   kUnavailable = 4,   // the database or the cipher does not work
-  kInvalid = 5,       // a token or code is unknown or expired
+  kInvalid = 5,       // a token or code is not good
   kUnhealthy = 6,     // `status`, `restore` or `backup` found something wrong
   kNotConfirmed = 7,  // a destructive command was not confirmed
   kNotWritten = 8,    // the answer could not be written to standard output
@@ -44,13 +40,6 @@ class Failure : public std::runtime_error {
   std::optional<int> code;  // the library's, when it set one
   std::string hint;         // what to do about it; may be empty
 };
-
-/// What `store` says about the operation that just failed. When it refused the
-/// values, `explanation` (may be empty) says which of them is at fault.
-Failure libraryFailure(KELDOAUTHSERVER::OAUTHDBBasic& store, const std::string& explanation = {});
-
-/// The same for a code and message from a result document.
-Failure libraryFailure(int code, const std::string& message, const std::string& explanation = {});
 
 /// "No such <what>".
 Failure notFound(const std::string& what);

@@ -32,6 +32,18 @@ struct Declaration {
   CLI::Option* operator()(Arguments::Text Arguments::*member) const {
     return app.add_option(option.name, arguments.*member, option.help);
   }
+  /// Each time one value: what follows is another argument's.
+  CLI::Option* operator()(Arguments::Texts Arguments::*member) const {
+    return app.add_option(option.name, arguments.*member, option.help)->allow_extra_args(false);
+  }
+  CLI::Option* operator()(Arguments::Numbers Arguments::*member) const {
+    const auto take = [this_ = *this, member](const std::vector<std::string>& texts) {
+      for (const std::string& text : texts) {
+        (this_.arguments.*member).push_back(parseNumber(text, this_.option));
+      }
+    };
+    return app.add_option_function<std::vector<std::string>>(option.name, take, option.help);
+  }
   CLI::Option* operator()(Arguments::Number Arguments::*member) const {
     const auto take = [this_ = *this, member](const std::string& text) {
       this_.arguments.*member = parseNumber(text, this_.option);

@@ -7,6 +7,7 @@
 #include <optional>
 #include <string>
 #include <variant>
+#include <vector>
 
 namespace CLI {
 class App;
@@ -18,18 +19,26 @@ namespace tool {
 struct Arguments {
   using Text = std::optional<std::string>;
   using Number = std::optional<long long>;
+  using Texts = std::vector<std::string>;
+  using Numbers = std::vector<long long>;
 
-  bool json = false;
-  bool reveal = false;
-  bool yes = false;
+  bool all = false;
   bool disabled = false;
   bool dryRun = false;
   bool expired = false;
+  bool isPublic = false;
+  bool json = false;
+  bool noRedirectUri = false;
+  bool redeemed = false;
+  bool reveal = false;
+  bool yes = false;
 
   Number id;
   Number expiresIn;
   Number grace;
   Number last;
+
+  Numbers ids;
 
   Text client;
   Text clientId;
@@ -40,13 +49,19 @@ struct Arguments {
   Text flowType;
   Text ip;
   Text message;
-  Text redirectUri;
+  Text pkce;
   Text refreshTokenFile;
   Text scope;
   Text secretFile;
+  Text since;
   Text state;
   Text tokenFile;
+  Text until;
   Text username;
+  Text verifierFile;
+
+  Texts logoutUris;
+  Texts redirectUris;
 };
 
 /// One option. A name without dashes is a positional argument.
@@ -54,7 +69,8 @@ struct Option {
   const char* name;
   const char* placeholder;
   const char* help;
-  std::variant<bool Arguments::*, Arguments::Text Arguments::*, Arguments::Number Arguments::*>
+  std::variant<bool Arguments::*, Arguments::Text Arguments::*, Arguments::Number Arguments::*,
+               Arguments::Texts Arguments::*, Arguments::Numbers Arguments::*>
       target;
   bool isRequired = false;
   long long highest = 9223372036854775807;  // of a number
@@ -71,17 +87,18 @@ constexpr long long kCentury = 3155760000;  // seconds
 
 inline constexpr Option kJson{"--json", "", "Write one JSON document to standard output",
                               &Arguments::json};
-inline constexpr Option kReveal{"--reveal", "", "Show secrets, codes and tokens in full",
-                                &Arguments::reveal};
+inline constexpr Option kReveal{"--reveal", "", "Show secrets in full", &Arguments::reveal};
 inline constexpr Option kYes{"--yes,-y", "", "Do not ask", &Arguments::yes};
 
 inline constexpr Option kId{"ID", "", "Row id, as 'list' shows it", &Arguments::id};
-inline constexpr Option kClientArgument{"CLIENT", "", "Row id or 64-character client identifier",
+inline constexpr Option kIds{"ID", "", "Row ids, as 'list' shows them", &Arguments::ids};
+inline constexpr Option kClientArgument{"CLIENT", "", "Identifier, row id or name",
                                         &Arguments::client};
+inline constexpr Option kUserArgument{"NAME", "", "A user", &Arguments::username};
 inline constexpr Option kBackupFile{"FILE", "", "A copy of the database", &Arguments::file};
 inline constexpr Option kMessage{"MESSAGE", "", "Text of the entry", &Arguments::message};
 
-inline constexpr Option kClient{"--client", "CLIENT", "Row id or 64-character client identifier",
+inline constexpr Option kClient{"--client", "CLIENT", "Client: identifier, row id or name",
                                 &Arguments::client};
 inline constexpr Option kClientId{"--client-id", "TEXT",
                                   "Identifier of 64 bytes instead of a generated one",
@@ -90,21 +107,44 @@ inline constexpr Option kSecretFile{"--secret-file", "FILE",
                                     "Read a secret of 64 bytes from FILE ('-': standard input) "
                                     "instead of generating one",
                                     &Arguments::secretFile};
-inline constexpr Option kRedirectUri{"--redirect-uri", "URI", "Redirect address, 3 to 2048 bytes",
-                                     &Arguments::redirectUri};
+inline constexpr Option kRedirectUri{"--redirect-uri", "URI",
+                                     "Redirect address with its scheme; may be given several times",
+                                     &Arguments::redirectUris};
+inline constexpr Option kNoRedirectUri{"--no-redirect-uri", "",
+                                       "No redirect address: it only acts for itself",
+                                       &Arguments::noRedirectUri};
+inline constexpr Option kLogoutUri{"--logout-uri", "URI",
+                                   "Where users may be sent after logging out; several times, too",
+                                   &Arguments::logoutUris};
+inline constexpr Option kPublic{"--public", "", "It has no secret: its users hold all its code",
+                                &Arguments::isPublic};
+inline constexpr Option kPkce{"--pkce", "required|optional",
+                              "Whether it must ask for codes with a challenge (RFC 7636)",
+                              &Arguments::pkce};
 inline constexpr Option kScope{"--scope", "TEXT", "Scope, 1 to 2048 bytes", &Arguments::scope};
-inline constexpr Option kDisplayName{"--name", "TEXT", "Display name, 1 to 64 bytes",
+inline constexpr Option kDisplayName{"--name", "TEXT", "Name, 1 to 64 bytes",
                                      &Arguments::displayName};
 inline constexpr Option kDisabled{"--disabled", "", "Register it switched off",
                                   &Arguments::disabled};
 
 inline constexpr Option kUsername{"--username", "NAME", "User who granted it, 1 to 256 bytes",
                                   &Arguments::username};
-inline constexpr Option kState{"--state", "TEXT", "State of the request, 1 to 2048 bytes",
+inline constexpr Option kState{"--state", "TEXT", "A text that goes along, at most 512 bytes",
                                &Arguments::state};
-inline constexpr Option kFlowType{"--flow-type", "TEXT",
-                                  "Grant flow, such as authorization_code, 1 to 32 bytes",
-                                  &Arguments::flowType};
+inline constexpr Option kNewState{"--state", "TEXT", "State of the request, 1 to 2048 bytes",
+                                  &Arguments::state};
+inline constexpr Option kFlow{"--flow-type", "TEXT",
+                              "authorization_code: a user's login (the default); "
+                              "client_credentials: for the client itself",
+                              &Arguments::flowType};
+inline constexpr Option kNewFlowType{"--flow-type", "TEXT", "Grant flow, 1 to 32 bytes",
+                                     &Arguments::flowType};
+inline constexpr Option kCodesRedirectUri{"--redirect-uri", "URI",
+                                          "Redirect address that the code was asked with",
+                                          &Arguments::redirectUris};
+inline constexpr Option kVerifierFile{"--verifier-file", "FILE",
+                                      "Read the verifier of the code's challenge from FILE",
+                                      &Arguments::verifierFile};
 inline constexpr Option kIp{"--ip", "ADDRESS", "IPv4 or IPv6 address of the requester",
                             &Arguments::ip};
 inline constexpr Option kExpiresIn{
@@ -125,17 +165,25 @@ inline constexpr Option kRefreshTokenFile{"--refresh-token-file", "FILE",
 
 inline constexpr Option kOfUser{"--username", "NAME", "Only those of this user",
                                 &Arguments::username};
-inline constexpr Option kOfClient{
-    "--client", "CLIENT", "Only those of this client (row id or identifier)", &Arguments::client};
+inline constexpr Option kOfClient{"--client", "CLIENT",
+                                  "Only those of this client (identifier, row id or name)",
+                                  &Arguments::client};
+inline constexpr Option kAll{"--all", "", "All that there are", &Arguments::all};
+inline constexpr Option kRedeemed{"--redeemed", "", "Also those that were redeemed",
+                                  &Arguments::redeemed};
 inline constexpr Option kExpired{"--expired", "", "Only expired ones", &Arguments::expired};
 inline constexpr Option kDryRun{"--dry-run", "", "List what would go and keep it",
                                 &Arguments::dryRun};
-inline constexpr Option kGrace{"--grace",         "SECONDS", "Keep what expired less than this ago",
-                               &Arguments::grace, false,     kCentury};
+inline constexpr Option kGrace{
+    "--grace",         "SECONDS", "Keep what has been dead for less than this",
+    &Arguments::grace, false,     kCentury};
 
 inline constexpr Option kContains{"--contains", "TEXT",
                                   "Only messages with TEXT in them ('%' and '_' are wildcards)",
                                   &Arguments::contains};
+inline constexpr Option kSince{
+    "--since", "WHEN", "Only from then on: 1h, 2d, or 2026-01-31T08:15 (UTC)", &Arguments::since};
+inline constexpr Option kUntil{"--until", "WHEN", "Only up to then", &Arguments::until};
 inline constexpr Option kLast{"--last", "COUNT", "Only the newest COUNT entries", &Arguments::last};
 
 }  // namespace option

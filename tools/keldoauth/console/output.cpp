@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <iterator>
 #include <limits>
 #include <numeric>
 #include <ostream>
@@ -20,7 +21,10 @@ using Line = std::vector<std::string>;
 using Widths = std::vector<std::size_t>;
 
 constexpr std::size_t kGap = 2;
-constexpr std::size_t kNarrowest = 6;  // of a column that gives way
+
+// Of columns that give way.
+constexpr std::size_t kNarrowest = 6;
+constexpr std::size_t kNarrowestWrapped = 16;
 
 /// COLUMNS has the last word, as with other tools; a pipe takes any width.
 std::size_t terminalWidth() {
@@ -37,7 +41,11 @@ std::size_t terminalWidth() {
 }
 
 std::string textOf(const Json::Value& row, const Column& column) {
-  return column.render != nullptr ? printable(column.render(row)) : cellText(row[column.member]);
+  return cellText(column.render != nullptr ? Json::Value(column.render(row)) : row[column.member]);
+}
+
+std::size_t narrowest(const Column& column) {
+  return column.width == Width::kWraps ? kNarrowestWrapped : kNarrowest;
 }
 
 std::vector<Line> linesOf(const Json::Value& rows, const Columns& columns) {
@@ -60,18 +68,21 @@ Widths naturalWidths(const std::vector<Line>& lines) {
   return widths;
 }
 
-/// Takes one column after the other from the widest that may shrink.
-void shrinkTo(std::size_t available, const Columns& columns, Widths& widths) {
+/// Takes one column after the other from the widest that may shrink. False when
+/// that is not enough.
+bool shrinkTo(std::size_t available, const Columns& columns, Widths& widths) {
   std::size_t total = std::accumulate(widths.begin(), widths.end(), kGap * (widths.size() - 1));
   for (; total > available; --total) {
     std::size_t* widest = nullptr;
     for (std::size_t i = 0; i < widths.size(); ++i) {
-      if (columns.begin()[i].width == Width::kFixed || widths[i] <= kNarrowest) continue;
+      const Column& column = columns.begin()[i];
+      if (column.width == Width::kFixed || widths[i] <= narrowest(column)) continue;
       if (widest == nullptr || widths[i] > *widest) widest = &widths[i];
     }
-    if (widest == nullptr) return;
+    if (widest == nullptr) return false;
     --*widest;
   }
+  return true;
 }
 
 void printLine(std::ostream& out, const Line& line, const Widths& widths) {
@@ -86,6 +97,31 @@ void printLine(std::ostream& out, const Line& line, const Widths& widths) {
     reached += widths[i] - (cell.empty() ? 0 : displayWidth(cell)) + kGap;
   }
   out << text << '\n';
+}
+
+/// With further lines for what its last cell still has to say.
+void printWrapped(std::ostream& out, const Line& first, const Widths& widths) {
+  Line line = first;
+  for (const std::string& part : wrapped(first.back(), widths.back())) {
+    line.back() = part;
+    printLine(out, line, widths);
+    line.assign(line.size(), "");
+  }
+}
+
+/// Where a line of all columns has no room: a line for each value, its title in
+/// front, and an empty line between two rows.
+void printRecords(std::ostream& out, const std::vector<Line>& lines, std::size_t available) {
+  const Line& titles = lines.front();
+  std::size_t widest = 0;
+  for (const std::string& title : titles) widest = std::max(widest, displayWidth(title));
+  const std::size_t room = std::max(available, widest + kGap + kNarrowest) - widest - kGap;
+  for (std::size_t row = 1; row < lines.size(); ++row) {
+    if (row > 1) out << '\n';
+    for (std::size_t i = 0; i < titles.size(); ++i) {
+      printWrapped(out, {titles[i], lines[row][i]}, {widest, room});
+    }
+  }
 }
 
 /// The one control character that JSON's writers let through. It stands in
@@ -113,8 +149,10 @@ std::string cellText(const Json::Value& value) {
 void printTable(std::ostream& out, const Json::Value& rows, const Columns& columns) {
   const std::vector<Line> lines = linesOf(rows, columns);
   Widths widths = naturalWidths(lines);
-  shrinkTo(terminalWidth(), columns, widths);
-  for (const Line& line : lines) printLine(out, line, widths);
+  const std::size_t available = terminalWidth();
+  if (!shrinkTo(available, columns, widths)) return printRecords(out, lines, available);
+  const bool wraps = std::prev(columns.end())->width == Width::kWraps;
+  for (const Line& line : lines) (wraps ? printWrapped : printLine)(out, line, widths);
 }
 
 void printList(std::ostream& out, const Json::Value& document, const char* plural,

@@ -13,13 +13,14 @@
 
 namespace tool {
 
-enum class Width { kFixed, kShrinks };
+/// What happens to a column where the terminal is too narrow: nothing; its texts
+/// are cut; they go on in the next line.
+enum class Width { kFixed, kShrinks, kWraps };
 
 /// A column of a table or a line of a list: `member` of each row under `title`.
 struct Column {
   const char* title;
   const char* member;
-  /// A column that shrinks gives way when the terminal is too narrow.
   Width width = Width::kFixed;
   /// Makes the text from the whole row; without it the member is shown.
   std::string (*render)(const Json::Value& row) = nullptr;
@@ -32,7 +33,8 @@ using Columns = std::initializer_list<Column>;
 std::string cellText(const Json::Value& value);
 
 /// One line per row below a line of titles. On a terminal (or with COLUMNS set)
-/// shrinking columns are cut until a line fits.
+/// columns give way until a line fits; where that is not enough, each row takes
+/// a line per column.
 void printTable(std::ostream& out, const Json::Value& rows, const Columns& columns);
 
 /// The rows in the member `plural` as a table, or "No <plural>.".

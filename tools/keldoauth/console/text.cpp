@@ -81,6 +81,19 @@ std::size_t widthOf(const Character& character) {
   return static_cast<std::size_t>(std::max(wcwidth(character.code), 0));
 }
 
+/// The bytes of the characters that have room, one at least.
+std::size_t bytesWithin(std::string_view text, std::size_t width) {
+  std::size_t used = 0;
+  std::size_t bytes = 0;
+  while (bytes < text.size()) {
+    const Character character = firstCharacter(text.substr(bytes));
+    used += widthOf(character);
+    if (used > width && bytes > 0) break;
+    bytes += character.bytes;
+  }
+  return bytes;
+}
+
 }  // namespace
 
 std::string printable(const std::string& text) {
@@ -107,6 +120,20 @@ std::size_t displayWidth(const std::string& text) {
   return width;
 }
 
+std::vector<std::string> wrapped(const std::string& text, std::size_t width) {
+  std::vector<std::string> lines;
+  std::string_view rest = text;
+  do {
+    std::size_t end = bytesWithin(rest, width);
+    const std::size_t blank = end < rest.size() ? rest.rfind(' ', end) : std::string_view::npos;
+    const bool hasBlank = blank != std::string_view::npos && blank > 0;
+    if (hasBlank) end = blank;
+    lines.emplace_back(rest.substr(0, end));
+    rest.remove_prefix(hasBlank ? end + 1 : end);
+  } while (!rest.empty());
+  return lines;
+}
+
 std::string fitted(const std::string& text, std::size_t width) {
   if (displayWidth(text) <= width) return text;
 
@@ -128,15 +155,6 @@ std::string masked(const std::string& secret) {
   const bool showsStart =
       secret.size() >= kShortest && std::all_of(secret.begin(), secret.begin() + kShown, isPlain);
   return (showsStart ? secret.substr(0, kShown) : std::string()).append(kEllipsis);
-}
-
-std::string withoutDoubledQuotes(const std::string& text) {
-  std::string single;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    single += text[i];
-    if (text.compare(i, 2, "''") == 0) ++i;
-  }
-  return single;
 }
 
 }  // namespace tool

@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <string>
+#include <vector>
 
 namespace tool {
 
@@ -20,13 +21,13 @@ std::size_t displayWidth(const std::string& text);
 /// A printable text cut to `width` columns, the cut marked with an ellipsis.
 std::string fitted(const std::string& text, std::size_t width);
 
+/// A printable text in lines of at most `width` columns, broken at blanks where
+/// there are some. At least one line.
+std::vector<std::string> wrapped(const std::string& text, std::size_t width);
+
 /// The first six characters and an ellipsis, so that two secrets can be told
 /// apart; only the ellipsis when the text is short or not plain ASCII.
 std::string masked(const std::string& secret);
-
-/// `text` with each doubled single quote made one: the value as it was before
-/// the library stored it.
-std::string withoutDoubledQuotes(const std::string& text);
 
 }  // namespace tool
 

@@ -2,13 +2,10 @@
 
 #include <string>
 
-#include "core/oauth_db_basic.h"
-#include "core/oauth_errors.h"
-#include "tools/keldoauth/console/clock.h"
+#include "grants/grants.h"
 #include "tools/keldoauth/health/health.h"
 #include "tools/keldoauth/storage/presence.h"
-#include "tools/keldoauth/storage/purge.h"
-#include "tools/keldoauth/storage/stores.h"
+#include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -19,70 +16,72 @@ namespace {
 
 constexpr long long kNearlyFullPercent = 90;
 
+constexpr char kWhenFull[] =
+    "what is dead goes by itself; end or remove what nobody needs, or raise the limit in the "
+    "settings (at most 10000)";
+
 struct Table {
   const char* name;
   const char* limitKey;
-  const char* whenFull;  // empty: trims itself, so that being full is normal
+  bool canDie;     // has rows that a purge removes
+  bool canBeFull;  // else it trims itself, and being full is normal
+  grants::TableRoom grants::RoomCount::*room;
 };
 
 constexpr Table kTables[] = {
-    {names::kClientInfoTable, names::kClientInfoMax, Clients::kWhenFull},
-    {names::kGrantCodeTable, names::kGrantCodeMax, Codes::kWhenFull},
-    {names::kTokenTable, names::kTokenMax, Tokens::kWhenFull},
-    {names::kLogTable, names::kLogMax, ""},
+    {names::kClientInfoTable, names::kClientInfoMax, false, true, &grants::RoomCount::applications},
+    {names::kGrantCodeTable, names::kGrantCodeMax, true, true, &grants::RoomCount::codes},
+    {names::kTokenTable, names::kTokenMax, true, true, &grants::RoomCount::tokens},
+    {names::kLogTable, names::kLogMax, false, false, &grants::RoomCount::log},
 };
 
-void checkFilling(const Table& table, long long rows, long long limit, Problems& problems) {
-  const std::string hint = table.whenFull;
-  if (hint.empty() || rows * 100 < limit * kNearlyFullPercent) return;
+/// Dead rows give way by themselves.
+void checkFilling(const Table& table, const grants::TableRoom& room, Problems& problems) {
+  const long long rows = room.rows - room.dead;
+  if (!table.canBeFull || rows * 100 < room.most * kNearlyFullPercent) return;
   const std::string amount =
-      " (" + std::to_string(rows) + " of " + std::to_string(limit) + " rows)";
-  problems.add(table.name, (rows >= limit ? "full" : "nearly full") + amount, hint);
+      " (" + std::to_string(rows) + " of " + std::to_string(room.most) + " rows)";
+  problems.add(table.name, (rows >= room.most ? "full" : "nearly full") + amount, kWhenFull);
 }
 
-Json::Value inspectTable(OAUTHDBBasic& store, const Table& table, Problems& problems) {
+Json::Value describe(const Table& table) {
   Json::Value document;
   document["name"] = table.name;
   document["limit"] = getTableRowMax(table.limitKey);
   document["limit_key"] = table.limitKey;
   document["rows"] = Json::Value();
   document["expired"] = Json::Value();
-
-  Json::Value count;
-  store.SetTabName(table.name);
-  if (store.DBGetRowCount(count) == 0) {
-    problems.add(table.name, "cannot be read: " + libraryFailure(store).text());
-    return document;
-  }
-  const long long rows = numberIn(count[0U]);
-  document["rows"] = Json::Int64(rows);
-  checkFilling(table, rows, getTableRowMax(table.limitKey), problems);
   return document;
 }
 
-/// Counting may do without the pages that hold the rows.
-template <typename Store>
-void countExpired(Json::Value& table, Problems& problems) try {
-  if (table["rows"].isNull()) return;
-  Store store;
-  table["expired"] = Json::Int64(purgeable(store, 0).size());
-} catch (const Failure& failure) {
-  problems.add(table["name"].asString(), "cannot be read: " + failure.text());
+/// All of them are counted at one moment.
+void inspectTables(const grants::Grants& grants, Json::Value& tables, Problems& problems) {
+  for (const Table& table : kTables) tables.append(describe(table));
+  const grants::RoomCount count = grants.room.count();
+  for (Json::ArrayIndex i = 0; i < tables.size(); ++i) {
+    const Table& table = kTables[i];
+    const grants::TableRoom& room = count.*table.room;
+    tables[i]["rows"] = Json::Int64(room.rows);
+    if (table.canDie) tables[i]["expired"] = Json::Int64(room.dead);
+    checkFilling(table, room, problems);
+  }
+  tables[1]["redeemed"] = Json::Int64(count.spentCodes);
 }
 
-void inspectTables(Json::Value& tables, Problems& problems) {
-  Log store;  // any store: each table is named in turn
-  for (const Table& table : kTables) tables.append(inspectTable(store, table, problems));
-  countExpired<Codes>(tables[1], problems);
-  countExpired<Tokens>(tables[2], problems);
+void countTables(const grants::Grants& grants, Json::Value& tables, Problems& problems) try {
+  inspectTables(grants, tables, problems);
+} catch (const grants::Trouble& trouble) {
+  problems.add("tables", "cannot be read: " + failureOf(trouble).text());
 }
 
 void inspectOpened(Json::Value& document, Problems& problems) try {
-  inspectTables(document["tables"], problems);
+  const grants::Grants grants;
+  countTables(grants, document["tables"], problems);
   document["ready"] = true;
   inspectSoundness(problems);
-  inspectCipher(document["tables"], problems);
-} catch (const Failure& failure) {
+  inspectCipher(grants, document["tables"], problems);
+} catch (const grants::Trouble& trouble) {
+  const Failure failure = failureOf(trouble);
   document["code"] = failure.code ? Json::Value(*failure.code) : Json::Value();
   document["message"] = failure.what();
   problems.add("database", "not ready: " + failure.text(), "the system log says more");

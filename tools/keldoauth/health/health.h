@@ -8,6 +8,10 @@
 
 #include <string>
 
+namespace KELDOAUTHSERVER::grants {
+class Grants;
+}
+
 namespace tool {
 
 /// The list that `status` ends with: subject, what is wrong, what to do.
@@ -32,7 +36,8 @@ void inspectKeyFiles(Problems& problems);
 
 /// Whether the cipher works and has the key of what is stored; `tables` is what
 /// inspectDatabase() found in them.
-void inspectCipher(const Json::Value& tables, Problems& problems);
+void inspectCipher(const KELDOAUTHSERVER::grants::Grants& grants, const Json::Value& tables,
+                   Problems& problems);
 
 /// Damage, and what the library does not put into a database.
 void inspectSoundness(Problems& problems);

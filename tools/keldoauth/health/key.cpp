@@ -1,18 +1,18 @@
 // The key: the stand-in cipher's files, and whether the cipher, whosever it is,
 // works and has the key of what is stored.
 
+#include <algorithm>
 #include <filesystem>
 #include <set>
 #include <string>
 #include <system_error>
 
-#include "core/oauth_db_basic.h"
 #include "core/oauth_errors.h"
-#include "tools/keldoauth/console/clock.h"
+#include "grants/grants.h"
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/health/health.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
-#include "tools/keldoauth/storage/stores.h"
+#include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;
@@ -37,31 +37,25 @@ bool startsWith(const std::string& text, const std::string& start) {
   return text.compare(0, start.size(), start) == 0;
 }
 
-bool canEncrypt() {
-  Json::Value probe;
-  probe[names::kClientId] = "probe";
-  return OAUTHDBBasic::ParamEncrypt(probe) != 0;
-}
-
 /// Only the log, the last of the tables, holds nothing encrypted.
 bool holdsEncrypted(const Json::Value& tables) {
   for (Json::ArrayIndex i = 0; i + 1 < tables.size(); ++i) {
-    if (numberIn(tables[i]["rows"]) > 0) return true;
+    if (tables[i]["rows"].asInt64() > 0) return true;
   }
   return false;
 }
 
-void checkClients(Problems& problems) try {
-  Clients clients;
-  Json::ArrayIndex unreadable = 0;
-  for (const Json::Value& row : allRows(clients)) {
-    if (!isDecrypted(row[names::kClientId].asString())) ++unreadable;
-  }
+void checkClients(const grants::Grants& grants, Problems& problems) try {
+  const auto all = grants.applications.all();
+  const auto unreadable = std::count_if(all.begin(), all.end(), [](const auto& application) {
+    return !isDecrypted(application.identifier.text());
+  });
   if (unreadable == 0) return;
-  problems.add(names::kClientInfoTable, counted(unreadable, "identifier") + " cannot be decrypted",
+  problems.add(names::kClientInfoTable,
+               counted(static_cast<std::size_t>(unreadable), "identifier") + " cannot be decrypted",
                "the platform's key is not the one that encrypted them; put it back");
-} catch (const Failure& failure) {
-  problems.add(names::kClientInfoTable, failure.text());
+} catch (const grants::Trouble& trouble) {
+  problems.add(names::kClientInfoTable, failureOf(trouble).text());
 }
 
 void reportUselessCipher(Problems& problems) {
@@ -85,11 +79,11 @@ void inspectKeyFiles(Problems& problems) {
   }
 }
 
-void inspectCipher(const Json::Value& tables, Problems& problems) {
+void inspectCipher(const grants::Grants& grants, const Json::Value& tables, Problems& problems) {
   const bool works = canEncrypt();
   if (works || absenceOfKey().empty()) {
     if (!works) reportUselessCipher(problems);
-    checkClients(problems);
+    checkClients(grants, problems);
   } else if (holdsEncrypted(tables)) {
     problems.add("key", keyFiles().current + " is missing",
                  "what is encrypted cannot be read without it; put it back");

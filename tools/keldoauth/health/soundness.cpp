@@ -5,7 +5,7 @@
 
 #include "core/oauth_db_basic.h"
 #include "tools/keldoauth/health/health.h"
-#include "tools/keldoauth/storage/stores.h"
+#include "tools/keldoauth/storage/trouble.h"
 
 using namespace KELDOAUTHSERVER;
 
@@ -42,7 +42,8 @@ void checkForStrangers(OAUTHDBBasic& store, Problems& problems) {
 }  // namespace
 
 void inspectSoundness(Problems& problems) try {
-  Log store;  // any store: all see the whole file
+  OAUTHDBBasic store;
+  requireReady(store);
   checkForStrangers(store, problems);
   checkWhole(store, problems);
 } catch (const Failure& failure) {

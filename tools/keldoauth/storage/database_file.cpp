@@ -10,6 +10,7 @@
 #include "core/tables.h"
 #include "tools/keldoauth/storage/descriptor_vfs.h"
 #include "tools/keldoauth/storage/files.h"
+#include "tools/keldoauth/storage/trouble.h"
 
 using namespace KELDOAUTHSERVER;
 

@@ -2,9 +2,7 @@
 
 #include <algorithm>
 
-#include "tools/keldoauth/console/failure.h"
-#include "tools/keldoauth/console/text.h"
-#include "tools/keldoauth/storage/stores.h"
+#include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_bounds.h"
 
 using namespace KELDOAUTHSERVER;
@@ -66,17 +64,13 @@ bool isAllReadable() {
   return true;
 }
 
-void requireKeyOf(OAUTHDBBasic& clients) {
-  std::vector<EncryptedValue> values = encryptedValues(clients);
-  if (values.empty() || std::any_of(values.begin(), values.end(), decrypt)) return;
+bool canEncrypt() {
   std::string probe = "probe";
-  if (!convert(OAUTHDBBasic::ParamEncrypt, probe)) return;
-  throw Failure(kUnavailable, "the platform's key is not the one that encrypted this store",
-                "nothing was stored; put back the key that belongs to the store");
+  return convert(OAUTHDBBasic::ParamEncrypt, probe);
 }
 
 bool isDecrypted(const std::string& text) {
-  return text.size() == kIdentifierLength || withoutDoubledQuotes(text).size() == kIdentifierLength;
+  return text.size() == kIdentifierLength;
 }
 
 }  // namespace tool

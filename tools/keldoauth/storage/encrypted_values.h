@@ -34,17 +34,15 @@ bool decrypt(EncryptedValue& value);
 /// Throws Failure.
 std::string encrypted(std::string text);
 
+/// Whether the cipher works.
+bool canEncrypt();
+
 /// Whether the cipher's key is that of every value in the database. Throws
 /// Failure.
 bool isAllReadable();
 
-/// Throws kUnavailable when the store has clients and the cipher works, but
-/// decrypts none of them: what came in now would be lost as soon as the right
-/// key is back.
-void requireKeyOf(KELDOAUTHSERVER::OAUTHDBBasic& clients);
-
-/// An identifier or secret as the library hands it out. What it could not
-/// decrypt comes as it is in the file, and has another length.
+/// Of an identifier or secret: what could not be decrypted comes as it is in the
+/// file, and has another length.
 bool isDecrypted(const std::string& text);
 
 }  // namespace tool
