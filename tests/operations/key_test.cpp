@@ -46,7 +46,7 @@ TEST_F(KeyAway, ClientIsRefusedAndTheKeyIsNamed) {
   const Outcome outcome = run(kAddClient);
   EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
   EXPECT_EQ(outcome.err,
-            std::string("keldoauth: client add: Data Encrypt failed (-4)\nhint: the key file ") +
+            std::string("keldoauth: client add: Data Decrypt failed (-4)\nhint: the key file ") +
                 kKey + " is missing\n");
   expectNothingDone();
 }
@@ -113,7 +113,6 @@ TEST_F(KeyAway, WhatCannotBeDecryptedIsMarkedWhereverItIsShown) {
   for (const Arguments& command : std::vector<Arguments>{{"client", "list", "--reveal"},
                                                          {"client", "show", "1", "--reveal"},
                                                          {"client", "show", "1"},
-                                                         {"client", "disable", "1"},
                                                          {"code", "list"},
                                                          {"code", "show", "1"},
                                                          {"token", "list"},
@@ -121,7 +120,7 @@ TEST_F(KeyAway, WhatCannotBeDecryptedIsMarkedWhereverItIsShown) {
     const Outcome outcome = run(command);
     EXPECT_THAT(outcome, ExitsWith(cli::kOk));
     EXPECT_THAT(outcome.out, Not(HasSubstr(cipher_.substr(0, 6))));
-    if (command[1] != "disable") {
+    if (command[0] == "client" || command[1] == "show") {
       EXPECT_THAT(outcome.out, HasSubstr(kMark));
     }
     Arguments asJson = command;
@@ -134,16 +133,28 @@ TEST_F(KeyAway, WhatCannotBeDecryptedIsMarkedWhereverItIsShown) {
 }
 
 TEST_F(KeyAway, PurgedRowsAreMarkedToo) {
-  expireIn("oauth_token", 1, -10);
-  const Outcome outcome = run({"token", "purge", "--yes"});
+  expireIn("oauth_token", 1, -31LL * 24 * 60 * 60);
+  const Outcome outcome = run({"token", "purge", "--yes", "--json"});
   EXPECT_THAT(outcome, ExitsWith(cli::kOk));
-  EXPECT_THAT(outcome.out, HasSubstr(kMark));
+  EXPECT_THAT(outcome.out, HasSubstr("\"undecrypted\":[\"client_id\"]"));
   EXPECT_THAT(outcome.out, Not(HasSubstr(cipher_.substr(0, 6))));
+  EXPECT_EQ(rowCount("oauth_token"), "2");
+}
+
+TEST_F(KeyAway, AClientThatCannotBeDecryptedIsNotChanged) {
+  for (const char* verb : {"enable", "disable", "renew-secret", "revoke", "remove"}) {
+    Arguments command{"client", verb, "1"};
+    if (std::string(verb).find("able") == std::string::npos) command.emplace_back("--yes");
+    const Outcome outcome = run(command);
+    EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
+    EXPECT_THAT(outcome.err, HasSubstr("client 1: its identifier cannot be decrypted\n"));
+  }
+  expectNothingDone();
 }
 
 TEST_F(KeyAway, NothingIsIssuedToAClientThatCannotBeDecrypted) {
-  const Outcome outcome = run({"token", "issue", "--client", "1", "--username", "u", "--scope", "s",
-                               "--state", "x", "--flow-type", "implicit"});
+  const Outcome outcome =
+      run({"token", "issue", "--client", "1", "--username", "u", "--scope", "s"});
   EXPECT_THAT(outcome, ExitsWith(cli::kUnavailable));
   EXPECT_THAT(outcome.err,
               HasSubstr("client 1: its identifier cannot be decrypted\nhint: the key file "));

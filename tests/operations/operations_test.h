@@ -68,7 +68,8 @@ class Operations : public cli::CliTest {
   template <typename Prepare, typename Check>
   static int dieAtEachStep(const Arguments& arguments, Prepare prepare, Check check);
 
-  /// Rolls back what a crash left. Expects that the file is sound.
+  /// Rolls back what a crash left. Expects that the file is sound. Without the
+  /// entries of restore and rekey in the audit log.
   static Content contentOf(const std::string& path = kDatabase);
   static void execute(const std::string& path, const std::string& sql);
   static std::string valueIn(const std::string& path, const std::string& sql);

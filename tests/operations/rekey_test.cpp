@@ -224,14 +224,21 @@ TEST_F(Rekey, RemovesTheOldKeyOnlyWhenTheNewValuesAreOnTheDisk) {
   const auto at = [&](const std::string& step) {
     return std::find(steps.rbegin(), steps.rend(), step).base() - steps.begin();
   };
-  const auto committed = at(std::string("unlink ") + kJournal);
+  const auto commit = std::find(steps.begin(), steps.end(), std::string("unlink ") + kJournal);
+  ASSERT_NE(commit, steps.end());
+  const auto committed = commit - steps.begin() + 1;  // the next one is of the audit log
   const auto renamed = at(std::string("rename ") + kKey);
   const auto folder = std::string("sync ") + kStateDir;
-  ASSERT_GT(committed, 0);
   ASSERT_GT(renamed, committed);
   EXPECT_NE(std::find(steps.begin() + committed, steps.begin() + renamed, folder),
             steps.begin() + renamed);
   EXPECT_GT(at(folder), renamed);
+}
+
+TEST_F(Rekey, LeavesAnEntryInTheAuditLog) {
+  EXPECT_THAT(rekey(), ExitsWith(cli::kOk));
+  EXPECT_EQ(sqlText("SELECT msg FROM oauth_log ORDER BY id DESC LIMIT 1"),
+            "Key changed by [carol]");
 }
 
 TEST_F(Rekey, KnowsItsNewKeyOnTheDiskBeforeItCommits) {
@@ -248,8 +255,8 @@ TEST_F(Rekey, KeepsBothKeysWhenAValueCameInAfterTheCommit) {
   const std::string cipher = sqlText("SELECT client_id FROM oauth_clientInfo WHERE id=1");
   const std::vector<std::string> steps = stepsOf({"rekey", "--yes"});
   putBack(kStateDir, before_);
-  const auto commit = std::find(steps.rbegin(), steps.rend(), std::string("unlink ") + kJournal);
-  const Outcome outcome = meanwhile(static_cast<int>(steps.rend() - commit) + 2,
+  const auto commit = std::find(steps.begin(), steps.end(), std::string("unlink ") + kJournal);
+  const Outcome outcome = meanwhile(static_cast<int>(commit - steps.begin()) + 3,
                                     std::string("sqlite3 ") + kDatabase +
                                         " \"INSERT INTO oauth_grantCode VALUES('u','" + cipher +
                                         "','s','c','1','x','i',9)\"",

@@ -11,6 +11,7 @@
 #include "tools/keldoauth/console/bounds.h"
 #include "tools/keldoauth/console/clock.h"
 #include "tools/keldoauth/console/terminal.h"
+#include "utils/clock.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;

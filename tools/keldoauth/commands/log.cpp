@@ -12,6 +12,7 @@
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/terminal.h"
 #include "tools/keldoauth/storage/trouble.h"
+#include "utils/clock.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;

@@ -6,6 +6,7 @@
 #include "tools/keldoauth/console/output.h"
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
+#include "utils/clock.h"
 #include "utils/oauth_names.h"
 
 using namespace KELDOAUTHSERVER;

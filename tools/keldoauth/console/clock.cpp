@@ -3,7 +3,6 @@
 #include <array>
 #include <charconv>
 #include <cstdio>
-#include <ctime>
 #include <string_view>
 #include <system_error>
 
@@ -114,10 +113,6 @@ std::optional<long long> durationIn(const std::string& text) {
 }
 
 }  // namespace
-
-long long currentTime() {
-  return static_cast<long long>(std::time(nullptr));
-}
 
 std::string isoTime(long long seconds) {
   constexpr long long kLast = 253402300799;  // 9999-12-31T23:59:59Z

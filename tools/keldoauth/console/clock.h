@@ -8,8 +8,6 @@
 
 namespace tool {
 
-long long currentTime();
-
 /// "2026-01-31T08:15:00Z"; empty before 1970 and after 9999.
 std::string isoTime(long long seconds);
 
