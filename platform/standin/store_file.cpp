@@ -103,7 +103,8 @@ class Reader {
 /// 0 for what is no whole number above 1.
 std::uint64_t integer(Reader& reader, std::uint64_t serialType) {
   constexpr std::array<std::uint64_t, 7> kWidths{0, 1, 2, 3, 4, 6, 8};
-  return serialType < kWidths.size() ? reader.number(kWidths[serialType]) : 0;
+  if (serialType >= kWidths.size()) return 0;
+  return reader.number(kWidths[static_cast<std::size_t>(serialType)]);
 }
 
 class StoreFile {
@@ -116,7 +117,7 @@ class StoreFile {
         std::memcmp(header.data(), kMagic, sizeof kMagic) != 0) {
       return StoredValues::kUnknown;
     }
-    pageSize_ = Reader(header.data() + kPageSizeAt, 2).number(2);
+    pageSize_ = static_cast<std::size_t>(Reader(header.data() + kPageSizeAt, 2).number(2));
     isWal_ = header[kWriteVersionAt] == kWalVersion;
     if (pageSize_ < kSmallestPage || pageSize_ > kLargestPage) return StoredValues::kUnknown;
     return inSchema();
