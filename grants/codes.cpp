@@ -146,7 +146,7 @@ std::optional<Refusal> Codes::faultOf(const CodeRequest& request) {
                                   {request.scope.text(), bounds::kScope},
                                   {request.redirect.text(), kRedirect},
                                   {challenge, kChallenge},
-                                  {request.text.text(), rows::kCallerText}});
+                                  {request.text.text(), kCallerTextBounds}});
   if (why) return requestFault(*why);
   if (request.user.text() == kNoUser) return requestFault(Why::kReservedUser);
   if (!rows::isPeer(request.from.text())) return requestFault(Why::kBadPeer);

@@ -11,6 +11,8 @@
 #include <string>
 #include <utility>
 
+#include "utils/oauth_bounds.h"
+
 namespace KELDOAUTHSERVER::grants {
 
 /// A text of one kind. Only `text()` makes a plain string of it.
@@ -62,8 +64,9 @@ using AnyToken = Text<struct AnyTokenKind>;
 using Challenge = Text<struct ChallengeKind>;
 using Verifier = Text<struct VerifierKind>;
 /// A text of the caller's own that goes along with a login, through its
-/// refreshes too: up to 512 bytes.
+/// refreshes too.
 using CallerText = Text<struct CallerTextKind>;
+inline constexpr Bounds kCallerTextBounds{0, 512};
 /// An IPv4 or IPv6 address, or empty.
 using PeerAddress = Text<struct PeerAddressKind>;
 

@@ -44,7 +44,7 @@ std::optional<Refusal> faultOf(const std::optional<Scope>& scope) {
 std::optional<Refusal> faultOf(const LoginRequest& request) {
   const auto why = rows::faultOf({{request.user.text(), bounds::kUsername},
                                   {request.scope.text(), bounds::kScope},
-                                  {request.text.text(), rows::kCallerText}});
+                                  {request.text.text(), kCallerTextBounds}});
   if (why) return requestFault(*why);
   if (request.user.text() == kNoUser) return requestFault(Why::kReservedUser);
   if (!fitsEver(rows::TokenState{0, 0, 0, "", "", "", "", request.text.text()},

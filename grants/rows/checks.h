@@ -13,9 +13,6 @@
 
 namespace KELDOAUTHSERVER::grants::rows {
 
-/// The text that goes along with a grant.
-inline constexpr Bounds kCallerText{0, 512};
-
 bool hasNul(std::string_view text);
 bool isWithin(std::string_view text, const Bounds& bounds);
 

@@ -288,11 +288,10 @@ Json::Value presentPair(const Grants& grants, const grants::Pair& pair) {
 }
 
 std::string faultInGrant(const Arguments& arguments) {
-  constexpr Bounds kText{0, 512};
   if (arguments.expiresIn == 0) return "--expires-in: at least 1 second";
   return outOfBounds({{"--username", arguments.username.value_or("-"), bounds::kUsername},
                       {"--scope", arguments.scope.value_or("-"), bounds::kScope},
-                      {"--state", arguments.state.value_or(""), kText}});
+                      {"--state", arguments.state.value_or(""), grants::kCallerTextBounds}});
 }
 
 }  // namespace tool

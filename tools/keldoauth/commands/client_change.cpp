@@ -66,7 +66,7 @@ Failure refusedClient(const grants::Refusal& refusal, const Arguments& given,
                    {"--secret-file", secret, bounds::kIdentifier},
                    {"--scope", given.scope.value_or("-"), bounds::kScope},
                    {"--name", given.displayName.value_or("-"), bounds::kDisplayName},
-                   {"the addresses together", addresses, {0, 2048}}});
+                   {"the addresses together", addresses, {0, bounds::kRedirectUri.max}}});
   if (fault.empty() && refusal.error == grants::Error::kInvalidRedirectUri) {
     fault = "an address has a scheme, such as https://frame.example.org/back, and no blank";
   }

@@ -11,6 +11,9 @@
 
 namespace tool {
 
+/// "64 bytes", "1 to 2048 bytes", "at most 512 bytes".
+std::string accepted(const KELDOAUTHSERVER::Bounds& bounds);
+
 /// A value and what the user calls it.
 struct Measured {
   const char* name;

@@ -4,6 +4,8 @@
 #include <charconv>
 #include <system_error>
 
+#include "tools/keldoauth/console/bounds.h"
+
 namespace tool {
 namespace {
 
@@ -21,20 +23,26 @@ long long parseNumber(const std::string& text, const Option& option) {
   return number;
 }
 
+std::string helpOf(const Option& option) {
+  if (option.bounds == nullptr) return option.help;
+  return std::string(option.help) + ", " + accepted(*option.bounds);
+}
+
 struct Declaration {
   const Option& option;
   CLI::App& app;
   Arguments& arguments;
+  std::string help = helpOf(option);
 
   CLI::Option* operator()(bool Arguments::*member) const {
-    return app.add_flag(option.name, arguments.*member, option.help);
+    return app.add_flag(option.name, arguments.*member, help);
   }
   CLI::Option* operator()(Arguments::Text Arguments::*member) const {
-    return app.add_option(option.name, arguments.*member, option.help);
+    return app.add_option(option.name, arguments.*member, help);
   }
   /// Each time one value: what follows is another argument's.
   CLI::Option* operator()(Arguments::Texts Arguments::*member) const {
-    return app.add_option(option.name, arguments.*member, option.help)->allow_extra_args(false);
+    return app.add_option(option.name, arguments.*member, help)->allow_extra_args(false);
   }
   CLI::Option* operator()(Arguments::Numbers Arguments::*member) const {
     const auto take = [this_ = *this, member](const std::vector<std::string>& texts) {
@@ -42,13 +50,13 @@ struct Declaration {
         (this_.arguments.*member).push_back(parseNumber(text, this_.option));
       }
     };
-    return app.add_option_function<std::vector<std::string>>(option.name, take, option.help);
+    return app.add_option_function<std::vector<std::string>>(option.name, take, help);
   }
   CLI::Option* operator()(Arguments::Number Arguments::*member) const {
     const auto take = [this_ = *this, member](const std::string& text) {
       this_.arguments.*member = parseNumber(text, this_.option);
     };
-    return app.add_option_function<std::string>(option.name, take, option.help);
+    return app.add_option_function<std::string>(option.name, take, help);
   }
 };
 

@@ -9,6 +9,9 @@
 #include <variant>
 #include <vector>
 
+#include "grants/texts.h"
+#include "utils/oauth_bounds.h"
+
 namespace CLI {
 class App;
 }
@@ -73,7 +76,8 @@ struct Option {
                Arguments::Texts Arguments::*, Arguments::Numbers Arguments::*>
       target;
   bool isRequired = false;
-  long long highest = 9223372036854775807;  // of a number
+  long long highest = 9223372036854775807;          // of a number
+  const KELDOAUTHSERVER::Bounds* bounds = nullptr;  // of a text, for the help
 };
 
 constexpr Option required(Option option) {
@@ -81,7 +85,14 @@ constexpr Option required(Option option) {
   return option;
 }
 
+constexpr Option bounded(Option option, const KELDOAUTHSERVER::Bounds& bounds) {
+  option.bounds = &bounds;
+  return option;
+}
+
 namespace option {
+
+namespace bounds = KELDOAUTHSERVER::bounds;
 
 constexpr long long kCentury = 3155760000;  // seconds
 
@@ -100,13 +111,14 @@ inline constexpr Option kMessage{"MESSAGE", "", "Text of the entry", &Arguments:
 
 inline constexpr Option kClient{"--client", "CLIENT", "Client: identifier, row id or name",
                                 &Arguments::client};
-inline constexpr Option kClientId{"--client-id", "TEXT",
-                                  "Identifier of 64 bytes instead of a generated one",
-                                  &Arguments::clientId};
-inline constexpr Option kSecretFile{"--secret-file", "FILE",
-                                    "Read a secret of 64 bytes from FILE ('-': standard input) "
-                                    "instead of generating one",
-                                    &Arguments::secretFile};
+inline constexpr Option kClientId =
+    bounded({"--client-id", "TEXT", "Identifier instead of a generated one", &Arguments::clientId},
+            bounds::kIdentifier);
+inline constexpr Option kSecretFile =
+    bounded({"--secret-file", "FILE",
+             "Read a secret from FILE ('-': standard input) instead of generating one",
+             &Arguments::secretFile},
+            bounds::kIdentifier);
 inline constexpr Option kRedirectUri{"--redirect-uri", "URI",
                                      "Redirect address with its scheme; may be given several times",
                                      &Arguments::redirectUris};
@@ -121,24 +133,26 @@ inline constexpr Option kPublic{"--public", "", "It has no secret: its users hol
 inline constexpr Option kPkce{"--pkce", "required|optional",
                               "Whether it must ask for codes with a challenge (RFC 7636)",
                               &Arguments::pkce};
-inline constexpr Option kScope{"--scope", "TEXT", "Scope, 1 to 2048 bytes", &Arguments::scope};
-inline constexpr Option kDisplayName{"--name", "TEXT", "Name, 1 to 64 bytes",
-                                     &Arguments::displayName};
+inline constexpr Option kScope =
+    bounded({"--scope", "TEXT", "Scope", &Arguments::scope}, bounds::kScope);
+inline constexpr Option kDisplayName =
+    bounded({"--name", "TEXT", "Name", &Arguments::displayName}, bounds::kDisplayName);
 inline constexpr Option kDisabled{"--disabled", "", "Register it switched off",
                                   &Arguments::disabled};
 
-inline constexpr Option kUsername{"--username", "NAME", "User who granted it, 1 to 256 bytes",
-                                  &Arguments::username};
-inline constexpr Option kState{"--state", "TEXT", "A text that goes along, at most 512 bytes",
-                               &Arguments::state};
-inline constexpr Option kNewState{"--state", "TEXT", "State of the request, 1 to 2048 bytes",
-                                  &Arguments::state};
+inline constexpr Option kUsername =
+    bounded({"--username", "NAME", "User who granted it", &Arguments::username}, bounds::kUsername);
+inline constexpr Option kState =
+    bounded({"--state", "TEXT", "A text that goes along", &Arguments::state},
+            KELDOAUTHSERVER::grants::kCallerTextBounds);
+inline constexpr Option kNewState =
+    bounded({"--state", "TEXT", "State of the request", &Arguments::state}, bounds::kState);
 inline constexpr Option kFlow{"--flow-type", "TEXT",
                               "authorization_code: a user's login (the default); "
                               "client_credentials: for the client itself",
                               &Arguments::flowType};
-inline constexpr Option kNewFlowType{"--flow-type", "TEXT", "Grant flow, 1 to 32 bytes",
-                                     &Arguments::flowType};
+inline constexpr Option kNewFlowType =
+    bounded({"--flow-type", "TEXT", "Grant flow", &Arguments::flowType}, bounds::kFlowType);
 inline constexpr Option kCodesRedirectUri{"--redirect-uri", "URI",
                                           "Redirect address that the code was asked with",
                                           &Arguments::redirectUris};
