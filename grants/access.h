@@ -45,7 +45,8 @@ struct AccessEntry {
   PeerAddress from;   // of the last request that renewed it
   std::string flow;   // "authorization_code", "client_credentials"; empty for a code
   CallerText text;    // of other programs' rows: their state
-  bool isDead;        // no good any more, and gone with the next purge
+  bool isDead;        // no good any more; a login whose year is over stays until
+                      // it would be dead unused, and then goes with a purge
   bool isForeign;     // stored by another program, in the clear
 };
 

@@ -260,7 +260,7 @@ Outcome<Done> switchTo(Store& store, const ApplicationId& identifier, bool isEna
   if (found->shown.isEnabled == isEnabled) return Done{};
   Json::Value modified;
   modified[names::kEnable] = isEnabled ? "1" : "0";
-  Store::change(store.applications, conditionOf(found->shown), modified);
+  Store::changeSeen(store.applications, conditionOf(found->shown), modified);
   rows::note(store, std::string("Application ") + (isEnabled ? "enabled" : "disabled") +
                         wordOf(found->shown) + rows::actorWord(by));
   whole.commit();
@@ -279,7 +279,7 @@ Outcome<Application> Applications::change(const ApplicationId& identifier,
   const Json::Value modified = modifiedBy(change, words);
   if (modified.empty()) return found->shown;
 
-  Store::change(store_.applications, conditionOf(found->shown), modified);
+  Store::changeSeen(store_.applications, conditionOf(found->shown), modified);
   const auto changed = rows::findApplication(store_, identifier.text());
   rows::note(store_, "Application changed" + wordOf(changed->shown) + rows::actorWord(by));
   whole.commit();
@@ -296,7 +296,7 @@ Outcome<Secret> Applications::renewSecret(const ApplicationId& identifier, const
   const Secret secret(newSecret());
   Json::Value modified;
   modified[names::kClientSecret] = secret.text();
-  Store::change(store_.applications, conditionOf(found->shown), modified);
+  Store::changeSeen(store_.applications, conditionOf(found->shown), modified);
   rows::note(store_, "Secret renewed" + wordOf(found->shown) + rows::actorWord(by));
   whole.commit();
   return secret;

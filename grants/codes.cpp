@@ -134,7 +134,7 @@ void spend(Store& store, const CodeRow& code, const rows::Stored& login, long lo
   Json::Value modified;
   modified[names::kState] = doubled(pack(state));
   modified[names::kExpiredTime] = std::to_string(later(state.issued, store.policy.family));
-  Store::change(store.codes, conditionOf(code), modified);
+  Store::changeSeen(store.codes, conditionOf(code), modified);
 }
 
 }  // namespace

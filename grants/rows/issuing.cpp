@@ -104,7 +104,7 @@ Pair replaceToken(Store& store, const TokenRow& old, const std::string& shown,
   modified[names::kScope] = doubled(renewal.scope.text());
   modified[names::kState] = doubled(pack(state));
   if (!renewal.from.text().empty()) modified[names::kIp] = renewal.from.text();
-  Store::change(store.tokens, conditionOf(old), modified);
+  Store::changeSeen(store.tokens, conditionOf(old), modified);
   return pair;
 }
 

@@ -14,6 +14,8 @@ namespace KELDOAUTHSERVER::grants {
 namespace {
 
 constexpr char kNotReady[] = "DB is not ready!!";
+constexpr int kMissed = 1;  // SQLite's code for what has no code of its own
+constexpr char kMissedRow[] = "a row is not as it was read a moment ago";
 constexpr long long kLongest = 100LL * 365 * 24 * 60 * 60;
 
 Policy sane(Policy policy) {
@@ -111,6 +113,11 @@ bool Store::change(OAUTHDBBasic& table, const Json::Value& condition, const Json
   request[names::kModified] = modified;
   clearError(table);
   return foundRow(table, table.DBEdit(request));
+}
+
+void Store::changeSeen(OAUTHDBBasic& table, const Json::Value& condition,
+                       const Json::Value& modified) {
+  if (!change(table, condition, modified)) throw Trouble(kMissed, kMissedRow);
 }
 
 bool Store::erase(OAUTHDBBasic& table, const Json::Value& condition) {

@@ -52,6 +52,10 @@ class Store {
   /// Whether there was such a row.
   static bool change(OAUTHDBBasic& table, const Json::Value& condition,
                      const Json::Value& modified);
+  /// Of a row that this transaction has read, as it was read: an operation that
+  /// missed it would hand out what the file does not know. Throws Trouble then.
+  static void changeSeen(OAUTHDBBasic& table, const Json::Value& condition,
+                         const Json::Value& modified);
   static bool erase(OAUTHDBBasic& table, const Json::Value& condition);
   /// Removes the rows that meet a condition of SQL.
   void eraseWhere(const char* table, const std::string& condition);

@@ -187,5 +187,21 @@ TEST_F(HostileRowsTest, AnAddressesScopeIsAnInterfacesName) {
   }
 }
 
+// A trigger that rode along in a copy can let a change of a row come to nothing.
+TEST_F(HostileRowsTest, AChangeThatSomethingSwallowsIsTroubleAndHandsOutNothing) {
+  const Code code = issue(frame_);
+  const Pair pair = login(frame_);
+  for (const char* table : {"oauth_grantCode", "oauth_token", "oauth_clientInfo"}) {
+    sql(std::string("CREATE TRIGGER swallow_") + table + " BEFORE UPDATE ON " + table +
+        " BEGIN SELECT RAISE(IGNORE); END");
+  }
+  EXPECT_THROW(grants().codes.redeem(redemption(frame_, code)), Trouble);
+  EXPECT_EQ(sqlText("SELECT COUNT(*) FROM oauth_token"), "1");
+  EXPECT_THROW(grants().tokens.refresh({frame_, *pair.refresh}), Trouble);
+  EXPECT_TRUE(isGood(pair));
+  EXPECT_THROW(grants().applications.disable(frame_, Actor("root")), Trouble);
+  EXPECT_THROW(grants().applications.renewSecret(frame_, Actor("root")), Trouble);
+}
+
 }  // namespace
 }  // namespace grants_test
