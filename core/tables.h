@@ -11,16 +11,20 @@
 
 namespace KELDOAUTHSERVER::schema {
 
-/// A list of columns that stands elsewhere, null-terminated.
-struct Columns {
-  const char* const* first;
+/// A list of columns that stands elsewhere. Its length is counted where it is
+/// taken: a null at the end would have to be asked of addresses, which is no
+/// constant expression to gcc's sanitizers.
+class Columns {
+ public:
+  template <std::size_t size>
+  constexpr Columns(const char* const (&list)[size]) : first_(list), size_(size) {}
 
-  [[nodiscard]] constexpr const char* const* begin() const { return first; }
-  [[nodiscard]] constexpr const char* const* end() const {
-    const char* const* last = first;
-    while (*last != nullptr) ++last;
-    return last;
-  }
+  [[nodiscard]] constexpr const char* const* begin() const { return first_; }
+  [[nodiscard]] constexpr const char* const* end() const { return first_ + size_; }
+
+ private:
+  const char* const* first_;
+  std::size_t size_;
 };
 
 struct Table {
@@ -29,50 +33,49 @@ struct Table {
   Columns columns;        // in the statement's order
 };
 
-inline constexpr const char* kMetaColumns[] = {names::kTabName, names::kVersion, nullptr};
+inline constexpr const char* kMetaColumns[] = {names::kTabName, names::kVersion};
 inline constexpr Table kMeta{
     names::kMetaTable,
     "CREATE TABLE IF NOT EXISTS oauth_meta(tab_name text NOT NULL, version integer NOT NULL);",
-    {kMetaColumns}};
+    kMetaColumns};
 
 inline constexpr const char* kClientInfoColumns[] = {
-    names::kEnable, names::kClientId,    names::kClientSecret, names::kRedirectUri,
-    names::kScope,  names::kDisplayName, names::kId,           nullptr};
+    names::kEnable,      names::kClientId, names::kClientSecret, names::kRedirectUri, names::kScope,
+    names::kDisplayName, names::kId};
 inline constexpr Table kClientInfo{
     names::kClientInfoTable,
     "CREATE TABLE IF NOT EXISTS oauth_clientInfo(enable text NOT NULL, "
     "client_id text NOT NULL UNIQUE, client_secret text NOT NULL, redirect_uri text NOT NULL, "
     "scope text NOT NULL, display_name text NOT NULL, id integer PRIMARY KEY);",
-    {kClientInfoColumns}};
+    kClientInfoColumns};
 
 inline constexpr const char* kTokenColumns[] = {
-    names::kUsername,    names::kClientId,    names::kScope,    names::kRefreshToken,
-    names::kAccessToken, names::kExpiredTime, names::kFlowType, names::kState,
-    names::kIp,          names::kId,          nullptr};
+    names::kUsername,    names::kClientId, names::kScope, names::kRefreshToken, names::kAccessToken,
+    names::kExpiredTime, names::kFlowType, names::kState, names::kIp,           names::kId};
 inline constexpr Table kToken{
     names::kTokenTable,
     "CREATE TABLE IF NOT EXISTS oauth_token(username text NOT NULL,  client_id text NOT NULL,  "
     "scope text NOT NULL,  refresh_token text NOT NULL, access_token text NOT NULL UNIQUE, "
     "expired_time text NOT NULL, flow_type text NOT NULL, state text NOT NULL, "
     "ip text NOT NULL DEFAULT 'None', id integer PRIMARY KEY);",
-    {kTokenColumns}};
+    kTokenColumns};
 
 inline constexpr const char* kGrantCodeColumns[] = {
-    names::kUsername, names::kClientId, names::kScope, names::kCode, names::kExpiredTime,
-    names::kState,    names::kIp,       names::kId,    nullptr};
+    names::kUsername,    names::kClientId, names::kScope, names::kCode,
+    names::kExpiredTime, names::kState,    names::kIp,    names::kId};
 inline constexpr Table kGrantCode{
     names::kGrantCodeTable,
     "CREATE TABLE IF NOT EXISTS oauth_grantCode(username text NOT NULL, client_id text NOT NULL, "
     "scope text NOT NULL, code text NOT NULL UNIQUE, expired_time text NOT NULL, "
     "state text NOT NULL, ip text NOT NULL DEFAULT 'None', id integer PRIMARY KEY);",
-    {kGrantCodeColumns}};
+    kGrantCodeColumns};
 
-inline constexpr const char* kLogColumns[] = {names::kTimestamp, names::kMsg, names::kId, nullptr};
+inline constexpr const char* kLogColumns[] = {names::kTimestamp, names::kMsg, names::kId};
 inline constexpr Table kLog{
     names::kLogTable,
     "CREATE TABLE IF NOT EXISTS oauth_log(timestamp integer NOT NULL, msg text NOT NULL, "
     "id integer PRIMARY KEY);",
-    {kLogColumns}};
+    kLogColumns};
 
 /// In the order in which start-up creates them.
 inline constexpr const Table* kTables[] = {&kMeta, &kClientInfo, &kToken, &kGrantCode, &kLog};
