@@ -255,6 +255,12 @@ std::optional<AccessEntry> Access::find(const AnyToken& token) const {
   return entryOf(*found, namesIn(store_), store_.policy, currentTime());
 }
 
+bool Access::hasLogin(const User& user, const ApplicationId& application,
+                      const Scope& scope) const {
+  return canBe(user, application) &&
+         rows::hasLogin(store_, user.text(), application.text(), scope.text(), currentTime());
+}
+
 Ended Access::end(const AccessHandle& handle, const Actor& by) {
   return end(std::vector<AccessHandle>{handle}, by);
 }

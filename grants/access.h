@@ -81,6 +81,13 @@ class Access {
   [[nodiscard]] std::optional<AccessEntry> find(const Code& code) const;
   [[nodiscard]] std::optional<AccessEntry> find(const AnyToken& token) const;
 
+  /// Whether the user has a login with the application that can still be
+  /// refreshed and covers the scope: what they agreed to once, however it was
+  /// narrowed since. Codes, own tokens and other programs' rows do not count.
+  /// Of a code that is issued for it see CodeRequest::withoutPage.
+  [[nodiscard]] bool hasLogin(const User& user, const ApplicationId& application,
+                              const Scope& scope) const;
+
   /// What the handle named, if it is still as it was read; else nothing.
   Ended end(const AccessHandle& handle, const Actor& by);
 

@@ -45,6 +45,7 @@ CodeState stateOf(const CodeRequest& request, long long now) {
     state.method = request.pkce->method == Pkce::Method::kS256 ? kS256 : kPlain;
     state.challenge = request.pkce->challenge.text();
   }
+  state.evictsNothing = request.withoutPage;
   return state;
 }
 
@@ -57,6 +58,19 @@ std::optional<Refusal> faultOf(const CodeRequest& request, const Application& ap
     return requestFault(Why::kNeedsPkce);
   }
   return {};
+}
+
+/// What the user's logins say to a code for which they are not asked.
+std::optional<Refusal> faultWithoutPage(Store& store, const CodeRequest& request, long long now) {
+  if (!request.withoutPage || rows::hasLogin(store, request.user.text(), request.application.text(),
+                                             request.scope.text(), now)) {
+    return {};
+  }
+  return Refusal{Error::kAccessDenied, Why::kNotRemembered};
+}
+
+rows::Evicts evictsOf(bool nothing) {
+  return nothing ? rows::Evicts::kNothing : rows::Evicts::kOldest;
 }
 
 Json::Value rowOf(const CodeRequest& request, const IssuedCode& issued, long long now) {
@@ -166,7 +180,11 @@ Outcome<IssuedCode> Codes::issue(const CodeRequest& request) {
   const auto application = rows::actingApplication(store_, request.application);
   if (!application) return application.refusal();
   if (const auto fault = grants::faultOf(request, application->shown)) return *fault;
-  rows::makeRoomForCode(store_, request.user.text(), request.application.text(), now);
+  if (const auto fault = faultWithoutPage(store_, request, now)) return *fault;
+  if (!rows::makeRoomForCode(store_, request.user.text(), request.application.text(),
+                             evictsOf(request.withoutPage), now)) {
+    return Refusal{Error::kAccessDenied, Why::kWouldEvict};
+  }
   Store::insert(store_.codes, rowOf(request, issued, now));
   whole.commit();
   return issued;
@@ -187,14 +205,16 @@ Outcome<Pair> Codes::redeem(const Redemption& redemption) {
   if (code->isSpent()) return endReplayed(store_, whole, *application, *code, now);
   if (code->expires <= now) return grantFault(Why::kExpired);
 
-  const rows::Stored login = rows::storeToken(
-      store_,
-      {User(code->user), redemption.application, Scope(code->scope), CallerText(code->state->text),
-       redemption.from, redemption.lifetime, code->state->issued},
-      now);
-  spend(store_, *code, login, now);
+  const auto login =
+      rows::storeToken(store_,
+                       {User(code->user), redemption.application, Scope(code->scope),
+                        CallerText(code->state->text), redemption.from, redemption.lifetime,
+                        code->state->issued, false, evictsOf(code->state->evictsNothing)},
+                       now);
+  if (!login) return grantFault(Why::kWouldEvict);
+  spend(store_, *code, *login, now);
   whole.commit();
-  return login.pair;
+  return login->pair;
 }
 
 }  // namespace KELDOAUTHSERVER::grants

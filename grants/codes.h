@@ -43,6 +43,14 @@ struct CodeRequest {
   /// An administrator's own hand: no challenge although the application needs
   /// one.
   bool waivesPkce = false;
+  /// The user is not asked, because what they agreed to before is still alive:
+  /// kNotRemembered unless a login of theirs with this application covers the
+  /// scope (Access::hasLogin). Who makes a browser ask in the background must
+  /// not end anything by it, so nothing that lives goes for such a code, nor for
+  /// its login: kWouldEvict beyond a bound of the policy, for the code or, those
+  /// that wait to be redeemed counted in, for the login. Either way the user can
+  /// be asked instead.
+  bool withoutPage = false;
 };
 
 /// What goes to the application, by way of the user.
@@ -76,8 +84,9 @@ class Codes {
   [[nodiscard]] static std::optional<Refusal> faultOf(const CodeRequest& request);
 
   /// Refusals: kInvalidRequest (also for what `faultOf` finds), kInvalidClient,
-  /// kInvalidScope. Beyond a bound of the policy the user's oldest codes for
-  /// this application, the user's and the application's go. Trouble: kFull.
+  /// kInvalidScope; kAccessDenied without a page. Beyond a bound of the policy
+  /// the user's oldest codes for this application, the user's and the
+  /// application's go. Trouble: kFull.
   Outcome<IssuedCode> issue(const CodeRequest& request);
 
   /// The code is spent and the pair stored, or neither. Of several requests
@@ -87,7 +96,8 @@ class Codes {
   /// address and verifier, later than the policy's grace, ends the login that
   /// came from it (kReplayed). Another program's code is refused (kForeign).
   /// Beyond a bound of the policy the logins go that were renewed longest ago:
-  /// the user's with this application, the user's, the application's.
+  /// the user's with this application, the user's, the application's; a code
+  /// without a page is refused instead (kWouldEvict), and still good.
   /// Trouble: kFull; the code is still good.
   Outcome<Pair> redeem(const Redemption& redemption);
 

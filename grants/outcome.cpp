@@ -9,10 +9,11 @@ namespace {
 // In the order of the enumerators.
 
 constexpr std::array kCodes{
-    "invalid_request", "invalid_client", "invalid_grant",        "unauthorized_client",
-    "invalid_scope",   "invalid_token",  "invalid_redirect_uri", "invalid_client_metadata",
+    "invalid_request",      "invalid_client",          "invalid_grant",
+    "unauthorized_client",  "invalid_scope",           "invalid_token",
+    "invalid_redirect_uri", "invalid_client_metadata", "access_denied",
 };
-static_assert(kCodes.size() == static_cast<std::size_t>(Error::kInvalidClientMetadata) + 1);
+static_assert(kCodes.size() == static_cast<std::size_t>(Error::kAccessDenied) + 1);
 
 constexpr std::array kReasons{
     "A value has a NUL byte",
@@ -37,8 +38,10 @@ constexpr std::array kReasons{
     "The address is not absolute, or has characters that no address has",
     "A name cannot look like an identifier",
     "The identifier is taken",
+    "The user has to be asked: no login covers it",
+    "The user has to be asked: another login would have to end",
 };
-static_assert(kReasons.size() == static_cast<std::size_t>(Why::kTaken) + 1);
+static_assert(kReasons.size() == static_cast<std::size_t>(Why::kWouldEvict) + 1);
 
 }  // namespace
 

@@ -19,6 +19,7 @@ enum class Error {
   kInvalidToken,           // RFC 6750: an access token that is no good
   kInvalidRedirectUri,     // RFC 7591
   kInvalidClientMetadata,  // RFC 7591: anything else of a registration
+  kAccessDenied,           // RFC 6749: the user has to be asked first
 };
 
 /// The code as it stands in an answer: "invalid_request", ...
@@ -49,6 +50,8 @@ enum class Why {
   kBadAddress,        // no absolute address, or one with a blank
   kNameIsIdentifier,  // a name that could be mistaken for an identifier
   kTaken,             // the identifier is another application's
+  kNotRemembered,     // no login of the user's covers what is asked for
+  kWouldEvict,        // something that lives would have to go, and may not
 };
 
 /// A short English sentence in the characters that RFC 6749 allows an

@@ -159,12 +159,12 @@ Outcome<Pair> Tokens::issue(const LoginRequest& request) {
   const auto application = rows::actingApplication(store_, request.application);
   if (!application) return application.refusal();
   if (!rows::isScopeWithin(request.scope.text(), application->shown.scope.text())) return kWider;
-  const rows::Stored login = rows::storeToken(store_,
-                                              {request.user, request.application, request.scope,
-                                               request.text, request.from, request.lifetime, now},
-                                              now);
+  const auto login = rows::storeToken(store_,
+                                      {request.user, request.application, request.scope,
+                                       request.text, request.from, request.lifetime, now},
+                                      now);
   whole.commit();
-  return login.pair;
+  return login->pair;
 }
 
 Outcome<Pair> Tokens::refresh(const Refresh& refresh) {
@@ -211,18 +211,18 @@ Outcome<Pair> Tokens::issueToItself(const OwnTokenRequest& request) {
   }
   const Scope scope = request.scope.value_or(application->shown.scope);
   if (!rows::isScopeWithin(scope.text(), application->shown.scope.text())) return kWider;
-  const rows::Stored token = rows::storeToken(store_,
-                                              {{},
-                                               request.application,
-                                               scope,
-                                               {},
-                                               request.from,
-                                               request.lifetime,
-                                               now,
-                                               application->shown.registeredItself},
-                                              now);
+  const auto token = rows::storeToken(store_,
+                                      {{},
+                                       request.application,
+                                       scope,
+                                       {},
+                                       request.from,
+                                       request.lifetime,
+                                       now,
+                                       application->shown.registeredItself},
+                                      now);
   whole.commit();
-  return token.pair;
+  return token->pair;
 }
 
 Outcome<Bearer> Tokens::verify(const AccessToken& token) const {

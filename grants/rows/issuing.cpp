@@ -5,7 +5,6 @@
 #include "grants/rows/digest.h"
 #include "grants/rows/quotes.h"
 #include "grants/rows/refresh_text.h"
-#include "grants/rows/room_rules.h"
 #include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
@@ -38,9 +37,11 @@ Json::Value rowOf(const NewToken& token, const TokenState& state, const Pair& pa
   return row;
 }
 
-Stored storeLogin(Store& store, const NewToken& token, long long now) {
-  const long long row = makeRoomForLogin(store, token.user->text(), token.application.text(), now);
-  const RefreshText refresh = firstOf(row);
+std::optional<Stored> storeLogin(Store& store, const NewToken& token, long long now) {
+  const auto row =
+      makeRoomForLogin(store, token.user->text(), token.application.text(), token.evicts, now);
+  if (!row) return {};
+  const RefreshText refresh = firstOf(*row);
   const std::string family = markOf(refresh.family);
   const std::string text = write(refresh);
   const Pair pair{AccessToken(randomDigits(kIdentifierLength)),
@@ -52,9 +53,9 @@ Stored storeLogin(Store& store, const NewToken& token, long long now) {
                   token.text};
   Json::Value document =
       rowOf(token, {token.login, now, now, family, "", "", "", token.text.text()}, pair, text);
-  document[names::kId] = std::to_string(row);
+  document[names::kId] = std::to_string(*row);
   Store::insert(store.tokens, document);
-  return {pair, row, family};
+  return Stored{pair, *row, family};
 }
 
 /// As refresh token it gets the mark of random digits that nobody is told.
@@ -77,7 +78,7 @@ Stored storeOwn(Store& store, const NewToken& token, long long now) {
 
 }  // namespace
 
-Stored storeToken(Store& store, const NewToken& token, long long now) {
+std::optional<Stored> storeToken(Store& store, const NewToken& token, long long now) {
   return token.user ? storeLogin(store, token, now) : storeOwn(store, token, now);
 }
 

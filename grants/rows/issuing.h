@@ -8,6 +8,7 @@
 #include <string>
 
 #include "grants/rows/read_rows.h"
+#include "grants/rows/room_rules.h"
 #include "grants/tokens.h"
 
 namespace KELDOAUTHSERVER::grants::rows {
@@ -21,6 +22,7 @@ struct NewToken {
   std::optional<long long> lifetime;
   long long login;  // when the user agreed
   bool ofSelfRegistered = false;
+  Evicts evicts = Evicts::kOldest;
 };
 
 struct Stored {
@@ -29,8 +31,8 @@ struct Stored {
   std::string family;  // mark
 };
 
-/// Makes the room first.
-Stored storeToken(Store& store, const NewToken& token, long long now);
+/// Makes the room first. Nothing when there is none and the token may not evict.
+std::optional<Stored> storeToken(Store& store, const NewToken& token, long long now);
 
 /// What takes the place of a login's pair.
 struct Renewal {

@@ -7,6 +7,7 @@
 #include "grants/rows/checks.h"
 #include "grants/rows/digest.h"
 #include "grants/rows/quotes.h"
+#include "grants/rows/room_rules.h"
 #include "utils/decimal.h"
 #include "utils/oauth_names.h"
 
@@ -176,6 +177,18 @@ std::optional<TokenRow> loginOf(Store& store, const RefreshText& text) {
     return {};
   }
   return login;
+}
+
+bool hasLogin(Store& store, const std::string& user, const std::string& application,
+              const std::string& scope, long long now) {
+  const Json::Value found = Store::rowsWhere(
+      store.tokens, isOneOf(names::kClientId, {Store::sealed(application)}) + " AND " +
+                        isOneOf(names::kUsername, spellings(user)) + " AND NOT " + isOwnToken());
+  return std::any_of(found.begin(), found.end(), [&](const Json::Value& row) {
+    const TokenRow login = tokenOf(row);
+    return login.isOurs() && login.ends(store.policy) >= now &&
+           isScopeWithin(scope, login.loginScope());
+  });
 }
 
 std::optional<TokenRow> findShownToken(Store& store, const std::string& text) {

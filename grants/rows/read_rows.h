@@ -74,6 +74,11 @@ std::optional<TokenRow> findForeignRefresh(Store& store, const std::string& text
 /// The row that a refresh token of ours names, if it is of that family: the
 /// token itself may have been replaced.
 std::optional<TokenRow> loginOf(Store& store, const RefreshText& text);
+/// Whether the user has a login with the application that can still be refreshed
+/// and covers the scope. Another program's row says nothing of what a user
+/// agreed to.
+bool hasLogin(Store& store, const std::string& user, const std::string& application,
+              const std::string& scope, long long now);
 /// The row of a token, whichever of the two it is.
 std::optional<TokenRow> findShownToken(Store& store, const std::string& text);
 

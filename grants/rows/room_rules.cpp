@@ -20,6 +20,10 @@ namespace {
 constexpr char kSource[] = "grants";
 constexpr int kFullLine = 10;
 
+/// Conditions that every row meets, and none.
+constexpr char kAll[] = "1";
+constexpr char kNone[] = "0";
+
 /// Ids above are another program's doing; ours stay where the next is free.
 constexpr char kOrdinaryId[] = "4611686018427387904";
 
@@ -43,8 +47,9 @@ struct Claim {
   std::string isOfPair;  // one user with one application
   std::string isOfUser;
   std::string isOfApplication;
-  std::string order;   // what of one's own goes first
-  std::string yields;  // what of anybody's goes when the table is full
+  std::string givesWay;  // what of one's own goes beyond a bound
+  std::string order;     // and what of it first
+  std::string yields;    // what of anybody's goes when the table is full
   int pairBound;
 };
 
@@ -75,22 +80,37 @@ long long evict(Store& store, const Claim& claim, const std::string& condition, 
                                             " LIMIT " + std::to_string(most) + ")");
 }
 
-/// Whether something of the claimant's own had to go.
-bool evictBeyond(Store& store, const Claim& claim, const std::string& condition, long long found,
-                 long long bound) {
+/// What one row more would be too many of, and how many of them have to go.
+struct Excess {
+  std::string condition;
+  long long rows;
+};
+
+std::optional<Excess> excessOf(const std::string& condition, long long found, long long bound) {
   const long long most = std::max(bound, 1LL);
-  if (found < most) return false;
-  evict(store, claim, "NOT " + claim.isDead + " AND " + condition, found - most + 1);
-  return true;
+  if (found < most) return {};
+  return Excess{condition, found - most + 1};
 }
 
-bool evictOwn(Store& store, const Claim& claim, const Crowd& crowd, long long limit) {
-  const Policy& policy = store.policy;
-  return evictBeyond(store, claim, claim.isOfPair, crowd.ofPair, claim.pairBound) ||
-         evictBeyond(store, claim, claim.isOfUser, crowd.ofUser,
-                     limit / std::max(policy.userPart, 1)) ||
-         evictBeyond(store, claim, claim.isOfApplication, crowd.ofApplication,
-                     limit / std::max(policy.applicationPart, 1));
+/// By the first bound that the crowd has reached.
+std::optional<Excess> excessOf(const Claim& claim, const Crowd& crowd, const Policy& policy) {
+  const long long limit = getTableRowMax(claim.limitKey);
+  auto excess = excessOf(claim.isOfPair, crowd.ofPair, claim.pairBound);
+  if (!excess) {
+    excess = excessOf(claim.isOfUser, crowd.ofUser, limit / std::max(policy.userPart, 1));
+  }
+  if (!excess) {
+    excess = excessOf(claim.isOfApplication, crowd.ofApplication,
+                      limit / std::max(policy.applicationPart, 1));
+  }
+  return excess;
+}
+
+/// Whether the claimant's own made room.
+bool evictOwn(Store& store, const Claim& claim, const Excess& excess) {
+  const std::string own =
+      "NOT " + claim.isDead + " AND " + excess.condition + " AND " + claim.givesWay;
+  return evict(store, claim, own, excess.rows) == excess.rows;
 }
 
 [[noreturn]] void fail(const OAUTHError& whenFull) {
@@ -106,12 +126,20 @@ void clearDead(Store& store, const Claim& claim, long long rows, long long limit
   if (evict(store, claim, claim.yields, needed) < needed) fail(claim.whenFull);
 }
 
-long long makeRoom(Store& store, const Claim& claim) {
+/// The crowd that is left; none when the claimant's own would have to go and may
+/// not.
+std::optional<Crowd> makeRoom(Store& store, const Claim& claim) {
   const long long limit = getTableRowMax(claim.limitKey);
   Crowd crowd = count(store, claim);
-  while (evictOwn(store, claim, crowd, limit)) crowd = count(store, claim);
+  while (const auto excess = excessOf(claim, crowd, store.policy)) {
+    if (!evictOwn(store, claim, *excess)) {
+      if (claim.givesWay == kAll) Store::failMissed();
+      return {};
+    }
+    crowd = count(store, claim);
+  }
   if (crowd.rows >= limit) clearDead(store, claim, crowd.rows, limit);
-  return crowd.nextId;
+  return crowd;
 }
 
 std::string isOf(const std::string& application) {
@@ -119,11 +147,32 @@ std::string isOf(const std::string& application) {
 }
 
 Claim tokenClaim(const Store& store, const std::string& application, long long now) {
-  Claim claim{names::kTokenTable, names::kTokenMax, errors::kTokenFull, "", "", "", "", "", "", 1};
+  Claim claim{
+      names::kTokenTable, names::kTokenMax, errors::kTokenFull, "", "", "", "", kAll, "", "", 1};
   claim.isDead = isDeadToken(store.policy, now);
   claim.isOfApplication = isOf(application);
   claim.order = renewal(names::kAccessToken, names::kTokenExpired) + ",id";
   return claim;
+}
+
+Claim loginClaim(const Store& store, const std::string& user, const std::string& application,
+                 Evicts evicts, long long now) {
+  Claim claim = tokenClaim(store, application, now);
+  claim.isOfUser =
+      "(" + isOneOf(names::kUsername, spellings(user)) + " AND NOT " + isOwnToken() + ")";
+  claim.isOfPair = "(" + claim.isOfUser + " AND " + claim.isOfApplication + ")";
+  claim.pairBound = store.policy.sessionsOfOne;
+  if (evicts == Evicts::kNothing) claim.givesWay = kNone;
+  return claim;
+}
+
+/// For one more than those that wait.
+bool hasRoomForLogin(Store& store, const Claim& claim, long long waiting) {
+  Crowd crowd = count(store, claim);
+  crowd.ofPair += waiting;
+  crowd.ofUser += waiting;
+  crowd.ofApplication += waiting;
+  return !excessOf(claim, crowd, store.policy);
 }
 
 }  // namespace
@@ -146,26 +195,26 @@ std::string isOwnToken() {
   return isOneOf(names::kFlowType, {kOwnFlow});
 }
 
-void makeRoomForCode(Store& store, const std::string& user, const std::string& application,
-                     long long now) {
+bool makeRoomForCode(Store& store, const std::string& user, const std::string& application,
+                     Evicts evicts, long long now) {
   const std::string isOfUser = isOneOf(names::kUsername, spellings(user));
   const std::string isOfApplication = isOf(application);
-  makeRoom(store,
-           {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull, isDeadCode(now),
-            "(NOT " + isSpentCode() + " AND " + isOfUser + " AND " + isOfApplication + ")",
-            isOfUser, isOfApplication,
-            isSpentCode() + " DESC," + renewal(names::kCode, names::kGrantCodeExpired) + ",id",
-            isSpentCode(), store.policy.codesOfOne});
+  const auto crowd = makeRoom(
+      store, {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull, isDeadCode(now),
+              "(NOT " + isSpentCode() + " AND " + isOfUser + " AND " + isOfApplication + ")",
+              isOfUser, isOfApplication, evicts == Evicts::kNothing ? isSpentCode() : kAll,
+              isSpentCode() + " DESC," + renewal(names::kCode, names::kGrantCodeExpired) + ",id",
+              isSpentCode(), store.policy.codesOfOne});
+  return crowd &&
+         (evicts == Evicts::kOldest ||
+          hasRoomForLogin(store, loginClaim(store, user, application, evicts, now), crowd->ofPair));
 }
 
-long long makeRoomForLogin(Store& store, const std::string& user, const std::string& application,
-                           long long now) {
-  Claim claim = tokenClaim(store, application, now);
-  claim.isOfUser =
-      "(" + isOneOf(names::kUsername, spellings(user)) + " AND NOT " + isOwnToken() + ")";
-  claim.isOfPair = "(" + claim.isOfUser + " AND " + claim.isOfApplication + ")";
-  claim.pairBound = store.policy.sessionsOfOne;
-  return makeRoom(store, claim);
+std::optional<long long> makeRoomForLogin(Store& store, const std::string& user,
+                                          const std::string& application, Evicts evicts,
+                                          long long now) {
+  const auto crowd = makeRoom(store, loginClaim(store, user, application, evicts, now));
+  return crowd ? std::optional<long long>(crowd->nextId) : std::nullopt;
 }
 
 long long makeRoomForOwnToken(Store& store, const std::string& application, bool registeredItself,
@@ -177,7 +226,7 @@ long long makeRoomForOwnToken(Store& store, const std::string& application, bool
                        : "0";
   claim.isOfPair = "(" + isOwnToken() + " AND " + claim.isOfApplication + ")";
   claim.pairBound = store.policy.tokensOfItself;
-  return makeRoom(store, claim);
+  return makeRoom(store, claim)->nextId;
 }
 
 void makeRoomForApplication(Store& store, bool registersItself, long long now) {

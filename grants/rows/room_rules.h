@@ -3,6 +3,7 @@
 #ifndef KELDOAUTH_GRANTS_ROWS_ROOM_RULES_H
 #define KELDOAUTH_GRANTS_ROWS_ROOM_RULES_H
 
+#include <optional>
 #include <string>
 
 #include "grants/rows/store.h"
@@ -27,12 +28,21 @@ std::string isOwnToken();
 // that its owner is due. Throws Trouble (kFull), with one line in the system
 // log, when there is none.
 
-void makeRoomForCode(Store& store, const std::string& user, const std::string& application,
-                     long long now);
+/// What of one's own goes beyond a bound.
+enum class Evicts { kOldest, kNothing };
 
-/// Both give the id that the row gets.
-long long makeRoomForLogin(Store& store, const std::string& user, const std::string& application,
-                           long long now);
+/// False when nothing that lives may go for the code, nor later for its login,
+/// and something would have to: the codes of the same user and application that
+/// wait to be redeemed count as logins then. Those that were redeemed do go.
+bool makeRoomForCode(Store& store, const std::string& user, const std::string& application,
+                     Evicts evicts, long long now);
+
+/// The id that the row gets; none as above.
+std::optional<long long> makeRoomForLogin(Store& store, const std::string& user,
+                                          const std::string& application, Evicts evicts,
+                                          long long now);
+
+/// The id that the row gets.
 /// The own tokens of all applications that registered themselves count as one
 /// user's: anybody can register any number of them.
 long long makeRoomForOwnToken(Store& store, const std::string& application, bool registeredItself,

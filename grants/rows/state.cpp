@@ -28,6 +28,15 @@ std::string joined(const char* start, const Fields& fields) {
   return text;
 }
 
+// What holds of a code.
+
+constexpr int kNamed = 1;
+constexpr int kEvictsNothing = 2;
+
+int flagsOf(const CodeState& state) {
+  return (state.isNamed ? kNamed : 0) + (state.evictsNothing ? kEvictsNothing : 0);
+}
+
 /// Reads decimal digits, and only those that to_string writes.
 template <typename Number>
 std::optional<Number> numberOf(std::string_view text) {
@@ -85,7 +94,7 @@ std::string issuedTime() {
 std::string pack(const CodeState& state) {
   Fields fields{std::to_string(state.issued),
                 state.redirect,
-                state.isNamed ? "1" : "0",
+                std::to_string(flagsOf(state)),
                 state.method,
                 state.challenge,
                 state.text};
@@ -108,12 +117,14 @@ std::optional<CodeState> unpackCode(std::string_view text) {
   if (!isSpent && start != kCodeStart) return {};
   const std::optional<Fields> fields =
       split(text.substr(kStart), isSpent ? kSpentFields : kCodeFields);
-  if (!fields || ((*fields)[2] != "1" && (*fields)[2] != "0")) return {};
-
+  if (!fields) return {};
   const std::optional<long long> issued = numberOf<long long>((*fields)[0]);
-  if (!issued) return {};
-  CodeState state{(*fields)[1], (*fields)[2] == "1", (*fields)[3], (*fields)[4],
+  const std::optional<int> flags = numberOf<int>((*fields)[2]);
+  if (!issued || !flags || *flags < 0 || *flags > kNamed + kEvictsNothing) return {};
+  CodeState state{(*fields)[1], *flags % kEvictsNothing == kNamed,
+                  (*fields)[3], (*fields)[4],
                   *issued,      (*fields)[5]};
+  state.evictsNothing = *flags >= kEvictsNothing;
   if (isSpent && !readSpent(*fields, state)) return {};
   return state;
 }

@@ -2,9 +2,9 @@
 // ours. A text begins with what it is and its version, and then has one field
 // after the other, each as its length, a colon and its bytes as they are:
 //
-//   c1  a code: when issued, redirect address, whether it was named (1 or 0),
-//       method of the challenge (S or P; empty without), challenge, caller's
-//       text
+//   c1  a code: when issued, redirect address, what holds of it (1: the address
+//       was named, 2: it evicts nothing; their sum), method of the challenge
+//       (S or P; empty without), challenge, caller's text
 //   s1  a code that was spent: the same, then when it was spent, its token's
 //       row and the family's mark
 //   t1  a token: when the present pair was issued, when its code was, and was
@@ -39,6 +39,7 @@ struct CodeState {
   long long issued;
   std::string text;
   std::optional<Spent> spent = {};
+  bool evictsNothing = false;
 };
 
 struct TokenState {

@@ -117,7 +117,11 @@ bool Store::change(OAUTHDBBasic& table, const Json::Value& condition, const Json
 
 void Store::changeSeen(OAUTHDBBasic& table, const Json::Value& condition,
                        const Json::Value& modified) {
-  if (!change(table, condition, modified)) throw Trouble(kMissed, kMissedRow);
+  if (!change(table, condition, modified)) failMissed();
+}
+
+void Store::failMissed() {
+  throw Trouble(kMissed, kMissedRow);
 }
 
 bool Store::erase(OAUTHDBBasic& table, const Json::Value& condition) {

@@ -56,6 +56,7 @@ class Store {
   /// missed it would hand out what the file does not know. Throws Trouble then.
   static void changeSeen(OAUTHDBBasic& table, const Json::Value& condition,
                          const Json::Value& modified);
+  [[noreturn]] static void failMissed();
   static bool erase(OAUTHDBBasic& table, const Json::Value& condition);
   /// Removes the rows that meet a condition of SQL.
   void eraseWhere(const char* table, const std::string& condition);

@@ -16,6 +16,12 @@ CodeRequest requestOf(const Household& household) {
   return request;
 }
 
+CodeRequest withoutPage(CodeRequest request) {
+  request.user = kAlice;
+  request.withoutPage = true;
+  return request;
+}
+
 ApplicationChange anotherName() {
   ApplicationChange change;
   change.name = ApplicationName("Another name");
@@ -40,6 +46,9 @@ std::string said(const Ended& ended) {
 std::string said(const Purged& purged) {
   return std::to_string(purged.codes) + " " + std::to_string(purged.tokens);
 }
+std::string said(bool is) {
+  return is ? "yes" : "no";
+}
 std::string said(long long number) {
   return std::to_string(number);
 }
@@ -62,6 +71,12 @@ std::vector<Operation> everyChange() {
       {"Redeem",
        [](auto& g, auto& h) {
          return said(g.codes.redeem({h.frame, h.code, kAddress, kVerifier}));
+       }},
+      {"IssueWithoutPage",
+       [](auto& g, auto& h) { return said(g.codes.issue(withoutPage(requestOf(h)))); }},
+      {"RedeemWithoutPage",
+       [](auto& g, auto& h) {
+         return said(g.codes.redeem({h.frame, h.quietCode, kAddress, kVerifier}));
        }},
       {"ReplayCode",
        [](auto& g, auto& h) {
@@ -114,6 +129,8 @@ std::vector<Operation> everyLookUp() {
        [](auto& g, auto& h) {
          return said(g.applications.authenticate(h.frame, Secret(support::id64('x'))));
        }},
+      {"HasLogin",
+       [](auto& g, auto& h) { return said(g.access.hasLogin(kAlice, h.frame, kScope)); }},
       {"List", [](auto& g, auto&) { return said(g.access.list({})); }},
       {"Count", [](auto& g, auto&) { return said(g.room.count().tokens.rows); }},
   };
@@ -134,6 +151,7 @@ void HouseholdTest::SetUp() {
   household_.replaced = login(household_.other, kBob);
   household_.current = refresh(household_.other, household_.replaced);
   household_.code = issue(household_.frame);
+  household_.quietCode = grants().codes.issue(withoutPage(requestOf(household_)))->code;
   support::Clock::advance(60);
   close();
   file_ = readFile(kDatabase);

@@ -18,6 +18,7 @@ struct Household {
   ApplicationId frame, other;
   Code code;            // alice's for frame
   Code spentCode;       // long ago, for `old`
+  Code quietCode;       // alice's for frame, without a page
   Pair old;             // alice's with frame
   Pair replaced;        // bob's with other, refreshed since
   Pair current;         // what took its place

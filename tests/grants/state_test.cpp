@@ -32,6 +32,23 @@ TEST(StateTest, ACodeComesBackAsItWas) {
   EXPECT_FALSE(state->spent);
 }
 
+TEST(StateTest, ACodeRemembersThatItEvictsNothing) {
+  for (const bool isNamed : {false, true}) {
+    for (const bool evictsNothing : {false, true}) {
+      CodeState state = code();
+      state.isNamed = isNamed;
+      state.evictsNothing = evictsNothing;
+      const auto back = unpackCode(pack(state));
+      ASSERT_TRUE(back);
+      EXPECT_EQ(back->isNamed, isNamed);
+      EXPECT_EQ(back->evictsNothing, evictsNothing);
+      EXPECT_EQ(pack(*back).size(), pack(code()).size());
+    }
+  }
+  EXPECT_FALSE(unpackCode("c11:10:1:40:0:0:"));
+  EXPECT_FALSE(unpackCode("c11:10:2:-10:0:0:"));
+}
+
 TEST(StateTest, ASpentCodeComesBackAsItWas) {
   CodeState spent = code();
   spent.isNamed = false;
