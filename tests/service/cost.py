@@ -38,12 +38,13 @@ def requests_per_second(path, headers):
     return sum(counts) / SECONDS
 
 
-def peak_kilobytes(program, headers):
-    environment = {"REQUEST_METHOD": "GET", "SERVICE_SETTINGS": service.RUN + "/settings.json",
+def peak_kilobytes(program, path, headers):
+    environment = {"REQUEST_METHOD": "GET", "SCRIPT_NAME": path,
+                   "KELDOAUTH_SERVICE_SETTINGS": service.RUN + "/settings.json",
                    "HTTP_AUTHORIZATION": headers["Authorization"]}
-    path = os.path.join(os.environ["SERVICE_PROGRAMS"], program)
+    program = os.path.join(os.environ["SERVICE_PROGRAMS"], program)
     # A small parent: what it holds before it becomes the program counts as well.
-    done = subprocess.run(["/usr/bin/time", "-f", "%M", path], env=environment, check=True,
+    done = subprocess.run(["/usr/bin/time", "-f", "%M", program], env=environment, check=True,
                           stdout=subprocess.PIPE, stderr=subprocess.PIPE)
     assert done.stdout.startswith(b"Status: 200"), done.stdout
     return int(done.stderr)
@@ -52,10 +53,10 @@ def peak_kilobytes(program, headers):
 def main():
     headers = service.bearer(service.register().tokens()["access_token"])
     report = ""
-    for title, path, program in (("verification (/api/whoami)", "/api/whoami", "whoami"),
+    for title, path, program in (("verification (/api/whoami)", "/api/whoami", "keldoauth-service"),
                                  ("nothing (/api/nothing)", "/api/nothing", "nothing")):
         rate = requests_per_second(path, headers)
-        peak = peak_kilobytes(program, headers)
+        peak = peak_kilobytes(program, path, headers)
         report += (f"{title}: {rate:.0f} requests/s, {1000 * CALLERS / rate:.1f} ms each, "
                    f"peak {peak / 1024:.1f} MiB\n")
     if len(sys.argv) > 1:

@@ -8,15 +8,16 @@
 #include <sstream>
 #include <string>
 
-#include "examples/cgi/answer.h"
-#include "examples/cgi/encoding.h"
-#include "examples/cgi/html.h"
-#include "examples/cgi/http.h"
-#include "examples/cgi/redirect.h"
+#include "service/http/answer.h"
+#include "service/http/encoding.h"
+#include "service/http/gateway.h"
+#include "service/pages/html.h"
+#include "service/protocol/redirect.h"
 #include "tests/fuzz/expect.h"
 
 namespace {
 
+namespace service = keldoauth::service;
 using fuzz::expect;
 
 void expectDecoding(const std::string& text) {
@@ -77,7 +78,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     return variable == "HTTP_AUTHORIZATION" ? lines[2].c_str() : nullptr;
   };
   try {
-    const service::Request request = service::readRequest(environment, input);
+    const auto body = [&](char* into, std::size_t count) {
+      return static_cast<std::size_t>(
+          input.read(into, static_cast<std::streamsize>(count)).gcount());
+    };
+    const service::Request request = service::readRequest(environment, body);
     expect(request.body.size() <= service::kMaxBody, "bounded body");
     expectParameters(request.body);
   } catch (const service::Refusal& refusal) {

@@ -1,6 +1,6 @@
 """The service under test, as plain HTTP: no client library in between.
 
-Started by examples/cgi/serve, which says in the environment where the service
+Started by service/serve, which says in the environment where the service
 is and who may log in.
 """
 
@@ -28,11 +28,6 @@ SETTINGS = "/var/packages/Corvane/target/etc/oauth.cfg"
 SEEN_SECRETS = {INITIAL_TOKEN, *USERS.values()}
 
 FORM = {"Content-Type": "application/x-www-form-urlencoded"}
-
-
-PROGRAMS = {"/oauth/register": "register", "/oauth/authorize": "authorize",
-            "/oauth/token": "token", "/oauth/introspect": "introspect",
-            "/oauth/revoke": "revoke", "/api/whoami": "whoami", "/admin": "admin"}
 
 
 class Answer:
@@ -88,11 +83,12 @@ def killed_at(step):
 
 
 def run(method, path, body, headers):
-    """One request to the program that serves `path`, as the web server starts it."""
+    """One request to the program, as the web server starts it for CGI."""
     path, _, query = path.partition("?")
     body = body.encode() if isinstance(body, str) else body or b""
     authorization = headers.get("Authorization", "")
-    environment = {**_moment, "SERVICE_SETTINGS": RUN + "/settings.json", "QUERY_STRING": query,
+    environment = {**_moment, "KELDOAUTH_SERVICE_SETTINGS": RUN + "/settings.json",
+                   "GATEWAY_INTERFACE": "CGI/1.1", "SCRIPT_NAME": path, "QUERY_STRING": query,
                    "REQUEST_METHOD": method, "CONTENT_LENGTH": str(len(body)),
                    "CONTENT_TYPE": headers.get("Content-Type", ""), "REMOTE_ADDR": "127.0.0.1",
                    "HTTP_AUTHORIZATION": authorization,
@@ -102,7 +98,7 @@ def run(method, path, body, headers):
         login = base64.b64decode(authorization.partition(" ")[2]).decode()
         environment["REMOTE_USER"] = login.partition(":")[0]
     runner = [os.environ["SERVICE_RUNNER"]] if os.environ.get("SERVICE_RUNNER") else []
-    program = os.path.join(os.environ["SERVICE_PROGRAMS"], PROGRAMS[path])
+    program = os.path.join(os.environ["SERVICE_PROGRAMS"], "keldoauth-service")
     done = subprocess.run([*runner, program], env=environment, input=body, check=False,
                           stdout=subprocess.PIPE, stderr=subprocess.PIPE)
     if done.returncode == -9:

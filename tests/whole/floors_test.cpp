@@ -37,7 +37,11 @@ const std::vector<Floor>& floors() {
                                       {"stores", 3},
                                       {"grants", 4},
                                       {"examples", 5},
-                                      {"examples/cgi", 5},
+                                      {"service/http", 5},
+                                      {"service/settings", 6},
+                                      {"service/store", 7},
+                                      {"service", 8},
+                                      {"service/program", 9},
                                       {"bench", 5},
                                       {"tools/keldoauth/console", 5},
                                       {"tools/keldoauth/storage", 6},
@@ -77,8 +81,8 @@ Texts includesOf(const std::filesystem::path& path) {
 
 Includes readHouse() {
   Includes house;
-  for (const char* root :
-       {"platform", "utils", "core", "stores", "grants", "examples", "bench", "tools/keldoauth"}) {
+  for (const char* root : {"platform", "utils", "core", "stores", "grants", "examples", "service",
+                           "bench", "tools/keldoauth"}) {
     for (const auto& entry : std::filesystem::recursive_directory_iterator(root)) {
       const std::string kind = entry.path().extension();
       if (kind == ".h" || kind == ".cpp") house[entry.path()] = includesOf(entry.path());
@@ -141,7 +145,8 @@ TEST(FloorRuleTest, RefusesHigherFloorsNeighboursAndStrangers) {
   EXPECT_FALSE(mayInclude("tools/keldoauth/console/a.cpp", "tools/keldoauth/storage/b.h"));
   EXPECT_FALSE(mayInclude("tools/keldoauth/storage/a.cpp", "tools/keldoauth/commands/b.h"));
   EXPECT_FALSE(mayInclude("core/a.cpp", "platform/standin/b.h"));
-  EXPECT_FALSE(mayInclude("examples/cgi/a.cpp", "tools/keldoauth/console/b.h"));
+  EXPECT_FALSE(mayInclude("service/http/a.cpp", "tools/keldoauth/console/b.h"));
+  EXPECT_FALSE(mayInclude("service/settings/a.cpp", "service/pages/b.h"));
   EXPECT_FALSE(mayInclude("stores/a.cpp", "tests/support/b.h"));
 }
 

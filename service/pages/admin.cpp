@@ -1,0 +1,53 @@
+#include "service/pages/admin_actions.h"
+#include "service/pages/admin_pages.h"
+#include "service/pages/admin_view.h"
+#include "service/pages/form_token.h"
+#include "service/pages/html.h"
+
+namespace keldoauth::service {
+namespace {
+
+Answer show(Context& context, const Request& request, const Parameters& query) {
+  const std::string view = query.value("view");
+  const std::string done = query.value("done");
+  if (view == "access") {
+    return accessPage(context, request, done, {query.value("user"), query.value("application")});
+  }
+  if (view == "log") {
+    return logPage(context, request, query.value("filter"), query.value("page"));
+  }
+  if (view == "storage") return storagePage(context, request);
+  return applicationsPage(context, request, done, {});
+}
+
+bool isFromHere(const Settings& settings, const Request& request, const Parameters& form) {
+  return !form.isDoubled("form_token") &&
+         isFormToken(settings, form.value("form_token"), request.user, kAdminSubject);
+}
+
+}  // namespace
+
+Answer admin(Context& context, const Request& request) {
+  // The web server should have kept others out; the settings have the last word.
+  if (context.settings.administrators.count(request.user) == 0) {
+    return messagePage(context.settings, 403, "Not for you",
+                       "This page is for the administrators of the box.");
+  }
+  const bool isForm = request.method == "POST";
+  if (!isForm && !request.isRead()) return methodNotAllowed("GET, HEAD, POST");
+  if (isForm && !request.isForm()) {
+    return messagePage(context.settings, 400, "This is not a form", "Nothing was changed.");
+  }
+  const std::optional<Parameters> given = Parameters::parse(isForm ? request.body : request.query);
+  if (!given)
+    return messagePage(context.settings, 400, "The request cannot be read", "Nothing was changed.");
+  if (isForm && !isFromHere(context.settings, request, *given)) {
+    return messagePage(context.settings, 403, "This form is too old",
+                       "Or it does not come from this box. Nothing was changed; go back and "
+                       "repeat what you did.",
+                       "/admin");
+  }
+  return isForm ? act(context, request, *given) : show(context, request, *given);
+}
+
+}  // namespace keldoauth::service

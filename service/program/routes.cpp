@@ -1,0 +1,54 @@
+#include "service/program/routes.h"
+
+#include <algorithm>
+#include <iterator>
+
+#include "service/pages/admin_pages.h"
+#include "service/pages/html.h"
+#include "service/protocol/endpoints.h"
+
+namespace keldoauth::service {
+namespace {
+
+constexpr std::string_view kWellKnown = "/.well-known/";
+
+constexpr Route kRoutes[] = {
+    {"/.well-known/oauth-authorization-server", metadata, tellAsJson},
+    {"/oauth/authorize", authorize, failurePage},
+    {"/oauth/introspect", introspect, tellAsJson},
+    {"/oauth/register", registerApplication, tellAsJson},
+    {"/oauth/revoke", revoke, tellAsJson},
+    {"/oauth/token", token, tellAsJson},
+    {"/api/whoami", whoami, tellAsJson},
+    {"/admin", admin, failurePage},
+};
+
+bool startsWith(std::string_view text, std::string_view start) {
+  return text.substr(0, start.size()) == start;
+}
+
+bool endsWith(std::string_view text, std::string_view end) {
+  return text.size() >= end.size() && text.substr(text.size() - end.size()) == end;
+}
+
+/// The path below the issuer's; empty when it is not below.
+std::string_view pathBelow(std::string_view path, std::string_view base) {
+  if (startsWith(path, base)) return path.substr(base.size());
+  const bool isBefore = startsWith(path, kWellKnown) && endsWith(path, base);
+  return isBefore ? path.substr(0, path.size() - base.size()) : std::string_view();
+}
+
+}  // namespace
+
+Answer tellAsJson(const Settings& /*settings*/, const Failure& failure) {
+  return failureAsJson(failure);
+}
+
+const Route* routeOf(const std::string& path, const std::string& basePath) {
+  const std::string_view below = pathBelow(path, basePath);
+  const auto* const found = std::find_if(std::begin(kRoutes), std::end(kRoutes),
+                                         [&](const Route& route) { return route.path == below; });
+  return found == std::end(kRoutes) ? nullptr : found;
+}
+
+}  // namespace keldoauth::service

@@ -1,0 +1,40 @@
+#include "service/protocol/endpoints.h"
+
+#include "service/settings/scopes.h"
+
+namespace keldoauth::service {
+namespace {
+
+Json::Value list(std::initializer_list<const char*> texts) {
+  Json::Value array(Json::arrayValue);
+  for (const char* text : texts) array.append(text);
+  return array;
+}
+
+}  // namespace
+
+Answer metadata(Context& context, const Request& request) {
+  if (!request.isRead()) return methodNotAllowed("GET, HEAD");
+  const Settings& own = context.settings;
+  Json::Value document;
+  document["issuer"] = own.issuer;
+  document["authorization_endpoint"] = own.endpoint("/oauth/authorize");
+  document["token_endpoint"] = own.endpoint("/oauth/token");
+  document["registration_endpoint"] = own.endpoint("/oauth/register");
+  document["introspection_endpoint"] = own.endpoint("/oauth/introspect");
+  document["revocation_endpoint"] = own.endpoint("/oauth/revoke");
+  document["response_types_supported"] = list({"code"});
+  document["response_modes_supported"] = list({"query"});
+  document["grant_types_supported"] =
+      list({"authorization_code", "refresh_token", "client_credentials"});
+  document["code_challenge_methods_supported"] = list({"S256"});
+  for (const char* endpoint : {"token", "introspection", "revocation"}) {
+    document[std::string(endpoint) + "_endpoint_auth_methods_supported"] =
+        list({"client_secret_basic", "client_secret_post"});
+  }
+  document["authorization_response_iss_parameter_supported"] = true;
+  for (const KnownScope& scope : own.scopes) document["scopes_supported"].append(scope.name);
+  return jsonAnswer(200, document);
+}
+
+}  // namespace keldoauth::service

@@ -1,0 +1,92 @@
+#include "service/protocol/endpoints.h"
+
+#include "service/http/encoding.h"
+#include "service/protocol/clients.h"
+#include "service/settings/scopes.h"
+
+namespace keldoauth::service {
+namespace {
+
+constexpr std::size_t kLeastVerifier = 43;
+constexpr std::size_t kMostVerifier = 128;
+
+/// Who asks for a token, and where from.
+struct Asking {
+  grants::ApplicationId client;
+  grants::PeerAddress from;
+};
+
+[[noreturn]] void refuse(const std::string& error, const std::string& why) {
+  throw Refusal{oauthError(400, error, why)};
+}
+
+std::string required(const Parameters& form, const char* name) {
+  if (!form.has(name)) refuse("invalid_request", std::string(name) + " is missing");
+  return form.value(name);
+}
+
+std::optional<grants::Scope> askedScope(const Parameters& form) {
+  if (!form.has("scope")) return {};
+  const std::string scope = tidyScope(form.value("scope"));
+  if (scope.empty()) refuse("invalid_scope", "scope names nothing");
+  return grants::Scope(scope);
+}
+
+grants::Outcome<grants::Pair> redeemCode(grants::Grants& store, const Asking& asking,
+                                         const Parameters& form) {
+  const grants::Code code(required(form, "code"));
+  const std::string verifier = required(form, "code_verifier");
+  if (verifier.size() < kLeastVerifier || verifier.size() > kMostVerifier ||
+      percentEncode(verifier) != verifier) {
+    refuse("invalid_grant", "code_verifier is none");
+  }
+  const grants::RedirectAddress redirect(form.value("redirect_uri"));
+  return store.codes.redeem(
+      {asking.client, code, redirect, grants::Verifier(verifier), asking.from});
+}
+
+grants::Outcome<grants::Pair> refresh(grants::Grants& store, const Asking& asking,
+                                      const Parameters& form) {
+  const grants::RefreshToken token(required(form, "refresh_token"));
+  return store.tokens.refresh({asking.client, token, askedScope(form), asking.from});
+}
+
+grants::Outcome<grants::Pair> actForItself(grants::Grants& store, const Asking& asking,
+                                           const Parameters& form) {
+  return store.tokens.issueToItself({asking.client, askedScope(form), asking.from});
+}
+
+Answer success(const grants::Pair& pair) {
+  Json::Value document;
+  document["access_token"] = pair.access.text();
+  document["token_type"] = "Bearer";
+  document["expires_in"] = static_cast<Json::Int64>(pair.expires - pair.issued);
+  document["scope"] = pair.scope.text();
+  if (pair.refresh) document["refresh_token"] = pair.refresh->text();
+  return jsonAnswer(200, document).with("Pragma", "no-cache");
+}
+
+using Grant = grants::Outcome<grants::Pair> (*)(grants::Grants& store, const Asking& asking,
+                                                const Parameters& form);
+
+Grant grantOf(const Parameters& form) {
+  const std::string type = required(form, "grant_type");
+  if (type == "authorization_code") return redeemCode;
+  if (type == "refresh_token") return refresh;
+  if (type == "client_credentials") return actForItself;
+  refuse("unsupported_grant_type", "This grant type is not supported");
+}
+
+}  // namespace
+
+Answer token(Context& context, const Request& request) {
+  const Parameters form = readForm(
+      request, {"grant_type", "code", "redirect_uri", "code_verifier", "refresh_token", "scope"});
+  const Credentials credentials = readCredentials(request, form);
+  grants::Grants& store = context.store.open();
+  const grants::Application client = authenticate(store, credentials);
+  const auto pair = grantOf(form)(store, {client.identifier, peerAddress(request)}, form);
+  return pair ? success(*pair) : refusalAnswer(pair.refusal());
+}
+
+}  // namespace keldoauth::service
