@@ -121,7 +121,7 @@ std::string isIts(const ApplicationId& application) {
 
 Conditions conditionsOf(const std::optional<User>& user,
                         const std::optional<ApplicationId>& application, Rows rows = Rows::kAll) {
-  Conditions conditions{rows == Rows::kTokens ? kNoRow : kEveryRow,
+  Conditions conditions{rows == Rows::kTokens ? kNoRow : "NOT " + rows::isPushedRequest(),
                         rows == Rows::kCodes ? kNoRow : kEveryRow};
   if (application) {
     conditions.codes += " AND " + isIts(*application);

@@ -70,7 +70,8 @@ struct ApplicationChange {
   std::optional<bool> needsPkce = {};
 };
 
-/// Rows that went with an application, dead and spent ones included.
+/// Rows that went with an application, dead and spent ones and pushed requests
+/// included.
 struct Removed {
   int codes;
   int tokens;

@@ -7,6 +7,7 @@
 #include "grants/rows/digest.h"
 #include "grants/rows/issuing.h"
 #include "grants/rows/notes.h"
+#include "grants/rows/pushed_rows.h"
 #include "grants/rows/quotes.h"
 #include "grants/rows/read_rows.h"
 #include "grants/rows/room_rules.h"
@@ -25,6 +26,7 @@ using rows::doubled;
 
 constexpr Bounds kChallenge{1, 128};
 constexpr Bounds kRedirect{0, bounds::kRedirectUri.max};
+constexpr Bounds kReference{0, kIdentifierLength};
 constexpr char kS256[] = "S";
 constexpr char kPlain[] = "P";
 
@@ -57,6 +59,15 @@ std::optional<Refusal> faultOf(const CodeRequest& request, const Application& ap
   if (application.needsPkce && !request.pkce && !request.waivesPkce) {
     return requestFault(Why::kNeedsPkce);
   }
+  return {};
+}
+
+/// One code for one pushed request.
+std::optional<Refusal> takePushed(Store& store, const CodeRequest& request, long long now) {
+  if (!request.pushed) return {};
+  const auto pushed = rows::findPushed(store, request.application.text(), *request.pushed, now);
+  if (!pushed) return pushed.refusal();
+  rows::erase(store, pushed->row);
   return {};
 }
 
@@ -155,11 +166,13 @@ void spend(Store& store, const CodeRow& code, const rows::Stored& login, long lo
 
 std::optional<Refusal> Codes::faultOf(const CodeRequest& request) {
   const std::string challenge = request.pkce ? request.pkce->challenge.text() : "-";
+  const std::string reference = request.pushed ? request.pushed->text() : "";
   const auto why = rows::faultOf({{request.user.text(), bounds::kUsername},
                                   {request.application.text(), bounds::kIdentifier},
                                   {request.scope.text(), bounds::kScope},
                                   {request.redirect.text(), kRedirect},
                                   {challenge, kChallenge},
+                                  {reference, kReference},
                                   {request.text.text(), kCallerTextBounds}});
   if (why) return requestFault(*why);
   if (request.user.text() == kNoUser) return requestFault(Why::kReservedUser);
@@ -181,6 +194,7 @@ Outcome<IssuedCode> Codes::issue(const CodeRequest& request) {
   if (!application) return application.refusal();
   if (const auto fault = grants::faultOf(request, application->shown)) return *fault;
   if (const auto fault = faultWithoutPage(store_, request, now)) return *fault;
+  if (const auto fault = takePushed(store_, request, now)) return *fault;
   if (!rows::makeRoomForCode(store_, request.user.text(), request.application.text(),
                              evictsOf(request.withoutPage), now)) {
     return Refusal{Error::kAccessDenied, Why::kWouldEvict};

@@ -51,6 +51,9 @@ struct CodeRequest {
   /// that wait to be redeemed counted in, for the login. Either way the user can
   /// be asked instead.
   bool withoutPage = false;
+  /// The pushed request that this came from, which ends with it: refused
+  /// (kInvalidRequestUri) when it is not this application's, or not any more.
+  std::optional<RequestReference> pushed = {};
 };
 
 /// What goes to the application, by way of the user.
@@ -84,7 +87,7 @@ class Codes {
   [[nodiscard]] static std::optional<Refusal> faultOf(const CodeRequest& request);
 
   /// Refusals: kInvalidRequest (also for what `faultOf` finds), kInvalidClient,
-  /// kInvalidScope; kAccessDenied without a page. Beyond a bound of the policy
+  /// kInvalidScope, kInvalidRequestUri; kAccessDenied without a page. Beyond a bound of the policy
   /// the user's oldest codes for this application, the user's and the
   /// application's go. Trouble: kFull.
   Outcome<IssuedCode> issue(const CodeRequest& request);

@@ -8,6 +8,7 @@ Grants::Grants(const Policy& policy)
     : store_(std::make_unique<Store>(policy)),
       applications(*store_),
       codes(*store_),
+      pushed(*store_),
       tokens(*store_),
       access(*store_),
       room(*store_),

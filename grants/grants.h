@@ -27,6 +27,7 @@
 #include "grants/codes.h"
 #include "grants/outcome.h"
 #include "grants/policy.h"
+#include "grants/pushed.h"
 #include "grants/room.h"
 #include "grants/texts.h"
 #include "grants/tokens.h"
@@ -52,6 +53,7 @@ class Grants {
 
   Applications applications;
   Codes codes;
+  PushedRequests pushed;
   Tokens tokens;
   Access access;
   Room room;

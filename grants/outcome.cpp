@@ -9,11 +9,11 @@ namespace {
 // In the order of the enumerators.
 
 constexpr std::array kCodes{
-    "invalid_request",      "invalid_client",          "invalid_grant",
-    "unauthorized_client",  "invalid_scope",           "invalid_token",
-    "invalid_redirect_uri", "invalid_client_metadata", "access_denied",
+    "invalid_request", "invalid_client",      "invalid_grant",        "unauthorized_client",
+    "invalid_scope",   "invalid_token",       "invalid_redirect_uri", "invalid_client_metadata",
+    "access_denied",   "invalid_request_uri",
 };
-static_assert(kCodes.size() == static_cast<std::size_t>(Error::kAccessDenied) + 1);
+static_assert(kCodes.size() == static_cast<std::size_t>(Error::kInvalidRequestUri) + 1);
 
 constexpr std::array kReasons{
     "A value has a NUL byte",

@@ -20,6 +20,7 @@ enum class Error {
   kInvalidRedirectUri,     // RFC 7591
   kInvalidClientMetadata,  // RFC 7591: anything else of a registration
   kAccessDenied,           // RFC 6749: the user has to be asked first
+  kInvalidRequestUri,      // RFC 9101: a pushed request that is no good
 };
 
 /// The code as it stands in an answer: "invalid_request", ...

@@ -16,12 +16,14 @@ struct Policy {
   int codesOfOne = 3;       // live codes of one user for one application
   int sessionsOfOne = 8;    // logins of one user with one application
   int tokensOfItself = 32;  // live tokens of one application that acts for itself
+  int pushedOfOne = 32;     // live pushed requests of one application
 
   // Shares of a table, as one part in so many.
 
   int userPart = 4;            // one user: a quarter of the codes, of the tokens;
                                // as much for the own tokens of all applications
-                               // that registered themselves together
+                               // that registered themselves together, and for
+                               // the pushed requests of all applications
   int applicationPart = 2;     // one application: half of them
   int selfRegisteredPart = 2;  // applications that registered themselves: half
                                // of the registry
@@ -36,6 +38,9 @@ struct Policy {
   /// A code or refresh token that comes again so soon is a client that tried
   /// twice. Counted from the use: a clock that was set back gives none.
   long long grace = 10;
+  /// A pushed request can be opened so long, and once it was, for so long again.
+  long long pushed = 60;
+  long long pushedOpen = 10LL * 60;
   /// The same entry of the audit log within so long is counted, not repeated.
   long long auditPause = 60LL * 60;
 };

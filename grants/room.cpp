@@ -1,6 +1,7 @@
 #include "grants/room.h"
 
 #include <algorithm>
+#include <initializer_list>
 #include <string>
 
 #include "grants/rows/room_rules.h"
@@ -12,11 +13,21 @@
 namespace KELDOAUTHSERVER::grants {
 namespace {
 
-/// Rows, and how many of them meet each condition.
-std::vector<long long> countIn(Store& store, const char* table, const std::string& first,
-                               const std::string& second = "0") {
-  return store.numbers("SELECT COUNT(*),IFNULL(SUM(" + first + "),0),IFNULL(SUM(" + second +
-                       "),0) FROM " + table);
+/// A table of one row: how many rows there are, and how many of them meet each
+/// condition.
+std::string countOf(const char* table, std::initializer_list<std::string> conditions = {}) {
+  std::string select = "(SELECT COUNT(*)";
+  for (const std::string& condition : conditions) select += ",IFNULL(SUM(" + condition + "),0)";
+  return select + " FROM " + table + ")";
+}
+
+/// All of them at one moment.
+std::vector<long long> countsOf(Store& store, std::initializer_list<std::string> tables) {
+  std::string select;
+  for (const std::string& table : tables) {
+    select += (select.empty() ? "SELECT * FROM " : ",") + table;
+  }
+  return store.numbers(select);
 }
 
 struct Conditions {
@@ -38,22 +49,26 @@ Conditions deadFor(long long grace, Rows rows, const Policy& policy) {
 RoomCount Room::count() const {
   const long long now = currentTime();
   const std::string deadCode = rows::isDeadCode(now);
-  const auto applications = countIn(store_, names::kClientInfoTable, "0");
-  const auto codes = countIn(store_, names::kGrantCodeTable, deadCode,
-                             "(NOT " + deadCode + " AND " + rows::isSpentCode() + ")");
-  const auto tokens = countIn(store_, names::kTokenTable, rows::isDeadToken(store_.policy, now));
-  const auto log = countIn(store_, names::kLogTable, "0");
-  return {{applications[0], getTableRowMax(names::kClientInfoMax), 0},
-          {codes[0], getTableRowMax(names::kGrantCodeMax), codes[1]},
-          codes[2],
-          {tokens[0], getTableRowMax(names::kTokenMax), tokens[1]},
-          {log[0], getTableRowMax(names::kLogMax), 0}};
+  const std::string liveAnd = "(NOT " + deadCode + " AND ";
+  const auto counts = countsOf(
+      store_, {countOf(names::kClientInfoTable),
+               countOf(names::kGrantCodeTable, {deadCode, liveAnd + rows::isSpentCode() + ")",
+                                                liveAnd + rows::isPushedRequest() + ")"}),
+               countOf(names::kTokenTable, {rows::isDeadToken(store_.policy, now)}),
+               countOf(names::kLogTable)});
+  return {{counts[0], getTableRowMax(names::kClientInfoMax), 0},
+          {counts[1], getTableRowMax(names::kGrantCodeMax), counts[2]},
+          counts[3],
+          counts[4],
+          {counts[5], getTableRowMax(names::kTokenMax), counts[6]},
+          {counts[7], getTableRowMax(names::kLogMax), 0}};
 }
 
 Purged Room::purgeable(long long grace, Rows rows) const {
   const Conditions dead = deadFor(grace, rows, store_.policy);
-  return {countIn(store_, names::kGrantCodeTable, dead.codes)[1],
-          countIn(store_, names::kTokenTable, dead.tokens)[1]};
+  const auto counts = countsOf(store_, {countOf(names::kGrantCodeTable, {dead.codes}),
+                                        countOf(names::kTokenTable, {dead.tokens})});
+  return {counts[1], counts[3]};
 }
 
 Purged Room::purge(long long grace, Rows rows) {

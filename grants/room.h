@@ -2,6 +2,7 @@
 //
 //   a code     from its expiry on; one that was redeemed is remembered until the
 //              login that came from it has to end, which is its expiry then
+//   a pushed request from its expiry on; it counts as a code
 //   a login    when nobody has refreshed it for the policy's idle time after its
 //              access token expired
 //   own token  after its expiry
@@ -28,6 +29,7 @@ struct RoomCount {
   TableRoom applications;  // none is ever dead
   TableRoom codes;
   long long spentCodes;  // not dead, but they give way when a code needs room
+  long long pushed;      // requests that wait among the codes
   TableRoom tokens;
   TableRoom log;  // drops its oldest entries by itself
 };
@@ -42,6 +44,7 @@ class Room {
  public:
   explicit Room(Store& store) : store_(store) {}
 
+  /// All of it at one moment.
   [[nodiscard]] RoomCount count() const;
 
   /// What `purge` would remove.

@@ -67,6 +67,12 @@ using Verifier = Text<struct VerifierKind>;
 /// refreshes too.
 using CallerText = Text<struct CallerTextKind>;
 inline constexpr Bounds kCallerTextBounds{0, 512};
+/// The parameters of a pushed request, in a form of the caller's own.
+using RequestText = Text<struct RequestTextKind>;
+inline constexpr Bounds kRequestTextBounds{1, 2000};
+/// What stands for it: 64 lowercase hexadecimal digits. The caller's to put
+/// behind "urn:ietf:params:oauth:request_uri:".
+using RequestReference = Text<struct RequestReferenceKind>;
 /// An IPv4 or IPv6 address, or empty.
 using PeerAddress = Text<struct PeerAddressKind>;
 

@@ -154,6 +154,7 @@ std::optional<TokenRow> findToken(Store& store, const char* column, const std::s
 std::optional<CodeRow> findShownCode(Store& store, const std::string& text) {
   if (hasNul(text) || isMark(text)) return {};
   std::optional<CodeRow> code = findCode(store, names::kCode, markOf(text));
+  if (code && unpackPushed(undoubled(code->storedState))) return {};
   if (code || !isWithin(text, bounds::kIdentifier)) return code;
   return findCode(store, names::kCode, doubled(text));
 }

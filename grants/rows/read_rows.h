@@ -66,7 +66,8 @@ std::optional<CodeRow> findCode(Store& store, const char* column, const std::str
 std::optional<TokenRow> findToken(Store& store, const char* column, const std::string& stored);
 
 /// By what a bearer shows: its mark, or, of another program's row, the text as
-/// it stands. A text that is a mark itself finds nothing.
+/// it stands. A text that is a mark itself finds nothing, nor does the reference
+/// of a pushed request.
 std::optional<CodeRow> findShownCode(Store& store, const std::string& text);
 std::optional<TokenRow> findShownAccess(Store& store, const std::string& text);
 /// Another program's refresh token: costs a scan.

@@ -142,6 +142,12 @@ std::optional<Crowd> makeRoom(Store& store, const Claim& claim) {
   return crowd;
 }
 
+/// A code's row that this floor wrote, whose state begins so.
+std::string isOursAnd(std::string_view start) {
+  return "(" + beginsWith(names::kState, start) + " AND " + beginsWith(names::kCode, kMarkStart) +
+         ")";
+}
+
 std::string isOf(const std::string& application) {
   return isOneOf(names::kClientId, {Store::sealed(application)});
 }
@@ -182,8 +188,11 @@ std::string isDeadCode(long long now, long long grace) {
 }
 
 std::string isSpentCode() {
-  return "(" + beginsWith(names::kState, kSpentStart) + " AND " +
-         beginsWith(names::kCode, kMarkStart) + ")";
+  return isOursAnd(kSpentStart);
+}
+
+std::string isPushedRequest() {
+  return isOursAnd(kPushedStart);
 }
 
 std::string isDeadToken(const Policy& policy, long long now, long long grace) {
@@ -198,7 +207,8 @@ std::string isOwnToken() {
 bool makeRoomForCode(Store& store, const std::string& user, const std::string& application,
                      Evicts evicts, long long now) {
   const std::string isOfUser = isOneOf(names::kUsername, spellings(user));
-  const std::string isOfApplication = isOf(application);
+  const std::string isOfApplication =
+      "(" + isOf(application) + " AND NOT " + isPushedRequest() + ")";
   const auto crowd = makeRoom(
       store, {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull, isDeadCode(now),
               "(NOT " + isSpentCode() + " AND " + isOfUser + " AND " + isOfApplication + ")",
@@ -229,6 +239,19 @@ long long makeRoomForOwnToken(Store& store, const std::string& application, bool
   return makeRoom(store, claim)->nextId;
 }
 
+/// All of them together have a part of the table, in which nobody loses any but
+/// the own.
+void makeRoomForPushed(Store& store, const std::string& application, long long now) {
+  const std::string isOfOne = "(" + isPushedRequest() + " AND " + isOf(application) + ")";
+  const bool isRoom =
+      makeRoom(store, {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull,
+                       isDeadCode(now), isOfOne, isPushedRequest(), kNone, isOfOne,
+                       renewal(names::kCode, names::kGrantCodeExpired) + ",id", isSpentCode(),
+                       store.policy.pushedOfOne})
+          .has_value();
+  if (!isRoom) fail(errors::kGrantCodeFull);
+}
+
 void makeRoomForApplication(Store& store, bool registersItself, long long now) {
   const long long limit = getTableRowMax(names::kClientInfoMax);
   const std::vector<long long> found = store.numbers(
@@ -242,9 +265,9 @@ void makeRoomForApplication(Store& store, bool registersItself, long long now) {
   const std::string identifier = names::kClientId;
   const std::string live = " AND " + identifier + " NOT IN (SELECT " + identifier + " FROM ";
   const std::string unused = selfCondition() + live + names::kGrantCodeTable + " WHERE NOT " +
-                             isDeadCode(now) + " AND NOT " + isSpentCode() + ")" + live +
-                             names::kTokenTable + " WHERE NOT " + isDeadToken(store.policy, now) +
-                             ")";
+                             isDeadCode(now) + " AND NOT " + isSpentCode() + " AND NOT " +
+                             isPushedRequest() + ")" + live + names::kTokenTable + " WHERE NOT " +
+                             isDeadToken(store.policy, now) + ")";
   const long long gone = store.countErased(
       names::kClientInfoTable, "id IN (SELECT id FROM " + std::string(names::kClientInfoTable) +
                                    " WHERE " + unused + " ORDER BY id LIMIT " +

@@ -16,6 +16,8 @@ namespace KELDOAUTHSERVER::grants::rows {
 /// login has to end, which is its expiry then.
 std::string isDeadCode(long long now, long long grace = 0);
 std::string isSpentCode();
+/// No code at all, but among them.
+std::string isPushedRequest();
 
 /// An application's own token is good until its expiry, included; a login can
 /// be refreshed for the policy's idle time after it.
@@ -47,6 +49,8 @@ std::optional<long long> makeRoomForLogin(Store& store, const std::string& user,
 /// user's: anybody can register any number of them.
 long long makeRoomForOwnToken(Store& store, const std::string& application, bool registeredItself,
                               long long now);
+
+void makeRoomForPushed(Store& store, const std::string& application, long long now);
 
 void makeRoomForApplication(Store& store, bool registersItself, long long now);
 

@@ -5,6 +5,7 @@
 #include <system_error>
 #include <vector>
 
+#include "grants/texts.h"
 #include "utils/oauth_bounds.h"
 #include "utils/oauth_names.h"
 
@@ -16,6 +17,7 @@ constexpr char kTokenStart[] = "t1";
 constexpr std::size_t kStart = 2;
 constexpr std::size_t kCodeFields = 6;
 constexpr std::size_t kSpentFields = 9;
+constexpr std::size_t kPushedFields = 3;
 constexpr std::size_t kTokenFields = 8;
 
 using Fields = std::vector<std::string>;
@@ -105,6 +107,10 @@ std::string pack(const CodeState& state) {
   return joined(kSpentStart, fields);
 }
 
+std::string pack(const PushedState& state) {
+  return joined(kPushedStart, {std::to_string(state.issued), state.isOpen ? "1" : "0", state.text});
+}
+
 std::string pack(const TokenState& state) {
   return joined(kTokenStart, {std::to_string(state.issued), std::to_string(state.login),
                               std::to_string(state.redeemed), state.family, state.refreshBefore,
@@ -129,6 +135,15 @@ std::optional<CodeState> unpackCode(std::string_view text) {
   return state;
 }
 
+std::optional<PushedState> unpackPushed(std::string_view text) {
+  if (text.substr(0, kStart) != kPushedStart) return {};
+  const std::optional<Fields> fields = split(text.substr(kStart), kPushedFields);
+  if (!fields || ((*fields)[1] != "1" && (*fields)[1] != "0")) return {};
+  const std::optional<long long> issued = numberOf<long long>((*fields)[0]);
+  if (!issued) return {};
+  return PushedState{*issued, (*fields)[1] == "1", (*fields)[2]};
+}
+
 std::optional<TokenState> unpackToken(std::string_view text) {
   if (text.substr(0, kStart) != kTokenStart) return {};
   const std::optional<Fields> fields = split(text.substr(kStart), kTokenFields);
@@ -140,6 +155,10 @@ std::optional<TokenState> unpackToken(std::string_view text) {
   return TokenState{*login,       *redeemed,    *issued,      (*fields)[3],
                     (*fields)[4], (*fields)[5], (*fields)[6], (*fields)[7]};
 }
+
+static_assert(kStart + sizeof("20:") + 20 + sizeof("1:1") + sizeof("2000:") +
+                  kRequestTextBounds.max <=
+              static_cast<std::size_t>(bounds::kState.max));
 
 bool fitsEver(const CodeState& state, const std::string& scope) {
   CodeState spent = state;

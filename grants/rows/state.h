@@ -7,6 +7,8 @@
 //       (S or P; empty without), challenge, caller's text
 //   s1  a code that was spent: the same, then when it was spent, its token's
 //       row and the family's mark
+//   p1  a pushed request: when it was pushed, whether it was opened (1 or 0),
+//       caller's text
 //   t1  a token: when the present pair was issued, when its code was, and was
 //       redeemed, mark of the family, marks of the refresh and access token
 //       before, scope of the login where the row has a narrower one, caller's
@@ -42,6 +44,12 @@ struct CodeState {
   bool evictsNothing = false;
 };
 
+struct PushedState {
+  long long issued;
+  bool isOpen;
+  std::string text;
+};
+
 struct TokenState {
   long long login;
   long long redeemed;
@@ -53,17 +61,20 @@ struct TokenState {
   std::string text;
 };
 
-/// How the text of a spent code begins.
+/// How the text of a spent code and of a pushed request begins.
 inline constexpr char kSpentStart[] = "s1";
+inline constexpr char kPushedStart[] = "p1";
 
 /// An expression of SQL: the time of issue in a text that `pack` wrote.
 std::string issuedTime();
 
 std::string pack(const CodeState& state);
+std::string pack(const PushedState& state);
 std::string pack(const TokenState& state);
 
 /// Nothing for a text that `pack` did not write.
 std::optional<CodeState> unpackCode(std::string_view text);
+std::optional<PushedState> unpackPushed(std::string_view text);
 std::optional<TokenState> unpackToken(std::string_view text);
 
 /// Whether everything that the grant can ever need fits in the column: the

@@ -19,7 +19,8 @@ constexpr char kMissedRow[] = "a row is not as it was read a moment ago";
 constexpr long long kLongest = 100LL * 365 * 24 * 60 * 60;
 
 Policy sane(Policy policy) {
-  for (long long* seconds : {&policy.idle, &policy.family, &policy.grace, &policy.auditPause}) {
+  for (long long* seconds : {&policy.idle, &policy.family, &policy.grace, &policy.pushed,
+                             &policy.pushedOpen, &policy.auditPause}) {
     *seconds = std::clamp(*seconds, 0LL, kLongest);
   }
   return policy;

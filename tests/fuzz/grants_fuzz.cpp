@@ -26,7 +26,9 @@ void tryAsState(const std::string& text) {
   if (code) expect(rows::pack(*code) == text, "a code's state in another form", text);
   const auto token = rows::unpackToken(text);
   if (token) expect(rows::pack(*token) == text, "a token's state in another form", text);
-  expect(!code || !token, "a state of both kinds", text);
+  const auto pushed = rows::unpackPushed(text);
+  if (pushed) expect(rows::pack(*pushed) == text, "a request's state in another form", text);
+  expect((code ? 1 : 0) + (token ? 1 : 0) + (pushed ? 1 : 0) <= 1, "a state of two kinds", text);
 }
 
 /// Whatever is packed comes back.

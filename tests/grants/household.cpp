@@ -22,6 +22,11 @@ CodeRequest withoutPage(CodeRequest request) {
   return request;
 }
 
+CodeRequest forPushed(CodeRequest request, const RequestReference& pushed) {
+  request.pushed = pushed;
+  return request;
+}
+
 ApplicationChange anotherName() {
   ApplicationChange change;
   change.name = ApplicationName("Another name");
@@ -74,6 +79,13 @@ std::vector<Operation> everyChange() {
        }},
       {"IssueWithoutPage",
        [](auto& g, auto& h) { return said(g.codes.issue(withoutPage(requestOf(h)))); }},
+      {"Push",
+       [](auto& g, auto& h) {
+         return said(g.pushed.push({h.frame, RequestText("state='1'")}));
+       }},
+      {"OpenPushed", [](auto& g, auto& h) { return said(g.pushed.open(h.frame, h.pushed)); }},
+      {"IssueForPushed",
+       [](auto& g, auto& h) { return said(g.codes.issue(forPushed(requestOf(h), h.pushed))); }},
       {"RedeemWithoutPage",
        [](auto& g, auto& h) {
          return said(g.codes.redeem({h.frame, h.quietCode, kAddress, kVerifier}));
@@ -152,7 +164,9 @@ void HouseholdTest::SetUp() {
   household_.current = refresh(household_.other, household_.replaced);
   household_.code = issue(household_.frame);
   household_.quietCode = grants().codes.issue(withoutPage(requestOf(household_)))->code;
-  support::Clock::advance(60);
+  support::Clock::advance(59);
+  household_.pushed = grants().pushed.push({household_.frame, RequestText("state='2'")})->reference;
+  support::Clock::advance(1);
   close();
   file_ = readFile(kDatabase);
   for (const char* table : {"oauth_clientInfo", "oauth_grantCode", "oauth_token"}) {

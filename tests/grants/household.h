@@ -16,13 +16,14 @@ namespace grants_test {
 /// What the household's people and applications hold.
 struct Household {
   ApplicationId frame, other;
-  Code code;            // alice's for frame
-  Code spentCode;       // long ago, for `old`
-  Code quietCode;       // alice's for frame, without a page
-  Pair old;             // alice's with frame
-  Pair replaced;        // bob's with other, refreshed since
-  Pair current;         // what took its place
-  AccessHandle handle;  // of `old`
+  Code code;                // alice's for frame
+  Code spentCode;           // long ago, for `old`
+  RequestReference pushed;  // frame's
+  Code quietCode;           // alice's for frame, without a page
+  Pair old;                 // alice's with frame
+  Pair replaced;            // bob's with other, refreshed since
+  Pair current;             // what took its place
+  AccessHandle handle;      // of `old`
 };
 
 struct Operation {

@@ -217,6 +217,7 @@ class AtRestTest : public GrantsTest {
       EXPECT_FALSE(grants().tokens.introspect(application, AnyToken(text))) << text;
       EXPECT_FALSE(grants().tokens.refresh({application, RefreshToken(text)})) << text;
       EXPECT_FALSE(grants().codes.redeem(redemption(application, Code(text)))) << text;
+      EXPECT_FALSE(grants().pushed.open(application, RequestReference(text))) << text;
       EXPECT_FALSE(grants().tokens.revoke(application, AnyToken(text))->wasThere) << text;
       EXPECT_FALSE(grants().applications.authenticate(application, Secret(text))) << text;
     }
@@ -229,7 +230,9 @@ TEST_F(AtRestTest, NoStoredTextIsOfAnyUse) {
   Pair pair = login(frame);
   pair = refresh(frame, pair);
   const Pair own = *grants().tokens.issueToItself({frame});
+  const RequestReference pushed = grants().pushed.push({frame, RequestText("state=1")})->reference;
   expectNothingOpens(frame);
+  EXPECT_TRUE(grants().pushed.open(frame, pushed));
   EXPECT_TRUE(isGood(pair));
   EXPECT_TRUE(isGood(own));
   EXPECT_TRUE(grants().codes.redeem(redemption(frame, code)));
@@ -240,11 +243,13 @@ TEST_F(AtRestTest, NoSecretStandsInTheFile) {
   const Code code = issue(frame.identifier);
   const Pair first = login(frame.identifier);
   const Pair pair = refresh(frame.identifier, first);
+  const RequestReference pushed =
+      grants().pushed.push({frame.identifier, RequestText("state=1")})->reference;
   const std::string file = readFile(kDatabase);
   for (const std::string& text :
        {code.text(), first.access.text(), first.refresh->text(), pair.access.text(),
         pair.refresh->text(), pair.refresh->text().substr(17, 40),
-        pair.refresh->text().substr(57, 40), frame.secret->text()}) {
+        pair.refresh->text().substr(57, 40), frame.secret->text(), pushed.text()}) {
     EXPECT_EQ(file.find(text), std::string::npos);
   }
 }

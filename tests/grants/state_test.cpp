@@ -62,6 +62,22 @@ TEST(StateTest, ASpentCodeComesBackAsItWas) {
   EXPECT_EQ(state->text, kHostile);
 }
 
+TEST(StateTest, APushedRequestComesBackAsItWas) {
+  for (const bool isOpen : {false, true}) {
+    const std::string text = pack(PushedState{1700000000, isOpen, kHostile});
+    const auto state = unpackPushed(text);
+    ASSERT_TRUE(state);
+    EXPECT_EQ(state->issued, 1700000000);
+    EXPECT_EQ(state->isOpen, isOpen);
+    EXPECT_EQ(state->text, kHostile);
+    for (std::size_t i = 0; i < text.size(); ++i) EXPECT_FALSE(unpackPushed(text.substr(0, i)));
+    EXPECT_FALSE(unpackPushed(text + "0:"));
+    EXPECT_FALSE(unpackCode(text) || unpackToken(text));
+  }
+  EXPECT_FALSE(unpackPushed(pack(code())));
+  EXPECT_FALSE(unpackPushed("p11:11:21:x"));
+}
+
 TEST(StateTest, ATokenComesBackAsItWas) {
   const auto state = unpackToken(pack(token()));
   ASSERT_TRUE(state);

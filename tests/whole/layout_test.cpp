@@ -153,16 +153,27 @@ TEST_F(MembersTest, FailedOpenLeavesNeitherConnectionNorReadiness) {
 
 // Headers -----------------------------------------------------------------------
 
-const char* const kPublicHeaders[] = {"core/oauth_db_basic.h",    "core/oauth_errors.h",
-                                      "core/transaction.h",       "stores/oauth_clientInfo.h",
-                                      "stores/oauth_grantCode.h", "stores/oauth_log.h",
-                                      "stores/oauth_token.h",     "utils/oauth_bounds.h",
-                                      "utils/oauth_names.h",      "utils/oauth_utils.h",
-                                      "grants/access.h",          "grants/applications.h",
-                                      "grants/audit.h",           "grants/codes.h",
-                                      "grants/grants.h",          "grants/outcome.h",
-                                      "grants/policy.h",          "grants/room.h",
-                                      "grants/texts.h",           "grants/tokens.h",
+const char* const kPublicHeaders[] = {"core/oauth_db_basic.h",
+                                      "core/oauth_errors.h",
+                                      "core/transaction.h",
+                                      "stores/oauth_clientInfo.h",
+                                      "stores/oauth_grantCode.h",
+                                      "stores/oauth_log.h",
+                                      "stores/oauth_token.h",
+                                      "utils/oauth_bounds.h",
+                                      "utils/oauth_names.h",
+                                      "utils/oauth_utils.h",
+                                      "grants/access.h",
+                                      "grants/applications.h",
+                                      "grants/audit.h",
+                                      "grants/codes.h",
+                                      "grants/grants.h",
+                                      "grants/outcome.h",
+                                      "grants/policy.h",
+                                      "grants/pushed.h",
+                                      "grants/room.h",
+                                      "grants/texts.h",
+                                      "grants/tokens.h",
                                       "grants/trouble.h"};
 
 class HeaderTest : public ::testing::TestWithParam<const char*> {
