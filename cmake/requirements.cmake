@@ -40,12 +40,14 @@ if(KELDOAUTH_SERVICE)
   keldoauth_need(KELDOAUTH_FCGI_FOUND "FastCGI's library" libfcgi-dev
     "for KELDOAUTH_SERVICE; -DKELDOAUTH_SERVICE=OFF does without")
 endif()
-if(KELDOAUTH_TOOLS)
-  find_path(KELDOAUTH_CLI11_INCLUDE_DIR CLI/CLI.hpp)
-  mark_as_advanced(KELDOAUTH_CLI11_INCLUDE_DIR)
-  keldoauth_need(KELDOAUTH_CLI11_INCLUDE_DIR CLI11 libcli11-dev
-    "for KELDOAUTH_TOOLS; -DKELDOAUTH_TOOLS=OFF does without")
-endif()
+foreach(part TOOLS SERVICE)
+  if(KELDOAUTH_${part})
+    find_path(KELDOAUTH_CLI11_INCLUDE_DIR CLI/CLI.hpp)
+    mark_as_advanced(KELDOAUTH_CLI11_INCLUDE_DIR)
+    keldoauth_need(KELDOAUTH_CLI11_INCLUDE_DIR CLI11 libcli11-dev
+      "for KELDOAUTH_${part}; -DKELDOAUTH_${part}=OFF does without")
+  endif()
+endforeach()
 
 if(KELDOAUTH_MISSING)
   message(FATAL_ERROR "keldoauth: these are missing:${KELDOAUTH_MISSING}")

@@ -1,10 +1,12 @@
 // The service as one program. The web server starts it for a request (CGI), or
-// with a socket to wait at as its standard input (FastCGI).
+// with a socket to wait at as its standard input (FastCGI); the owner of the box
+// starts it with a command.
 
 #include <cstdlib>
 
 #include "service/http/gateway_cgi.h"
 #include "service/http/gateway_fcgi.h"
+#include "service/program/commands.h"
 #include "service/program/service.h"
 
 namespace {
@@ -19,9 +21,16 @@ const char* settingsPath() {
   return path == nullptr ? kSettingsFile : path;
 }
 
+/// A web server may hand on words of the query as arguments (RFC 3875, 4.4): they
+/// are no command of anybody's.
+bool isRequest() {
+  return std::getenv("REQUEST_METHOD") != nullptr || std::getenv("GATEWAY_INTERFACE") != nullptr;
+}
+
 }  // namespace
 
-int main() {
+int main(int argc, char** argv) {
+  if (argc > 1 && !isRequest()) return runCommand(argc, argv, settingsPath());
   Service service(settingsPath());
   const Answering answering = [&](const Request& request) { return service.answer(request); };
   return isFastCgi() ? serveFastCgi(answering) : serveCgi(answering);

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "grants/trouble.h"
+#include "service/http/web_address.h"
 
 namespace keldoauth::service {
 namespace {
@@ -22,6 +23,10 @@ constexpr Failure kFull{503, "temporarily_unavailable", "The box is full",
 constexpr Failure kBroken{500, "server_error", "Something is wrong with the box",
                           "Its administrator has to look after it. Nothing was lost."};
 
+constexpr Failure kInTheClear{403, "invalid_request", "Not without TLS",
+                              "What is sent to this service must not be readable on the way: it "
+                              "answers at its https address alone."};
+
 Answer tellBusy(const Route& route, const Settings& settings) {
   return route.tell(settings, kBusy).with("Retry-After", kRetryAfterSeconds);
 }
@@ -33,34 +38,33 @@ Answer tellTrouble(const Route& route, const Settings& settings, const Trouble& 
 
 }  // namespace
 
-Service::Service(std::string settingsPath) : settingsPath_(std::move(settingsPath)) {}
+Service::Service(std::string settingsPath) : settings_(std::move(settingsPath)) {}
 
-Answer Service::answer(const Request& request) {
-  try {
-    if (!settings_) settings_ = readSettings(settingsPath_);
-  } catch (const std::exception& error) {
-    std::cerr << "keldoauth-service: " << error.what() << '\n';
-    const Route* const route = routeOf(request.path, "");
-    return route == nullptr ? failureAsJson(kBroken) : route->tell({}, kBroken);
-  }
-  const Route* const route = routeOf(request.path, settings_->basePath);
+Answer Service::answer(const Request& request) try {
+  const Settings& settings = settings_.current();
+  const Route* const route = routeOf(request.path, settings.basePath);
   if (route == nullptr) return plainAnswer(404);
-  Answer answer = answerBy(*route, request);
+  if (!request.isSecure && !isLoopbackPeer(request.peer)) return route->tell(settings, kInTheClear);
+  Answer answer = answerBy(*route, settings, request);
   store_.drop();
   return answer;
+} catch (const SettingsFault& fault) {
+  for (const std::string& line : fault.faults()) std::cerr << "keldoauth-service: " << line << '\n';
+  const Route* const route = routeOf(request.path, "");
+  return route == nullptr ? failureAsJson(kBroken) : route->tell({}, kBroken);
 }
 
-Answer Service::answerBy(const Route& route, const Request& request) try {
-  Context context{*settings_, store_};
+Answer Service::answerBy(const Route& route, const Settings& settings, const Request& request) try {
+  Context context{settings, store_};
   return route.endpoint(context, request);
 } catch (const Refusal& refusal) {
   return refusal.answer;
 } catch (const Trouble& trouble) {
-  return tellTrouble(route, *settings_, trouble);
+  return tellTrouble(route, settings, trouble);
 } catch (const std::bad_alloc&) {
-  return tellBusy(route, *settings_);
+  return tellBusy(route, settings);
 } catch (const std::exception&) {
-  return route.tell(*settings_, kBroken);
+  return route.tell(settings, kBroken);
 }
 
 }  // namespace keldoauth::service

@@ -39,7 +39,7 @@ def requests_per_second(path, headers):
 
 
 def peak_kilobytes(program, path, headers):
-    environment = {"REQUEST_METHOD": "GET", "SCRIPT_NAME": path,
+    environment = {"REQUEST_METHOD": "GET", "SCRIPT_NAME": path, "REMOTE_ADDR": "127.0.0.1",
                    "KELDOAUTH_SERVICE_SETTINGS": service.RUN + "/settings.json",
                    "HTTP_AUTHORIZATION": headers["Authorization"]}
     program = os.path.join(os.environ["SERVICE_PROGRAMS"], program)
