@@ -4,6 +4,8 @@
 #include <CLI/Formatter.hpp>
 #include <exception>
 #include <iostream>
+#include <string>
+#include <vector>
 
 #include "service/program/commands/command.h"
 
@@ -17,6 +19,13 @@ constexpr struct {
 } kCommands[] = {
     {"check", "Read the settings and say what is wrong with them", declareCheck},
 };
+
+std::string complaint(const CLI::App& app, const CLI::ParseError& error) {
+  const std::vector<std::string> rest = app.remaining(true);
+  if (rest.empty()) return app.get_subcommands().empty() ? "a command is missing" : error.what();
+  const bool isCommand = app.get_subcommands().empty() && rest.front().front() != '-';
+  return (isCommand ? "unknown command '" : "unexpected argument '") + rest.front() + "'";
+}
 
 int obey(int argc, const char* const* argv, std::string settingsPath) {
   CLI::App app("The authorisation service. The web server starts it without a command.",
@@ -34,7 +43,13 @@ int obey(int argc, const char* const* argv, std::string settingsPath) {
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
-    return app.exit(error, std::cout, std::cerr) == 0 ? kDone : kWrongUsage;
+    if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
+      app.exit(error, std::cout, std::cerr);  // asked-for help
+      return kDone;
+    }
+    std::cerr << "keldoauth-service: " << complaint(app, error)
+              << "\nkeldoauth-service --help says what is possible\n";
+    return kWrongUsage;
   }
   return chosen(settingsPath);
 }

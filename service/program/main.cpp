@@ -30,8 +30,9 @@ bool isRequest() {
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc > 1 && !isRequest()) return runCommand(argc, argv, settingsPath());
+  const bool isServer = isFastCgi();
+  if (!isRequest() && (argc > 1 || !isServer)) return runCommand(argc, argv, settingsPath());
   Service service(settingsPath());
   const Answering answering = [&](const Request& request) { return service.answer(request); };
-  return isFastCgi() ? serveFastCgi(answering) : serveCgi(answering);
+  return isServer ? serveFastCgi(answering) : serveCgi(answering);
 }
