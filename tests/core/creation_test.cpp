@@ -1,6 +1,7 @@
 // The database file that the library creates: whose it is, what it leaves alone,
 // and what it never creates.
 
+#include <endian.h>
 #include <fcntl.h>
 #include <linux/posix_acl_xattr.h>
 #include <sqlite3.h>
@@ -141,7 +142,8 @@ TEST_F(CreationTest, JournalTakesTheModeOfAnExistingFile) {
 
 // Default ACL of the folder -------------------------------------------------------
 
-/// As the kernel has it: owner, one named user, group, mask, others.
+/// As the kernel has it, in the same order of bytes on every machine: owner, one
+/// named user, group, mask, others.
 struct DefaultAcl {
   const char* name;
   __u16 owner;
@@ -159,12 +161,11 @@ class DefaultAclTest : public CreationTest, public ::testing::WithParamInterface
     const struct {
       posix_acl_xattr_header header;
       std::array<posix_acl_xattr_entry, 5> entries;
-    } acl{{POSIX_ACL_XATTR_VERSION},
-          {{{1, GetParam().owner, ~0U},  // ACL_USER_OBJ and so on, in their order
-            {2, 7, geteuid()},           // one that a namespace of one user knows, too
-            {4, GetParam().others, ~0U},
-            {16, 7, ~0U},
-            {32, GetParam().others, ~0U}}}};
+    } acl{
+        {htole32(POSIX_ACL_XATTR_VERSION)},
+        {{entry(1, GetParam().owner, ~0U),  // ACL_USER_OBJ and so on, in their order
+          entry(2, 7, geteuid()),           // one that a namespace of one user knows, too
+          entry(4, GetParam().others, ~0U), entry(16, 7, ~0U), entry(32, GetParam().others, ~0U)}}};
     constexpr std::size_t kSize = sizeof acl.header + sizeof acl.entries;
     static_assert(sizeof acl == kSize);
     ASSERT_EQ(setxattr(kStateDir, "system.posix_acl_default", &acl, kSize, 0), 0) << errno;
@@ -172,6 +173,11 @@ class DefaultAclTest : public CreationTest, public ::testing::WithParamInterface
   void TearDown() override {
     removexattr(kStateDir, "system.posix_acl_default");
     CreationTest::TearDown();
+  }
+
+ private:
+  static posix_acl_xattr_entry entry(__u16 tag, __u16 permissions, __u32 id) {
+    return {htole16(tag), htole16(permissions), htole32(id)};
   }
 };
 
