@@ -51,6 +51,15 @@ configure() {
     -DKELDOAUTH_PLATFORM=standin "$@"
 }
 
+# What scripts/cross builds for, the target first.
+# shellcheck disable=SC2034
+cross_architectures=(armhf arm64 armel i386 s390x)
+
+# configure_cross ARCHITECTURE FOLDER OPTION...: the same for another processor.
+configure_cross() {
+  configure "$2" "-DCMAKE_TOOLCHAIN_FILE=$project/cmake/cross/$1.cmake" "${@:3}"
+}
+
 # build FOLDER [TARGET...]: on a terminal ninja counts its steps in one line.
 build() {
   local folder=$1 loudness=quietly

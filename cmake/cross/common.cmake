@@ -1,0 +1,32 @@
+# Cross-building against the sysroot that scripts/cross-sysroot makes. The file of
+# an architecture beside this one says first:
+#   KELDOAUTH_ARCHITECTURE   Debian's name of it
+#   CMAKE_SYSTEM_PROCESSOR   the kernel's
+#   KELDOAUTH_TRIPLE         what its compilers' names begin with
+#   CMAKE_LIBRARY_ARCHITECTURE, where Debian's folders have another name
+set(CMAKE_SYSTEM_NAME Linux)
+if(NOT DEFINED CMAKE_LIBRARY_ARCHITECTURE)
+  set(CMAKE_LIBRARY_ARCHITECTURE ${KELDOAUTH_TRIPLE})
+endif()
+
+set(CMAKE_C_COMPILER ${KELDOAUTH_TRIPLE}-gcc)
+set(CMAKE_CXX_COMPILER ${KELDOAUTH_TRIPLE}-g++)
+
+set(KELDOAUTH_SYSROOT ${CMAKE_CURRENT_LIST_DIR}/../../build-${KELDOAUTH_ARCHITECTURE}-sysroot
+  CACHE PATH "sysroot for ${KELDOAUTH_ARCHITECTURE}")
+list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES KELDOAUTH_SYSROOT)
+get_filename_component(CMAKE_SYSROOT ${KELDOAUTH_SYSROOT} ABSOLUTE)
+set(CMAKE_FIND_ROOT_PATH ${CMAKE_SYSROOT})
+set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)
+set(CMAKE_FIND_ROOT_PATH_MODE_LIBRARY ONLY)
+set(CMAKE_FIND_ROOT_PATH_MODE_INCLUDE ONLY)
+set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY)
+
+set(ENV{PKG_CONFIG_DIR} "")
+set(ENV{PKG_CONFIG_LIBDIR}
+  ${CMAKE_SYSROOT}/usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}/pkgconfig:${CMAKE_SYSROOT}/usr/share/pkgconfig)
+set(ENV{PKG_CONFIG_SYSROOT_DIR} ${CMAKE_SYSROOT})
+
+# One word, so that tests can hand it on.
+get_filename_component(CMAKE_CROSSCOMPILING_EMULATOR
+  ${CMAKE_CURRENT_LIST_DIR}/../../scripts/cross-run ABSOLUTE)
