@@ -1,0 +1,1 @@
+# Its rules are those of package.mk beside it.
