@@ -110,6 +110,7 @@ bool OAUTHDBBasic::Fail(const OAUTHError& error) {
 bool OAUTHDBBasic::FailUnexpectedly(const char* source, int line) noexcept {
   try {
     try {
+      // cppcheck-suppress rethrowNoCurrentException ; called in handlers alone
       throw;
     } catch (const Json::LogicError&) {
       return Fail(errors::kBadParameters);

@@ -54,6 +54,7 @@ bool removeAll(OAUTHDBBasic& store, const std::vector<long long>& ids, Remove re
   bool done = true;
   for (const long long id : ids) {
     if (!remove(id)) done = false;
+    // cppcheck-suppress incorrectLogicOperator ; remove(id) can lose it
     if (together && !store.InTransaction()) return false;
   }
   return (!transaction.IsOpen() || transaction.Commit()) && done;
