@@ -10,6 +10,7 @@
 #include "grants/rows/quotes.h"
 #include "grants/rows/read_rows.h"
 #include "grants/rows/room_rules.h"
+#include "grants/rows/slices.h"
 #include "grants/rows/store.h"
 #include "utils/clock.h"
 #include "utils/oauth_names.h"
@@ -36,20 +37,9 @@ std::string markOf(const TokenRow& token) {
   return rows::hexDigest(hasFamily ? token.state->family : token.storedAccess);
 }
 
-using Names = std::map<std::string, ApplicationName>;
-
-Names namesIn(Store& store) {
-  Names names;
-  for (const Json::Value& row : Store::rowsWhere(store.applications, "")) {
-    Application application = rows::applicationOf(row).shown;
-    names.emplace(application.identifier.text(), std::move(application.name));
-  }
-  return names;
-}
-
-std::optional<ApplicationName> nameOf(const Names& names, const std::string& application) {
-  const auto found = names.find(application);
-  return found == names.end() ? std::nullopt : std::optional<ApplicationName>(found->second);
+std::optional<ApplicationName> nameOf(Store& store, const std::string& application) {
+  auto found = rows::findApplication(store, application);
+  return found ? std::optional<ApplicationName>(std::move(found->shown.name)) : std::nullopt;
 }
 
 bool isLive(const CodeRow& code, long long now) {
@@ -63,14 +53,14 @@ bool isLive(const TokenRow& token, const Policy& policy, long long now) {
 // Member by member: of an aggregate with another one written out in it, GCC 12
 // destroys the inner members twice when memory runs out behind them.
 
-AccessEntry entryOf(const CodeRow& code, const Names& names, long long now) {
+AccessEntry entryOf(const CodeRow& code, std::optional<ApplicationName> name, long long now) {
   const bool isOurs = code.isOurs();
   AccessEntry entry{};
   entry.handle = {AccessHandle::Table::kCodes, code.row, markOf(code)};
   entry.kind = code.isSpent() ? AccessEntry::Kind::kSpent : AccessEntry::Kind::kCode;
   entry.user = User(code.user);
   entry.application = ApplicationId(code.application);
-  entry.applicationName = nameOf(names, code.application);
+  entry.applicationName = std::move(name);
   entry.scope = Scope(code.scope);
   entry.since = entry.renewed = isOurs ? code.state->issued : 0;
   entry.expires = entry.ends = code.expires;
@@ -82,15 +72,15 @@ AccessEntry entryOf(const CodeRow& code, const Names& names, long long now) {
   return entry;
 }
 
-AccessEntry entryOf(const TokenRow& token, const Names& names, const Policy& policy,
-                    long long now) {
+AccessEntry entryOf(const TokenRow& token, std::optional<ApplicationName> name,
+                    const Policy& policy, long long now) {
   const bool isOurs = token.isOurs();
   AccessEntry entry{};
   entry.handle = {AccessHandle::Table::kTokens, token.row, markOf(token)};
   entry.kind = token.isOwn() ? AccessEntry::Kind::kOwn : AccessEntry::Kind::kLogin;
   if (!token.isOwn()) entry.user = User(token.user);
   entry.application = ApplicationId(token.application);
-  entry.applicationName = nameOf(names, token.application);
+  entry.applicationName = std::move(name);
   entry.scope = Scope(token.loginScope());
   entry.since = isOurs ? token.state->login : 0;
   entry.renewed = isOurs ? token.state->issued : 0;
@@ -142,6 +132,73 @@ bool canBe(const std::optional<User>& user, const std::optional<ApplicationId>& 
   return (!user || !rows::hasNul(user->text())) &&
          (!application || rows::isWithin(application->text(), bounds::kIdentifier)) &&
          (!application || !rows::hasNul(application->text()));
+}
+
+// Lists -------------------------------------------------------------------------
+
+bool canBe(const AccessFilter& filter) {
+  return canBe(filter.user, filter.application) && !rows::hasNul(filter.contains);
+}
+
+/// The name of the application whose row of `table` it is.
+std::string nameIn(const std::string& identifier) {
+  return "(SELECT display_name FROM " + std::string(names::kClientInfoTable) +
+         " AS its WHERE its.client_id=" + identifier + ")";
+}
+
+Conditions conditionsOf(const AccessFilter& filter, const Policy& policy, long long now) {
+  Conditions conditions = conditionsOf(filter.user, filter.application);
+  if (!filter.withDead) {
+    conditions.codes += " AND NOT " + rows::isDeadCode(now);
+    conditions.tokens +=
+        " AND NOT " + rows::isDeadToken(policy, now) + " AND NOT " + rows::isOverLogin(policy, now);
+  }
+  if (!filter.withSpent) conditions.codes += " AND NOT " + rows::isSpentCode();
+  if (!filter.contains.empty()) {
+    const std::string isTheUsers = rows::contains(names::kUsername, filter.contains);
+    const auto isIts = [&filter](const char* table) {
+      return rows::contains(nameIn(std::string(table) + "." + names::kClientId), filter.contains);
+    };
+    conditions.codes +=
+        " AND (" + isTheUsers + " OR IFNULL(" + isIts(names::kGrantCodeTable) + ",0))";
+    conditions.tokens += " AND (NOT " + rows::isOwnToken() + " AND " + isTheUsers + " OR IFNULL(" +
+                         isIts(names::kTokenTable) + ",0))";
+  }
+  return conditions;
+}
+
+/// Codes first: of them "access_token" holds the code.
+rows::List listOf(const AccessFilter& filter, const Policy& policy, long long now) {
+  const Conditions conditions = conditionsOf(filter, policy, now);
+  const std::string ofCodes =
+      " FROM " + std::string(names::kGrantCodeTable) + " WHERE " + conditions.codes;
+  const std::string ofTokens =
+      " FROM " + std::string(names::kTokenTable) + " WHERE " + conditions.tokens;
+  const std::string shared =
+      ",id,username," + rows::sealedIdentifier() + ",scope,expired_time,state,ip,";
+  return {"SELECT 0 AS is_token" + shared +
+              "code AS access_token,'' AS refresh_token,'' AS flow_type" + ofCodes +
+              " UNION ALL SELECT 1" + shared + "access_token,refresh_token,flow_type" + ofTokens,
+          "is_token,id", "(SELECT COUNT(*)" + ofCodes + ")+(SELECT COUNT(*)" + ofTokens + ")",
+          "," + nameIn(std::string("part.") + rows::kSealedIdentifier) + " AS display_name"};
+}
+
+AccessEntry entryOf(Json::Value row, const Policy& policy, long long now) {
+  const std::string stored = row[names::kDisplayName].asString();
+  std::optional<ApplicationName> name;
+  if (!stored.empty()) name = ApplicationName(rows::undoubled(stored));
+  if (row["is_token"].asString() == "1") {
+    return entryOf(rows::tokenOf(row), std::move(name), policy, now);
+  }
+  row[names::kCode] = row[names::kAccessToken];
+  return entryOf(rows::codeOf(row), std::move(name), now);
+}
+
+std::vector<AccessEntry> entriesOf(const Store& store, const rows::Part& part, long long now) {
+  std::vector<AccessEntry> entries;
+  entries.reserve(part.rows.size());
+  for (const Json::Value& row : part.rows) entries.push_back(entryOf(row, store.policy, now));
+  return entries;
 }
 
 // Ending ------------------------------------------------------------------------
@@ -224,35 +281,28 @@ void endToken(Store& store, const AccessHandle& handle, long long now, Ended& en
 }  // namespace
 
 std::vector<AccessEntry> Access::list(const AccessFilter& filter) const {
-  if (!canBe(filter.user, filter.application)) return {};
+  if (!canBe(filter)) return {};
   const long long now = currentTime();
-  const Conditions conditions = conditionsOf(filter.user, filter.application);
-  const Names names = namesIn(store_);
-  std::vector<AccessEntry> entries;
-  const auto add = [&](AccessEntry entry) {
-    if (entry.isDead && !filter.withDead) return;
-    if (entry.kind == AccessEntry::Kind::kSpent && !filter.withSpent) return;
-    entries.push_back(std::move(entry));
-  };
-  for (const Json::Value& row : Store::rowsWhere(store_.codes, conditions.codes)) {
-    add(entryOf(rows::codeOf(row), names, now));
-  }
-  for (const Json::Value& row : Store::rowsWhere(store_.tokens, conditions.tokens)) {
-    add(entryOf(rows::tokenOf(row), names, store_.policy, now));
-  }
-  return entries;
+  return entriesOf(store_, rows::wholeOf(store_, listOf(filter, store_.policy, now)), now);
+}
+
+Sliced<AccessEntry> Access::page(const AccessFilter& filter, const Slice& slice) const {
+  if (!canBe(filter)) return {{}, 0};
+  const long long now = currentTime();
+  const rows::Part part = rows::partOf(store_, listOf(filter, store_.policy, now), slice);
+  return {entriesOf(store_, part, now), part.length};
 }
 
 std::optional<AccessEntry> Access::find(const Code& code) const {
   const auto found = rows::findShownCode(store_, code.text());
   if (!found) return {};
-  return entryOf(*found, namesIn(store_), currentTime());
+  return entryOf(*found, nameOf(store_, found->application), currentTime());
 }
 
 std::optional<AccessEntry> Access::find(const AnyToken& token) const {
   const auto found = rows::findShownToken(store_, token.text());
   if (!found) return {};
-  return entryOf(*found, namesIn(store_), store_.policy, currentTime());
+  return entryOf(*found, nameOf(store_, found->application), store_.policy, currentTime());
 }
 
 bool Access::hasLogin(const User& user, const ApplicationId& application,

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "grants/outcome.h"
+#include "grants/slice.h"
 #include "grants/texts.h"
 
 namespace KELDOAUTHSERVER::grants {
@@ -39,9 +40,11 @@ struct AccessEntry {
   std::optional<ApplicationName> applicationName;
   Scope scope;        // of the login
   long long since;    // Unix seconds: of the login; 0 when not known
-  long long renewed;  // when the present tokens were issued; 0 likewise
+  long long renewed;  // when the present tokens were issued, as near as the
+                      // file comes to "last used"; 0 likewise
   long long expires;  // of the access token or the code
-  long long ends;     // when it is dead if nobody uses it
+  long long ends;     // when it is dead if nobody uses it: until then a login
+                      // can be refreshed
   PeerAddress from;   // of the last request that renewed it
   std::string flow;   // "authorization_code", "client_credentials"; empty for a code
   CallerText text;    // of other programs' rows: their state
@@ -56,6 +59,10 @@ struct AccessFilter {
   std::optional<ApplicationId> application = {};
   bool withDead = false;   // also what is dead
   bool withSpent = false;  // also codes that were redeemed
+  /// A part of the user's or the application's name, upper and lower case of
+  /// ASCII taken for the same. Of a name with quotes that another program's Edit
+  /// stored as given, what stands before or behind them.
+  std::string contains = {};
 };
 
 /// Which of the two an operation is about. Codes alone are those that were not
@@ -74,8 +81,11 @@ class Access {
   explicit Access(Store& store) : store_(store) {}
 
   /// In the order of the rows, codes first. A filter with a user leaves out
-  /// what applications have for themselves.
+  /// what applications have for themselves. All of it at one moment.
   [[nodiscard]] std::vector<AccessEntry> list(const AccessFilter& filter) const;
+
+  /// A part of the same.
+  [[nodiscard]] Sliced<AccessEntry> page(const AccessFilter& filter, const Slice& slice = {}) const;
 
   /// The entry that a code or token belongs to, dead or not.
   [[nodiscard]] std::optional<AccessEntry> find(const Code& code) const;

@@ -11,6 +11,7 @@
 #include "grants/rows/read_rows.h"
 #include "grants/rows/registry_words.h"
 #include "grants/rows/room_rules.h"
+#include "grants/rows/slices.h"
 #include "grants/rows/store.h"
 #include "utils/clock.h"
 #include "utils/oauth_names.h"
@@ -193,6 +194,22 @@ std::vector<Application> Applications::named(const ApplicationName& name) const 
 
 std::vector<Application> Applications::all() const {
   return shown(Store::rowsWhere(store_.applications, ""));
+}
+
+Sliced<Application> Applications::page(const std::string& contains, const Slice& slice) const {
+  if (rows::hasNul(contains)) return {{}, 0};
+  std::string condition = rows::contains(names::kDisplayName, contains);
+  if (rows::isWithin(contains, bounds::kIdentifier)) {
+    condition += " OR " + rows::isOneOf(names::kClientId, {Store::sealed(contains)});
+  }
+  const std::string found = " FROM " + std::string(names::kClientInfoTable) + " WHERE " + condition;
+  const rows::Part part =
+      rows::partOf(store_,
+                   {"SELECT id,enable," + rows::sealedIdentifier() + "," + rows::sealedSecret() +
+                        ",redirect_uri,scope,display_name,lower(display_name) AS sorted" + found,
+                    "sorted,id", "(SELECT COUNT(*)" + found + ")", ""},
+                   slice);
+  return {shown(part.rows), part.length};
 }
 
 Outcome<Application> Applications::authenticate(const ApplicationId& identifier,

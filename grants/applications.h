@@ -7,9 +7,11 @@
 #define KELDOAUTH_GRANTS_APPLICATIONS_H
 
 #include <optional>
+#include <string>
 #include <vector>
 
 #include "grants/outcome.h"
+#include "grants/slice.h"
 #include "grants/texts.h"
 
 namespace KELDOAUTHSERVER::grants {
@@ -100,6 +102,12 @@ class Applications {
   /// in which they registered, as are all.
   std::vector<Application> named(const ApplicationName& name) const;
   std::vector<Application> all() const;
+
+  /// A part of those with `contains` in their names, upper and lower case of
+  /// ASCII taken for the same, or whose whole identifier it is; of all when it
+  /// is empty. In the order of their names, and of registration among equal
+  /// ones.
+  Sliced<Application> page(const std::string& contains, const Slice& slice = {}) const;
 
   /// The enabled application that has shown this secret, compared in constant
   /// time; without a secret, an enabled public one. Refusals: kInvalidClient.

@@ -200,6 +200,13 @@ std::string isDeadToken(const Policy& policy, long long now, long long grace) {
          " THEN 0 ELSE " + std::to_string(policy.idle) + " END)";
 }
 
+std::string isOverLogin(const Policy& policy, long long now) {
+  return "(NOT " + isOwnToken() + " AND " + expiry() + "<" + std::to_string(now) + " AND " +
+         beginsWith(names::kState, kTokenStart) + " AND " +
+         beginsWith(names::kAccessToken, kMarkStart) + " AND " + loginTime() + "<" +
+         std::to_string(now - policy.family) + ")";
+}
+
 std::string isOwnToken() {
   return isOneOf(names::kFlowType, {kOwnFlow});
 }

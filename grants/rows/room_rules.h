@@ -23,6 +23,10 @@ std::string isPushedRequest();
 /// be refreshed for the policy's idle time after it.
 std::string isDeadToken(const Policy& policy, long long now, long long grace = 0);
 
+/// Of a login whose access token expired: its year is over, and nobody can
+/// refresh it, though it is not dead by its expiry yet.
+std::string isOverLogin(const Policy& policy, long long now);
+
 /// Of an application that acts for itself.
 std::string isOwnToken();
 

@@ -13,7 +13,6 @@ namespace KELDOAUTHSERVER::grants::rows {
 namespace {
 
 constexpr char kCodeStart[] = "c1";
-constexpr char kTokenStart[] = "t1";
 constexpr std::size_t kStart = 2;
 constexpr std::size_t kCodeFields = 6;
 constexpr std::size_t kSpentFields = 9;
@@ -77,6 +76,21 @@ bool isInColumn(const std::string& text) {
   return text.size() <= static_cast<std::size_t>(bounds::kState.max);
 }
 
+// Expressions of SQL about fields, one after the other.
+
+std::string fieldsOfState() {
+  return "substr(" + std::string(names::kState) + "," + std::to_string(kStart + 1) + ")";
+}
+
+std::string numberIn(const std::string& fields) {
+  return "CAST(substr(" + fields + ",instr(" + fields + ",':')+1,CAST(" + fields +
+         " AS INTEGER)) AS INTEGER)";
+}
+
+std::string behindFirst(const std::string& fields) {
+  return "substr(" + fields + ",instr(" + fields + ",':')+1+CAST(" + fields + " AS INTEGER))";
+}
+
 /// A number with as many digits as there can be.
 constexpr long long kLongest = std::numeric_limits<long long>::min();
 
@@ -88,9 +102,11 @@ std::string anyMark() {
 }  // namespace
 
 std::string issuedTime() {
-  const std::string state = names::kState;
-  return "CAST(substr(" + state + ",instr(" + state + ",':')+1,CAST(substr(" + state + "," +
-         std::to_string(kStart + 1) + ") AS INTEGER)) AS INTEGER)";
+  return numberIn(fieldsOfState());
+}
+
+std::string loginTime() {
+  return numberIn(behindFirst(fieldsOfState()));
 }
 
 std::string pack(const CodeState& state) {

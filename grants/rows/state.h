@@ -14,7 +14,7 @@
 //       before, scope of the login where the row has a narrower one, caller's
 //       text
 //
-// The time of issue goes first, where a statement finds it.
+// The times of issue and login go first, where a statement finds them.
 //
 // Nothing else in the library or above it reads or writes these texts.
 
@@ -61,12 +61,15 @@ struct TokenState {
   std::string text;
 };
 
-/// How the text of a spent code and of a pushed request begins.
+/// How the text of a spent code, of a pushed request and of a token begins.
 inline constexpr char kSpentStart[] = "s1";
 inline constexpr char kPushedStart[] = "p1";
+inline constexpr char kTokenStart[] = "t1";
 
-/// An expression of SQL: the time of issue in a text that `pack` wrote.
+// Expressions of SQL: the time of issue in a text that `pack` wrote, and the
+// login's in a token's.
 std::string issuedTime();
+std::string loginTime();
 
 std::string pack(const CodeState& state);
 std::string pack(const PushedState& state);

@@ -92,6 +92,15 @@ Json::Value Store::rowsWhere(OAUTHDBBasic& table, const std::string& condition,
   return select(table, std::move(request));
 }
 
+Json::Value Store::rowsOf(const std::string& select) {
+  clearError(applications);
+  Json::Value rows(Json::arrayValue);
+  if (applications.DBCmd(select, OAUTHDBBasic::TabGetCallback, &rows) == 0) {
+    throw troubleOf(applications);
+  }
+  return rows;
+}
+
 std::vector<long long> Store::numbers(const std::string& select) {
   clearError(applications);
   Json::Value columns(Json::arrayValue);

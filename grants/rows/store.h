@@ -43,6 +43,9 @@ class Store {
   static Json::Value rowsWhere(OAUTHDBBasic& table, const std::string& condition,
                                const std::string& tail = "");
 
+  /// What a SELECT of one's own gives, with its columns' names.
+  Json::Value rowsOf(const std::string& select);
+
   /// The columns of the one row that `select` gives, as numbers.
   std::vector<long long> numbers(const std::string& select);
 

@@ -45,6 +45,10 @@ template <typename Value>
 std::string said(const std::vector<Value>& list) {
   return std::to_string(list.size());
 }
+template <typename Value>
+std::string said(const Sliced<Value>& sliced) {
+  return said(sliced.items) + " of " + std::to_string(sliced.total);
+}
 std::string said(const Ended& ended) {
   return std::to_string(ended.codes) + " " + std::to_string(ended.tokens);
 }
@@ -144,6 +148,14 @@ std::vector<Operation> everyLookUp() {
       {"HasLogin",
        [](auto& g, auto& h) { return said(g.access.hasLogin(kAlice, h.frame, kScope)); }},
       {"List", [](auto& g, auto&) { return said(g.access.list({})); }},
+      {"AccessPage",
+       [](auto& g, auto&) {
+         return said(g.access.page({}, {2, 1}));
+       }},
+      {"ApplicationsPage",
+       [](auto& g, auto&) {
+         return said(g.applications.page("o", {1, 1}));
+       }},
       {"Count", [](auto& g, auto&) { return said(g.room.count().tokens.rows); }},
   };
 }

@@ -172,6 +172,7 @@ const char* const kPublicHeaders[] = {"core/oauth_db_basic.h",
                                       "grants/policy.h",
                                       "grants/pushed.h",
                                       "grants/room.h",
+                                      "grants/slice.h",
                                       "grants/texts.h",
                                       "grants/tokens.h",
                                       "grants/trouble.h"};
