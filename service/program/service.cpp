@@ -36,6 +36,15 @@ Answer tellTrouble(const Route& route, const Settings& settings, const Trouble& 
   return route.tell(settings, trouble.kind() == Trouble::Kind::kFull ? kFull : kBroken);
 }
 
+Answer attempt(const Route& route, const Settings& settings, KeptStore& store,
+               const Request& request) try {
+  store.startRequest();
+  Context context{settings, store};
+  return route.endpoint(context, request);
+} catch (const Refusal& refusal) {
+  return refusal.answer;
+}
+
 }  // namespace
 
 Service::Service(std::string settingsPath) : settings_(std::move(settingsPath)) {}
@@ -45,25 +54,31 @@ Answer Service::answer(const Request& request) try {
   const Route* const route = routeOf(request.path, settings.basePath);
   if (route == nullptr) return plainAnswer(404);
   if (!request.isSecure && !isLoopbackPeer(request.peer)) return route->tell(settings, kInTheClear);
-  Answer answer = answerBy(*route, settings, request);
-  store_.drop();
-  return answer;
+  return answerBy(*route, settings, store_, request);
 } catch (const SettingsFault& fault) {
   for (const std::string& line : fault.faults()) std::cerr << "keldoauth-service: " << line << '\n';
   const Route* const route = routeOf(request.path, "");
   return route == nullptr ? failureAsJson(kBroken) : route->tell({}, kBroken);
 }
 
-Answer Service::answerBy(const Route& route, const Settings& settings, const Request& request) try {
-  Context context{settings, store_};
-  return route.endpoint(context, request);
-} catch (const Refusal& refusal) {
-  return refusal.answer;
+Answer answerBy(const Route& route, const Settings& settings, KeptStore& store,
+                const Request& request) try {
+  try {
+    Answer answer = attempt(route, settings, store, request);
+    if (!store.wasReplaced()) return answer;
+  } catch (const Trouble&) {
+    if (!store.wasReplaced()) throw;
+  }
+  store.drop();
+  return attempt(route, settings, store, request);
 } catch (const Trouble& trouble) {
+  store.drop();
   return tellTrouble(route, settings, trouble);
 } catch (const std::bad_alloc&) {
+  store.drop();
   return tellBusy(route, settings);
 } catch (const std::exception&) {
+  store.drop();
   return route.tell(settings, kBroken);
 }
 

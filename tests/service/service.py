@@ -59,6 +59,13 @@ class Killed(Exception):
 
 
 _moment = {}
+_carrier = None
+
+
+def carry(carrier):
+    """Requests from now on go to this function; None: to the web server."""
+    global _carrier
+    _carrier = carrier
 
 
 @contextlib.contextmanager
@@ -82,21 +89,27 @@ def killed_at(step):
     return moment(SERVICE_KILL_AT=str(step))
 
 
-def run(method, path, body, headers):
-    """One request to the program, as the web server starts it for CGI."""
+def variables(method, path, body, headers):
+    """What a web server says of a request (RFC 3875)."""
     path, _, query = path.partition("?")
-    body = body.encode() if isinstance(body, str) else body or b""
     authorization = headers.get("Authorization", "")
-    environment = {**_moment, "KELDOAUTH_SERVICE_SETTINGS": RUN + "/settings.json",
-                   "GATEWAY_INTERFACE": "CGI/1.1", "SCRIPT_NAME": path, "QUERY_STRING": query,
-                   "REQUEST_METHOD": method, "CONTENT_LENGTH": str(len(body)),
-                   "CONTENT_TYPE": headers.get("Content-Type", ""), "REMOTE_ADDR": "127.0.0.1",
-                   "HTTP_AUTHORIZATION": authorization,
-                   # Of a program under a sanitizer: steps.cpp is loaded before it.
-                   "ASAN_OPTIONS": "verify_asan_link_order=0"}
+    said = {"GATEWAY_INTERFACE": "CGI/1.1", "SCRIPT_NAME": path, "QUERY_STRING": query,
+            "REQUEST_METHOD": method, "CONTENT_LENGTH": str(len(body)),
+            "CONTENT_TYPE": headers.get("Content-Type", ""), "REMOTE_ADDR": "127.0.0.1",
+            "HTTP_AUTHORIZATION": authorization}
     if path in ("/oauth/authorize", "/admin"):
         login = base64.b64decode(authorization.partition(" ")[2]).decode()
-        environment["REMOTE_USER"] = login.partition(":")[0]
+        said["REMOTE_USER"] = login.partition(":")[0]
+    return said
+
+
+def run(method, path, body, headers):
+    """One request to the program, as the web server starts it for CGI."""
+    body = body.encode() if isinstance(body, str) else body or b""
+    environment = {**_moment, "KELDOAUTH_SERVICE_SETTINGS": RUN + "/settings.json",
+                   **variables(method, path, body, headers),
+                   # Of a program under a sanitizer: steps.cpp is loaded before it.
+                   "ASAN_OPTIONS": "verify_asan_link_order=0"}
     runner = [os.environ["SERVICE_RUNNER"]] if os.environ.get("SERVICE_RUNNER") else []
     program = os.path.join(os.environ["SERVICE_PROGRAMS"], "keldoauth-service")
     done = subprocess.run([*runner, program], env=environment, input=body, check=False,
@@ -113,6 +126,8 @@ def send(method, path, body=None, headers=None):
     """One request on a connection of its own; redirects are not followed."""
     if _moment:
         return run(method, path, body, headers or {})
+    if _carrier:
+        return _carrier(method, path, body, headers or {})
     where = urllib.parse.urlsplit(ISSUER)
     connection = http.client.HTTPConnection(where.hostname, where.port, timeout=60)
     try:

@@ -80,7 +80,8 @@ Request withBearer(const std::string& token, Request request) {
 Json::Value json(const Answer& answer) {
   Json::Value document;
   std::istringstream text(answer.body);
-  EXPECT_TRUE(Json::parseFromStream(Json::CharReaderBuilder(), text, &document, nullptr)) << answer.body;
+  EXPECT_TRUE(Json::parseFromStream(Json::CharReaderBuilder(), text, &document, nullptr))
+      << answer.body;
   return document;
 }
 

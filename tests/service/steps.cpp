@@ -4,6 +4,9 @@
 //   SERVICE_LATER=N     its clock is N seconds ahead
 //   SERVICE_KILL_AT=N   it is killed right before the N-th change that it makes
 //                       to any file; 1 is the first
+//   SERVICE_REPLACE_AT=N, SERVICE_REPLACE_BY=PATH, SERVICE_REPLACED=PATH
+//                       right before that change, the one file takes the name
+//                       of the other
 //
 // The functions are named by their symbols: the system's headers give some of
 // them other ones on some platforms.
@@ -12,6 +15,7 @@
 
 #include <csignal>
 #include <cstddef>
+#include <cstdio>
 #include <cstdlib>
 #include <ctime>
 
@@ -31,7 +35,11 @@ Function* next(const char* name) {
 
 void step() {
   static long long left = numberOf("SERVICE_KILL_AT");
+  static long long leftToReplace = numberOf("SERVICE_REPLACE_AT");
   if (left > 0 && --left == 0) std::raise(SIGKILL);
+  if (leftToReplace > 0 && --leftToReplace == 0) {
+    std::rename(std::getenv("SERVICE_REPLACE_BY"), std::getenv("SERVICE_REPLACED"));
+  }
 }
 
 }  // namespace
