@@ -69,6 +69,14 @@ std::string Parameters::value(std::string_view name) const {
   return {};
 }
 
+std::vector<std::string> Parameters::values(std::string_view name) const {
+  std::vector<std::string> values;
+  for (const auto& [key, value] : pairs_) {
+    if (key == name && !value.empty()) values.push_back(value);
+  }
+  return values;
+}
+
 bool Parameters::isDoubled(std::string_view name) const {
   return std::count_if(pairs_.begin(), pairs_.end(),
                        [&](const auto& pair) { return pair.first == name; }) > 1;

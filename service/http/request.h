@@ -29,6 +29,9 @@ class Parameters {
   [[nodiscard]] std::string value(std::string_view name) const;
   [[nodiscard]] bool has(std::string_view name) const { return !value(name).empty(); }
 
+  /// Of a parameter that may occur several times; without those that are empty.
+  [[nodiscard]] std::vector<std::string> values(std::string_view name) const;
+
   [[nodiscard]] bool isDoubled(std::string_view name) const;
   [[nodiscard]] bool isAnyDoubled(std::initializer_list<std::string_view> names) const;
 

@@ -32,7 +32,7 @@ std::string faultOf(const Draft& draft) {
   std::string fault = faultOfName(draft.name);
   if (!fault.empty()) return fault;
   if (draft.redirect.size() > kMaxRedirect) return "The redirect address is too long.";
-  if (!isRedirectAddress(draft.redirect)) {
+  if (!isRedirectAddress(draft.redirect, grants::ApplicationKind::kConfidential)) {
     return "The redirect address must start with https://, or with http:// for 127.0.0.1 and "
            "localhost, and have no fragment.";
   }

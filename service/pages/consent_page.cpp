@@ -20,7 +20,7 @@ std::string hiddenRequest(const Settings& settings, const std::string& user,
          hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
          hidden("response_type", "code") + hidden("scope", asked.scope) +
          hidden("state", asked.state) + hidden("code_challenge", asked.challenge) +
-         hidden("code_challenge_method", "S256") +
+         hidden("code_challenge_method", asked.challenge.empty() ? "" : "S256") +
          hidden("form_token", formToken(settings, user, formSubject(asked)));
 }
 

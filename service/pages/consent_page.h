@@ -6,18 +6,9 @@
 #include <string>
 
 #include "service/context.h"
-#include "service/protocol/clients.h"
+#include "service/protocol/authorization_request.h"
 
 namespace keldoauth::service {
-
-struct AuthorizationRequest {
-  grants::Application client;
-  std::string redirect;
-  bool redirectWasGiven = false;
-  std::string scope = {};
-  std::string state = {};
-  std::string challenge = {};
-};
 
 /// What the form's token is bound to: everything that the user decides about.
 std::string formSubject(const AuthorizationRequest& asked);

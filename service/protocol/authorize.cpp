@@ -4,16 +4,15 @@
 #include "service/pages/consent_page.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
+#include "service/protocol/authorization_request.h"
 #include "service/protocol/clients.h"
 #include "service/protocol/redirect.h"
-#include "service/settings/scopes.h"
 #include "utils/oauth_bounds.h"
 
 namespace keldoauth::service {
 namespace {
 
 constexpr std::size_t kMaxUser = KELDOAUTHSERVER::bounds::kUsername.max;
-constexpr std::size_t kChallengeBytes = 43;
 
 [[noreturn]] void refuseWithPage(const Settings& settings, int status, const std::string& why) {
   throw Refusal{messagePage(settings, status, "This request cannot be answered", why)};
@@ -61,19 +60,10 @@ AuthorizationRequest readClient(Context& context, const Parameters& given) {
     refuseWithPage(context.settings, 403,
                    "The administrator of this box has disabled this application.");
   }
-  const bool named = given.has("redirect_uri");
-  AuthorizationRequest asked{
-      *client, named ? given.value("redirect_uri") : onlyAddress(client->addresses), named};
-  if (asked.redirect.empty() || !isRegistered(asked.redirect, client->addresses)) {
-    refuseWithPage(context.settings, 400,
-                   "The address to return to is not one that the application registered.");
-  }
+  const AuthorizationRequest asked = startOf(*client, given);
+  const std::string fault = faultOfAddress(asked);
+  if (!fault.empty()) refuseWithPage(context.settings, 400, fault);
   return asked;
-}
-
-bool isChallenge(const std::string& text) {
-  return text.size() == kChallengeBytes && percentEncode(text) == text &&
-         text.find_first_of(".~") == std::string::npos;
 }
 
 grants::CodeRequest codeRequest(const Request& request, const AuthorizationRequest& asked) {
@@ -81,39 +71,31 @@ grants::CodeRequest codeRequest(const Request& request, const AuthorizationReque
                            grants::Scope(asked.scope), grants::RedirectAddress(asked.redirect)};
   code.named =
       asked.redirectWasGiven ? grants::AddressNamed::kInRequest : grants::AddressNamed::kImplied;
-  code.pkce = grants::Pkce{grants::Challenge(asked.challenge)};
+  if (!asked.challenge.empty()) code.pkce = grants::Pkce{grants::Challenge(asked.challenge)};
   code.from = peerAddress(request);
   return code;
 }
 
 /// Faults that the application hears of.
-void readRest(const Context& context, const Request& request, const Parameters& given,
-              AuthorizationRequest& asked) {
-  if (!given.isDoubled("state")) asked.state = given.value("state");
-  if (given.isAnyDoubled({"state", "response_type", "response_mode", "scope", "code_challenge",
-                          "code_challenge_method"})) {
-    refuse(context, request, asked, "invalid_request", "A parameter occurs more than once");
+void requireGood(const Context& context, const Request& request, const Parameters& given,
+                 AuthorizationRequest& asked) {
+  if (const auto fault = readRest(context.settings, given, asked)) {
+    refuse(context, request, asked, fault->error, fault->why);
   }
-  const std::string type = given.value("response_type");
-  if (type.empty()) refuse(context, request, asked, "invalid_request", "response_type is missing");
-  if (type != "code")
-    refuse(context, request, asked, "unsupported_response_type", "Only code is supported");
-  const std::string mode = given.value("response_mode");
-  if (!mode.empty() && mode != "query") {
-    refuse(context, request, asked, "invalid_request", "Only the response mode query is supported");
+  if (request.user.empty() && asked.prompt.none) {
+    refuse(context, request, asked, "login_required", "Nobody is signed in");
   }
-  asked.challenge = given.value("code_challenge");
-  if (given.value("code_challenge_method") != "S256" || !isChallenge(asked.challenge)) {
-    refuse(context, request, asked, "invalid_request", "PKCE with the method S256 is required");
-  }
-  const std::string& registered = asked.client.scope.text();
-  asked.scope = tidyScope(given.has("scope") ? given.value("scope") : registered);
-  if (asked.scope.empty() || !isWithin(asked.scope, registered)) {
-    refuse(context, request, asked, "invalid_scope",
-           "The application is not registered for this scope");
+  if (request.user.empty() || request.user.size() > kMaxUser) {
+    refuseWithPage(context.settings, 403, "The web server does not say who you are.");
   }
   const auto fault = grants::Codes::faultOf(codeRequest(request, asked));
   if (fault) refuse(context, request, asked, *fault);
+}
+
+Answer answerWith(const Context& context, const Request& request, const AuthorizationRequest& asked,
+                  const grants::IssuedCode& issued) {
+  return redirectAnswer(request,
+                        addressWith(context.settings, asked, "code=" + issued.code.text()));
 }
 
 Answer decide(Context& context, const Request& request, const Parameters& given,
@@ -132,27 +114,60 @@ Answer decide(Context& context, const Request& request, const Parameters& given,
     refuseWithPage(context.settings, 400, "The form does not say what you decided.");
   const auto issued = context.store.open().codes.issue(codeRequest(request, asked));
   if (!issued) refuse(context, request, asked, issued.refusal());
-  return redirectAnswer(request,
-                        addressWith(context.settings, asked, "code=" + issued->code.text()));
+  return answerWith(context, request, asked, *issued);
+}
+
+/// Whoever is on the user's device can listen at such an address, or take such a
+/// scheme, and needs no secret (RFC 8252, 8.6): only the user can know who asks.
+bool isAnybodys(const AuthorizationRequest& asked) {
+  return asked.client.kind == grants::ApplicationKind::kPublic &&
+         formOf(asked.redirect) != AddressForm::kWeb;
+}
+
+/// A code for what the user agreed to before. The look beforehand needs no lock.
+grants::Outcome<grants::IssuedCode> issueUnasked(Context& context, const Request& request,
+                                                 const AuthorizationRequest& asked) {
+  grants::CodeRequest code = codeRequest(request, asked);
+  code.withoutPage = true;
+  grants::Grants& store = context.store.open();
+  if (request.method != "GET" || asked.prompt.wantsPage() || isAnybodys(asked) ||
+      !store.access.hasLogin(code.user, code.application, code.scope)) {
+    return grants::Refusal{grants::Error::kAccessDenied, grants::Why::kNotRemembered};
+  }
+  return store.codes.issue(code);
+}
+
+/// What they agreed to before is not asked again.
+Answer answerOrAsk(Context& context, const Request& request, const AuthorizationRequest& asked) {
+  const auto issued = issueUnasked(context, request, asked);
+  if (issued) return answerWith(context, request, asked, *issued);
+  const grants::Refusal& refusal = issued.refusal();
+  if (refusal.error != grants::Error::kAccessDenied) refuse(context, request, asked, refusal);
+  if (!asked.prompt.none) return consentPage(context.settings, request.user, asked);
+  const bool isRoom = refusal.why == grants::Why::kWouldEvict;
+  refuse(context, request, asked, isRoom ? "interaction_required" : "consent_required",
+         "The user has to be asked");
+}
+
+/// What came back from our own page; any other form is a request (OpenID Connect
+/// Core, 3.1.2.1).
+bool isDecision(const Request& request, const Parameters& given) {
+  return request.method == "POST" && (given.has("form_token") || given.has("decision"));
 }
 
 }  // namespace
 
 Answer authorize(Context& context, const Request& request) {
-  const bool isDecision = request.method == "POST";
-  if (!isDecision && !request.isRead()) return methodNotAllowed("GET, HEAD, POST");
-  if (isDecision && !request.isForm()) refuseWithPage(context.settings, 400, "This is not a form.");
-  if (request.user.empty() || request.user.size() > kMaxUser) {
-    refuseWithPage(context.settings, 403, "The web server does not say who you are.");
-  }
-  const std::optional<Parameters> given =
-      Parameters::parse(isDecision ? request.body : request.query);
+  const bool isPost = request.method == "POST";
+  if (!isPost && !request.isRead()) return methodNotAllowed("GET, HEAD, POST");
+  if (isPost && !request.isForm()) refuseWithPage(context.settings, 400, "This is not a form.");
+  const std::optional<Parameters> given = Parameters::parse(isPost ? request.body : request.query);
   if (!given) refuseWithPage(context.settings, 400, "The request cannot be read.");
 
   AuthorizationRequest asked = readClient(context, *given);
-  readRest(context, request, *given, asked);
-  return isDecision ? decide(context, request, *given, asked)
-                    : consentPage(context.settings, request.user, asked);
+  requireGood(context, request, *given, asked);
+  return isDecision(request, *given) ? decide(context, request, *given, asked)
+                                     : answerOrAsk(context, request, asked);
 }
 
 }  // namespace keldoauth::service

@@ -23,6 +23,10 @@ Answer unauthenticated(const std::string& why) {
   throw Refusal{oauthError(400, "invalid_request", why)};
 }
 
+std::optional<grants::Secret> secretOf(const std::string& text) {
+  return text.empty() ? std::nullopt : std::make_optional(grants::Secret(text));
+}
+
 /// Identifier and secret are form-encoded before the scheme encodes them.
 Credentials readBasic(const std::string& header) {
   const std::size_t blank = header.find(' ');
@@ -38,7 +42,7 @@ Credentials readBasic(const std::string& header) {
   const std::optional<std::string> identifier = formDecode(pair->substr(0, colon));
   const std::optional<std::string> secret = formDecode(pair->substr(colon + 1));
   if (!identifier || !secret) refuseClient("The Authorization header cannot be read");
-  return {grants::ApplicationId(*identifier), grants::Secret(*secret)};
+  return {grants::ApplicationId(*identifier), secretOf(*secret)};
 }
 
 }  // namespace
@@ -69,8 +73,7 @@ Parameters readForm(const Request& request, std::initializer_list<std::string_vi
 
 Credentials readCredentials(const Request& request, const Parameters& form) {
   const grants::ApplicationId identifier(form.value("client_id"));
-  const grants::Secret secret(form.value("client_secret"));
-  Credentials credentials{identifier, secret};
+  Credentials credentials{identifier, secretOf(form.value("client_secret"))};
   if (!request.authorization.empty()) {
     if (form.has("client_secret")) refuseRequest("More than one way of client authentication");
     credentials = readBasic(request.authorization);
@@ -80,6 +83,10 @@ Credentials readCredentials(const Request& request, const Parameters& form) {
   }
   if (credentials.identifier.text().empty()) refuseClient("Client authentication is required");
   return credentials;
+}
+
+void requireSecret(const Credentials& credentials) {
+  if (!credentials.secret) refuseClient("Client authentication is required");
 }
 
 grants::Application authenticate(const grants::Grants& store, const Credentials& credentials) {

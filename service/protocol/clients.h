@@ -4,6 +4,7 @@
 #define KELDOAUTH_SERVICE_PROTOCOL_CLIENTS_H
 
 #include <initializer_list>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -26,15 +27,20 @@ Parameters readForm(const Request& request, std::initializer_list<std::string_vi
 
 struct Credentials {
   grants::ApplicationId identifier;
-  grants::Secret secret;
+  std::optional<grants::Secret> secret;  // none: a public application's
 };
 
 /// Which application such a POST says to come from (RFC 6749, 2.3.1): Basic, or
-/// identifier and secret in the body, never both. Throws Refusal.
+/// identifier and secret in the body, never both. An empty secret is none.
+/// Throws Refusal.
 Credentials readCredentials(const Request& request, const Parameters& form);
 
-/// The application whose credentials these are. Throws Refusal with
-/// `invalid_client`, for a disabled one as well, and for one without a secret.
+/// Throws Refusal with `invalid_client` when there is no secret: where it is not
+/// enough to say who one is.
+void requireSecret(const Credentials& credentials);
+
+/// The application whose credentials these are: a public one has its identifier
+/// alone. Throws Refusal with `invalid_client`, for a disabled one as well.
 grants::Application authenticate(const grants::Grants& store, const Credentials& credentials);
 
 /// What an application is told of a refusal: 401 with a challenge when it is not

@@ -14,8 +14,9 @@ Answer metadata(Context& context, const Request& request);
 /// Registers an application, for whoever has the initial access token (RFC 7591).
 Answer registerApplication(Context& context, const Request& request);
 
-/// Asks the user whether an application may act for them, and sends the answer to
-/// the application (RFC 6749, 4.1; 7636; 9207).
+/// Asks the user whether an application may act for them, unless they have agreed
+/// to it before, and sends the answer to the application (RFC 6749, 4.1; 7636;
+/// 9207).
 Answer authorize(Context& context, const Request& request);
 
 /// Turns a code, a refresh token or a client's own credentials into an access

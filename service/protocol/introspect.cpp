@@ -31,6 +31,7 @@ Answer active(const Settings& settings, const grants::Introspection& found) {
 Answer introspect(Context& context, const Request& request) {
   const Parameters form = readForm(request, {"token", "token_type_hint"});
   const Credentials credentials = readCredentials(request, form);
+  requireSecret(credentials);
   const grants::Grants& store = context.store.open();
   const grants::Application client = authenticate(store, credentials);
   if (!form.has("token")) return oauthError(400, "invalid_request", "token is missing");

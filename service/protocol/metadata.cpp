@@ -32,6 +32,10 @@ Answer metadata(Context& context, const Request& request) {
     document[std::string(endpoint) + "_endpoint_auth_methods_supported"] =
         list({"client_secret_basic", "client_secret_post"});
   }
+  // A public application says who it is, where its tokens or codes say the rest.
+  for (const char* endpoint : {"token", "revocation"}) {
+    document[std::string(endpoint) + "_endpoint_auth_methods_supported"].append("none");
+  }
   document["authorization_response_iss_parameter_supported"] = true;
   for (const KnownScope& scope : own.scopes) document["scopes_supported"].append(scope.name);
   return jsonAnswer(200, document);

@@ -1,18 +1,15 @@
 #include "service/protocol/endpoints.h"
 
-#include "service/http/encoding.h"
+#include "service/protocol/authorization_request.h"
 #include "service/protocol/clients.h"
 #include "service/settings/scopes.h"
 
 namespace keldoauth::service {
 namespace {
 
-constexpr std::size_t kLeastVerifier = 43;
-constexpr std::size_t kMostVerifier = 128;
-
 /// Who asks for a token, and where from.
 struct Asking {
-  grants::ApplicationId client;
+  const grants::Application& client;
   grants::PeerAddress from;
 };
 
@@ -35,25 +32,23 @@ std::optional<grants::Scope> askedScope(const Parameters& form) {
 grants::Outcome<grants::Pair> redeemCode(grants::Grants& store, const Asking& asking,
                                          const Parameters& form) {
   const grants::Code code(required(form, "code"));
-  const std::string verifier = required(form, "code_verifier");
-  if (verifier.size() < kLeastVerifier || verifier.size() > kMostVerifier ||
-      percentEncode(verifier) != verifier) {
-    refuse("invalid_grant", "code_verifier is none");
+  std::optional<grants::Verifier> verifier;
+  if (asking.client.needsPkce || form.has("code_verifier")) {
+    verifier = grants::Verifier(required(form, "code_verifier"));
   }
   const grants::RedirectAddress redirect(form.value("redirect_uri"));
-  return store.codes.redeem(
-      {asking.client, code, redirect, grants::Verifier(verifier), asking.from});
+  return store.codes.redeem({asking.client.identifier, code, redirect, verifier, asking.from});
 }
 
 grants::Outcome<grants::Pair> refresh(grants::Grants& store, const Asking& asking,
                                       const Parameters& form) {
   const grants::RefreshToken token(required(form, "refresh_token"));
-  return store.tokens.refresh({asking.client, token, askedScope(form), asking.from});
+  return store.tokens.refresh({asking.client.identifier, token, askedScope(form), asking.from});
 }
 
 grants::Outcome<grants::Pair> actForItself(grants::Grants& store, const Asking& asking,
                                            const Parameters& form) {
-  return store.tokens.issueToItself({asking.client, askedScope(form), asking.from});
+  return store.tokens.issueToItself({asking.client.identifier, askedScope(form), asking.from});
 }
 
 Answer success(const grants::Pair& pair) {
@@ -85,7 +80,8 @@ Answer token(Context& context, const Request& request) {
   const Credentials credentials = readCredentials(request, form);
   grants::Grants& store = context.store.open();
   const grants::Application client = authenticate(store, credentials);
-  const auto pair = grantOf(form)(store, {client.identifier, peerAddress(request)}, form);
+  if (const auto fault = faultOfResource(context.settings, form)) refuse(fault->error, fault->why);
+  const auto pair = grantOf(form)(store, {client, peerAddress(request)}, form);
   return pair ? success(*pair) : refusalAnswer(pair.refusal());
 }
 
