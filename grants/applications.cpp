@@ -127,6 +127,17 @@ void noteRegistration(Store& store, const NewApplication& application,
   }
 }
 
+/// And one for all that they change of themselves, or when they go: nobody shall
+/// wash the log out by it.
+void noteChange(Store& store, const char* what, const Application& application, const Actor& by) {
+  const std::string subject = std::string("Application ") + what;
+  if (application.registeredItself && by == kItself) {
+    rows::note(store, subject + " itself", wordOf(application));
+  } else {
+    rows::note(store, subject + wordOf(application) + rows::actorWord(by));
+  }
+}
+
 Json::Value rowOf(const NewApplication& application, const std::string& identifier,
                   const std::string& secret) {
   Json::Value row;
@@ -298,7 +309,7 @@ Outcome<Application> Applications::change(const ApplicationId& identifier,
 
   Store::changeSeen(store_.applications, conditionOf(found->shown), modified);
   const auto changed = rows::findApplication(store_, identifier.text());
-  rows::note(store_, "Application changed" + wordOf(changed->shown) + rows::actorWord(by));
+  noteChange(store_, "changed", changed->shown, by);
   whole.commit();
   return changed->shown;
 }
@@ -333,7 +344,7 @@ Outcome<Removed> Applications::remove(const ApplicationId& identifier, const Act
   if (!found) return kGone;
   Store::erase(store_.applications, conditionOf(found->shown));
   const Removed removed = removeGrants(store_, identifier);
-  rows::note(store_, "Application removed" + wordOf(found->shown) + rows::actorWord(by));
+  noteChange(store_, "removed", found->shown, by);
   whole.commit();
   return removed;
 }

@@ -118,7 +118,9 @@ class Applications {
   std::optional<Secret> secretOf(const ApplicationId& identifier) const;
 
   // Changes -------------------------------------------------------------------
-  // Refusals: kInvalidClient (kNoApplication), and as `add`.
+  // Refusals: kInvalidClient (kNoApplication), and as `add`. `by` is kItself when
+  // an application that registered itself changes or removes itself: all of them
+  // share one audit entry, as they do when they register.
 
   Outcome<Application> change(const ApplicationId& identifier, const ApplicationChange& change,
                               const Actor& by);

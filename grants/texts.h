@@ -78,6 +78,8 @@ using PeerAddress = Text<struct PeerAddressKind>;
 
 /// Who does it, for the audit log: an administrator, the user, the application.
 using Actor = Text<struct ActorKind>;
+/// An application that changes what it is registered with, or removes itself.
+inline const Actor kItself;
 
 /// Stands in the rows of an application that acts for itself where the user
 /// stands elsewhere. No user may have this name: a grant for it is refused.

@@ -13,12 +13,13 @@ namespace {
 constexpr std::string_view kWellKnown = "/.well-known/";
 
 constexpr Route kRoutes[] = {
-    {"/.well-known/oauth-authorization-server", metadata, tellAsJson},
+    {"/.well-known/oauth-authorization-server", metadata, tellAsJson, "GET, HEAD"},
     {"/oauth/authorize", authorize, failurePage},
     {"/oauth/introspect", introspect, tellAsJson},
     {"/oauth/register", registerApplication, tellAsJson},
-    {"/oauth/revoke", revoke, tellAsJson},
-    {"/oauth/token", token, tellAsJson},
+    {"/oauth/register/", manageRegistration, tellAsJson},
+    {"/oauth/revoke", revoke, tellAsJson, "POST"},
+    {"/oauth/token", token, tellAsJson, "POST"},
     {"/api/whoami", whoami, tellAsJson},
     {"/admin", admin, failurePage},
 };
@@ -38,6 +39,11 @@ std::string_view pathBelow(std::string_view path, std::string_view base) {
   return isBefore ? path.substr(0, path.size() - base.size()) : std::string_view();
 }
 
+bool isOn(const Route& route, std::string_view path) {
+  if (route.path.back() != '/') return route.path == path;
+  return startsWith(path, route.path) && path.size() > route.path.size();
+}
+
 }  // namespace
 
 Answer tellAsJson(const Settings& /*settings*/, const Failure& failure) {
@@ -47,7 +53,7 @@ Answer tellAsJson(const Settings& /*settings*/, const Failure& failure) {
 const Route* routeOf(const std::string& path, const std::string& basePath) {
   const std::string_view below = pathBelow(path, basePath);
   const auto* const found = std::find_if(std::begin(kRoutes), std::end(kRoutes),
-                                         [&](const Route& route) { return route.path == below; });
+                                         [&](const Route& route) { return isOn(route, below); });
   return found == std::end(kRoutes) ? nullptr : found;
 }
 

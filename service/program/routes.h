@@ -16,9 +16,11 @@ using Tell = Answer (*)(const Settings& settings, const Failure& failure);
 Answer tellAsJson(const Settings& settings, const Failure& failure);
 
 struct Route {
-  std::string_view path;  // below the issuer's
+  std::string_view path;  // below the issuer's; what ends in a slash, and all below
   Endpoint endpoint;
   Tell tell;
+  /// The methods that scripts of any origin may use; null: none.
+  const char* openTo = nullptr;
 };
 
 /// Null for a path that nothing answers. `path` as the browser asked for it. What

@@ -7,6 +7,7 @@
 
 #include "grants/trouble.h"
 #include "service/http/web_address.h"
+#include "service/protocol/cors.h"
 
 namespace keldoauth::service {
 namespace {
@@ -54,7 +55,11 @@ Answer Service::answer(const Request& request) try {
   const Route* const route = routeOf(request.path, settings.basePath);
   if (route == nullptr) return plainAnswer(404);
   if (!request.isSecure && !isLoopbackPeer(request.peer)) return route->tell(settings, kInTheClear);
-  return answerBy(*route, settings, store_, request);
+  if (route->openTo != nullptr && request.method == "OPTIONS") {
+    return preflightAnswer(route->openTo);
+  }
+  Answer answer = answerBy(*route, settings, store_, request);
+  return route->openTo == nullptr ? answer : readableEverywhere(std::move(answer));
 } catch (const SettingsFault& fault) {
   for (const std::string& line : fault.faults()) std::cerr << "keldoauth-service: " << line << '\n';
   const Route* const route = routeOf(request.path, "");

@@ -14,6 +14,10 @@ Answer metadata(Context& context, const Request& request);
 /// Registers an application, for whoever has the initial access token (RFC 7591).
 Answer registerApplication(Context& context, const Request& request);
 
+/// Lets an application that registered itself see, replace and remove what it is
+/// registered with (RFC 7592). The end of the path names it.
+Answer manageRegistration(Context& context, const Request& request);
+
 /// Asks the user whether an application may act for them, unless they have agreed
 /// to it before, and sends the answer to the application (RFC 6749, 4.1; 7636;
 /// 9207).

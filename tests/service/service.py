@@ -185,9 +185,10 @@ class Client:
         self.metadata = metadata
 
     def question(self, challenge, **changes):
+        """Of an application that wants the page each time."""
         return {"response_type": "code", "client_id": self.id, "redirect_uri": self.redirect,
                 "scope": "profile", "state": "a state", "code_challenge": challenge,
-                "code_challenge_method": "S256", **changes}
+                "code_challenge_method": "S256", "prompt": "consent", **changes}
 
     def ask(self, challenge, user="alice", **changes):
         """The answer to the authorization request: the consent page, at best."""
@@ -271,6 +272,8 @@ def consent(address, user="alice", decision="allow"):
     """What a person does whom a client sent to `address`: where they end up."""
     assert address.startswith(ISSUER), address
     page = send("GET", address[len(ISSUER):], headers=as_user(user))
+    if page.status == 302:
+        return page.location  # They have agreed before.
     assert page.status == 200, (page.status, page.text)
     fields = {**Form(page.text).fields, "decision": decision}
     return send("POST", "/oauth/authorize", encode(fields), {**FORM, **as_user(user)}).location
