@@ -40,6 +40,8 @@ const std::vector<Floor>& floors() {
                                       {"service/http", 5},
                                       {"service/settings", 6},
                                       {"service/store", 7},
+                                      {"service/people", 7},
+                                      {"service/signing", 7},
                                       {"service", 8},
                                       {"service/program", 9},
                                       {"bench", 5},
