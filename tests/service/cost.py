@@ -1,9 +1,12 @@
-"""What one verification request costs, from a cold start: every request is a
-process of its own. Beside it, a CGI program that does nothing, through the same
-server and the same caller. Prints it, or writes it to the file that is named."""
+"""What one verification request costs, beside a program that does nothing, through
+the same server and the same caller: from a cold start, where every request is a
+process of its own, or by processes that stay, as the service was started. Prints
+it, or writes it to the file that is named."""
 
+import glob
 import http.client
 import os
+import re
 import subprocess
 import sys
 import threading
@@ -14,6 +17,7 @@ import service
 
 SECONDS = 5
 CALLERS = 2  # as many as cores
+STAYS = os.environ["SERVICE_MODE"] == "fastcgi"
 
 
 def requests_per_second(path, headers):
@@ -38,7 +42,22 @@ def requests_per_second(path, headers):
     return sum(counts) / SECONDS
 
 
+def peak_of_those_that_stay(program):
+    """Of the processes that answer by FastCGI."""
+    path, peaks = os.path.join(os.environ["SERVICE_PROGRAMS"], program), []
+    for folder in glob.glob("/proc/[0-9]*"):
+        try:
+            if os.readlink(folder + "/exe") == path:
+                with open(folder + "/status", encoding="utf-8") as status:
+                    peaks.append(int(re.search(r"VmHWM:\s+(\d+)", status.read())[1]))
+        except OSError:
+            pass  # It has ended meanwhile, or is not ours to see.
+    return max(peaks)
+
+
 def peak_kilobytes(program, path, headers):
+    if STAYS:
+        return peak_of_those_that_stay(program)
     environment = {"REQUEST_METHOD": "GET", "SCRIPT_NAME": path, "REMOTE_ADDR": "127.0.0.1",
                    "KELDOAUTH_SERVICE_SETTINGS": service.RUN + "/settings.json",
                    "HTTP_AUTHORIZATION": headers["Authorization"]}
@@ -54,7 +73,8 @@ def main():
     headers = service.bearer(service.register().tokens()["access_token"])
     report = ""
     for title, path, program in (("verification (/api/whoami)", "/api/whoami", "keldoauth-service"),
-                                 ("nothing (/api/nothing)", "/api/nothing", "nothing")):
+                                 ("nothing (/api/nothing)", "/api/nothing",
+                                  "nothing-fastcgi" if STAYS else "nothing")):
         rate = requests_per_second(path, headers)
         peak = peak_kilobytes(program, path, headers)
         report += (f"{title}: {rate:.0f} requests/s, {1000 * CALLERS / rate:.1f} ms each, "
