@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <cstring>
 #include <memory>
@@ -50,18 +51,17 @@ bool writeAll(int file, std::string_view text) {
   return true;
 }
 
-/// One byte more than may be there is read, too.
+/// Up to the first piece beyond what may be there.
 std::string readAll(const std::string& path, int file, std::size_t most) {
-  std::string text(most + 1, '\0');
-  std::size_t filled = 0;
-  while (filled < text.size()) {
-    const ssize_t got = read(file, text.data() + filled, text.size() - filled);
+  std::string text;
+  std::array<char, 4096> piece{};
+  while (text.size() <= most) {
+    const ssize_t got = read(file, piece.data(), piece.size());
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) failByErrno(path);
     if (got == 0) break;
-    filled += static_cast<std::size_t>(got);
+    text.append(piece.data(), static_cast<std::size_t>(got));
   }
-  text.resize(filled);
   return text;
 }
 
