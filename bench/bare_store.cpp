@@ -26,6 +26,15 @@ void require(int result, sqlite3* db, const std::string& sql) {
   std::exit(1);
 }
 
+std::string cipherOf(const std::string& text) {
+  std::array<char, 1024> cipher{};
+  if (KCORECryptSzEncrypt(text.c_str(), cipher.data(), cipher.size()) == 0) {
+    std::fputs("the platform's cipher refuses\n", stderr);
+    std::exit(1);
+  }
+  return cipher.data();
+}
+
 }  // namespace
 
 std::string tokenText(long long serial) {
@@ -37,14 +46,16 @@ std::string tokenText(long long serial) {
 }
 
 const std::string& clientIdCipher() {
-  static const std::string cipher = [] {
-    std::array<char, 1024> text{};
-    if (KCORECryptSzEncrypt(tokenText(1).c_str(), text.data(), text.size()) == 0) {
-      std::fputs("the platform's cipher refuses\n", stderr);
-      std::exit(1);
-    }
-    return std::string(text.data());
-  }();
+  static const std::string cipher = cipherOf(tokenText(1));
+  return cipher;
+}
+
+std::string applicationId() {
+  return tokenText(2);
+}
+
+const std::string& applicationIdCipher() {
+  static const std::string cipher = cipherOf(applicationId());
   return cipher;
 }
 

@@ -46,6 +46,10 @@ std::string tokenText(long long serial);
 /// What the platform's cipher makes of an identifier; the same for all rows.
 const std::string& clientIdCipher();
 
+/// The one registered application, to which no row belongs at first.
+std::string applicationId();
+const std::string& applicationIdCipher();
+
 }  // namespace bench
 
 #endif  // KELDOAUTH_BENCH_BARE_STORE_H

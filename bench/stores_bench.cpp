@@ -8,12 +8,12 @@
 #include <sys/random.h>
 
 #include <array>
-#include <cstdint>
+#include <cstdlib>
 #include <functional>
-#include <random>
 #include <string>
 
 #include "bench/bare_store.h"
+#include "bench/sides.h"
 #include "bench/world.h"
 #include "stores/oauth_clientInfo.h"
 #include "stores/oauth_log.h"
@@ -25,16 +25,6 @@ using namespace KELDOAUTHSERVER;
 
 namespace bench {
 namespace {
-
-/// Serials of rows made while measuring: above all that a database starts with.
-long long nextSerial() {
-  static long long serial = 1000000;
-  return ++serial;
-}
-
-void require(benchmark::State& state, bool done) {
-  if (!done) state.SkipWithError("operation failed");
-}
 
 // B1 ------------------------------------------------------------------------
 
@@ -175,21 +165,16 @@ void randomLibrary(benchmark::State& state) {
   for (auto _ : state) benchmark::DoNotOptimize(getRandomStr(64));
 }
 
-struct OneRead {
-  using result_type = std::uint32_t;
-  void generate(std::uint32_t* first, std::uint32_t* last) const {
-    const auto size = static_cast<std::size_t>(last - first) * sizeof *first;
-    if (getrandom(first, size, 0) != static_cast<ssize_t>(size)) std::abort();
-  }
-};
-
-/// Per piece one read of 2,496 bytes, seeding, and the four words of a draw.
+/// What the system's random source takes for it: 2,496 bytes a piece in one read,
+/// of which nothing is computed.
 void randomBare(benchmark::State& state) {
+  std::array<unsigned char, 2496> bytes{};
   for (auto _ : state) {
     for (int piece = 0; piece < 2; ++piece) {
-      OneRead read;
-      std::mt19937 generator(read);
-      for (int word = 0; word < 4; ++word) benchmark::DoNotOptimize(generator());
+      if (getrandom(bytes.data(), bytes.size(), 0) != static_cast<ssize_t>(bytes.size())) {
+        std::abort();
+      }
+      benchmark::DoNotOptimize(bytes);
     }
   }
 }
@@ -208,37 +193,6 @@ void constructBare(benchmark::State& state, Sync sync) {
 
 // ---------------------------------------------------------------------------
 
-using Body = void (*)(benchmark::State&);
-using SyncedBody = void (*)(benchmark::State&, Sync);
-
-/// How often a measurement runs, 0 for as often as it takes, and for how many
-/// rows.
-struct Runs {
-  int iterations;
-  std::initializer_list<int> sizes;
-};
-
-void add(const std::string& name, const Runs& runs,
-         const std::function<void(benchmark::State&)>& body) {
-  auto* entry = benchmark::RegisterBenchmark(name.c_str(), body);
-  entry->Unit(benchmark::kMicrosecond)->UseRealTime();
-  if (runs.iterations > 0) entry->Iterations(runs.iterations);
-  for (const int size : runs.sizes) entry->Arg(size);
-}
-
-void add(const std::string& name, Body library, Body bare, const Runs& runs) {
-  add(name + "/library", runs, library);
-  add(name + "/bare", runs, bare);
-}
-
-void add(const std::string& name, Body library, SyncedBody bare, const Runs& runs) {
-  add(name + "/library", runs, library);
-  add(name + "/bare", runs, [bare](benchmark::State& state) { bare(state, Sync::kExtra); });
-  add(name + "/bare at FULL", runs, [bare](benchmark::State& state) { bare(state, Sync::kFull); });
-}
-
-/// Writing operations run a fixed number of times, so that the tables stay near
-/// the size that their names say.
 const bool registered = [] {
   add("B1 register a client", registerLibrary, registerBare, {50, {}});
   add("B2 issue a token pair", issueLibrary, issueBare, {50, {10, 100, 900, 9900}});

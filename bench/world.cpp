@@ -16,6 +16,13 @@ namespace {
 namespace fs = std::filesystem;
 namespace names = KELDOAUTHSERVER::names;
 
+void fillApplications(BareStore& store) {
+  store.run(
+      "INSERT INTO oauth_clientInfo VALUES('1', '" + applicationIdCipher() + "', '" +
+      clientIdCipher() +
+      "', 'https://photos.example.org/callback', 'profile photos.read', 'Photo Frame', NULL);");
+}
+
 void fillTokens(BareStore& store, const Contents& contents) {
   for (int row = 1; row <= contents.tokens; ++row) {
     const std::string token = tokenText(row);
@@ -37,6 +44,7 @@ void build(const Contents& contents) {
   const KELDOAUTHSERVER::OAUTHDBBasic schema;  // creates the tables
   BareStore store;
   store.run("BEGIN;");
+  fillApplications(store);
   fillTokens(store, contents);
   fillLog(store, contents.logRows);
   store.run("COMMIT;");
@@ -57,7 +65,8 @@ void install(const Contents& contents, int logMax) {
     fs::copy_file(copy, names::kDatabaseFile);
   }
   std::ofstream(names::kSettingsFile)
-      << R"({"client_info_max": 10000, "token_max": 10000, "log_max": )" << logMax << "}\n";
+      << R"({"client_info_max": 10000, "grantcode_max": 10000, "token_max": 10000, "log_max": )"
+      << logMax << "}\n";
   sync();
 }
 

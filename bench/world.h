@@ -6,8 +6,8 @@
 
 namespace bench {
 
-/// What the tables hold. Token rows have the serials 1 to `tokens`, the first
-/// `expired` of which have expired; log rows lie a second apart.
+/// What the tables hold, beside one registered application. Token rows have the serials 1 to
+/// `tokens`, the first `expired` of which have expired; log rows lie a second apart.
 struct Contents {
   int tokens = 0;
   int expired = 0;
