@@ -1,23 +1,27 @@
-# How the cost of an operation grows with the rows of its table: the library
-# beside bare SQLite. Needs `folder`, where growth.csv lies.
-set terminal pngcairo size 1000,760 font "sans,10"
+# How the ratio to bare SQLite changes with the rows of the table, and how the
+# cost does. Needs `folder`, where growth.csv lies.
+set terminal pngcairo size 1200,900 font "sans,10"
 set output folder."/growth.png"
 set datafile separator "\t"
-set logscale xy
-set xlabel "rows"
-set ylabel "microseconds"
+data = folder."/growth.csv"
+array names[6] = ["B2 issue a token pair", "B3 verify an access token", \
+                  "L1 login whole, kept open", "L2 login whole, opened twice", \
+                  "L3 refresh", "L5 purge of half of the rows"]
+set logscale x
+set xlabel "rows of the table"
+set xrange [8:15000]
+set yrange [0:*]
+set ylabel "ratio to bare SQLite"
 set key top left
 set grid
-set format y "%.0f"
-data = folder."/growth.csv"
-names = "'B2 issue a token pair' 'B3 verify an access token' 'B4 look up a refresh token' 'B5 purge half of the rows'"
-set multiplot layout 2,2
-do for [i=1:4] {
-  name = word(names, i)
-  set title name." (tmpfs)"
-  plot data using (strcol(1) eq name && strcol(2) eq "tmpfs" ? column(3) : NaN):(column(4)) \
-         with linespoints pt 7 lw 2 title "library", \
-       data using (strcol(1) eq name && strcol(2) eq "tmpfs" ? column(3) : NaN):(column(5)) \
-         with linespoints pt 6 lw 2 dt 2 title "bare SQLite"
+set multiplot layout 2,3
+do for [i=1:6] {
+  name = names[i]
+  set title name
+  plot 1 with lines dt 3 lc "black" notitle, \
+    data using (strcol(1) eq name && strcol(2) eq "tmpfs" ? column(3) : NaN):(column(6)) \
+         with linespoints pt 7 lw 2 title "tmpfs", \
+    data using (strcol(1) eq name && strcol(2) eq "disk" ? column(3) : NaN):(column(6)) \
+         with linespoints pt 6 lw 2 title "disk"
 }
 unset multiplot

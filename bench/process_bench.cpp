@@ -3,6 +3,7 @@
 #include <benchmark/benchmark.h>
 #include <spawn.h>
 #include <sys/ptrace.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -11,7 +12,6 @@
 #include <fstream>
 #include <string>
 #include <tuple>
-#include <utility>
 #include <vector>
 
 #include "bench/bare_store.h"
@@ -23,7 +23,12 @@ namespace {
 struct Outcome {
   int failures = 0;
   double seconds = 0;
+  double processorSeconds = 0;
 };
+
+double secondsOf(const timeval& time) {
+  return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
+}
 
 std::string programFolder() {
   return std::filesystem::read_symlink("/proc/self/exe").parent_path().string();
@@ -64,7 +69,10 @@ Outcome run(int processes, const Command& command) {
   for (int i = 0; i < processes; ++i) command.start();
   for (int i = 0; i < processes; ++i) {
     int status = 0;
-    if (wait(&status) < 0 || !WIFEXITED(status) || WEXITSTATUS(status) != 0) ++outcome.failures;
+    rusage used{};
+    const bool hasEnded = wait4(-1, &status, 0, &used) > 0;
+    if (!hasEnded || !WIFEXITED(status) || WEXITSTATUS(status) != 0) ++outcome.failures;
+    outcome.processorSeconds += secondsOf(used.ru_utime) + secondsOf(used.ru_stime);
   }
   outcome.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
   return outcome;
@@ -95,16 +103,20 @@ double peakKibibytes(const Command& command) {
 }
 
 void measure(benchmark::State& state, int processes, const Command& command) {
+  double processorSeconds = 0;
   for (auto _ : state) {
     const Outcome outcome = run(processes, command);
+    processorSeconds += outcome.processorSeconds;
     if (outcome.failures > 0) state.SkipWithError("a process failed");
     state.SetIterationTime(outcome.seconds);
   }
+  state.counters["cpu_us"] =
+      benchmark::Counter(processorSeconds * 1e6, benchmark::Counter::kAvgIterations);
 }
 
-void coldVerify(benchmark::State& state, const char* program) {
+void coldVerify(benchmark::State& state, const char* program, const char* verb) {
   install({1000, 0, 0});
-  const Command command(program, "verify", tokenText(500));
+  const Command command(program, verb, tokenText(500));
   measure(state, 1, command);
   state.counters["peak_kib"] = peakKibibytes(command);
 }
@@ -126,18 +138,23 @@ benchmark::internal::Benchmark* add(const std::string& name, const char* side, B
 }  // namespace bench
 
 int main(int argc, char** argv) {
-  for (const auto& [side, program] :
-       {std::pair{"library", "process_library"}, std::pair{"bare", "process_bare"},
-        std::pair{"links only", "process_links"}}) {
-    bench::add("B9 cold verification", side, bench::coldVerify, program)->Iterations(25);
+  constexpr const char* kVerification = "P1 cold verification";
+  for (const auto& [side, program, verb] :
+       {std::tuple{"library", "process_library", "verify"},
+        std::tuple{"static", "process_library_static", "verify"},
+        std::tuple{"bare", "process_bare", "verify"},
+        std::tuple{"bare, no start-up", "process_bare", "verify-alone"},
+        std::tuple{"links only", "process_links", "verify"},
+        std::tuple{"nothing", "process_nothing", "verify"}}) {
+    bench::add(kVerification, side, bench::coldVerify, program, verb)->Iterations(25);
   }
   for (const auto& [side, program, verb] :
        {std::tuple{"library", "process_library", "issue"},
+        std::tuple{"static", "process_library_static", "issue"},
         std::tuple{"bare", "process_bare", "issue"},
         std::tuple{"bare at FULL", "process_bare", "issue-full"}}) {
-    bench::add("B10 eight writers of 100 tokens", side, bench::eightWriters, program, verb)
-        ->Iterations(1)
-        ->Repetitions(20);
+    bench::add("P2 eight writers of 100 tokens", side, bench::eightWriters, program, verb)
+        ->Iterations(1);
   }
 
   benchmark::Initialize(&argc, argv);

@@ -1,6 +1,7 @@
 // One process of the service, over the library:
 //   process_library verify TOKEN    construct, verify, exit
 //   process_library issue COUNT     issue that many token pairs
+//   process_library purge 0         remove what has expired
 
 #include <json/value.h>
 
@@ -18,6 +19,7 @@ int main(int argc, char** argv) {
   OAUTHDBToken tokens(names::kTokenTable);
   Json::Value out;
   if (std::strcmp(argv[1], "verify") == 0) return tokens.Verify(argv[2], out) ? 0 : 1;
+  if (std::strcmp(argv[1], "purge") == 0) return tokens.Purge() ? 0 : 1;
 
   const std::string client(64, '1');
   for (int count = std::atoi(argv[2]); count > 0; --count) {

@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
-"""Puts a fresh table, with the machine that it comes from, into bench/README.md.
+"""Puts fresh tables, with the machine that they come from, into bench/README.md.
 
-usage: publish.py TABLE README
+usage: publish.py REPORT-FOLDER README
 """
 
 import datetime
@@ -28,14 +28,17 @@ def version(package):
 
 
 def main():
-    table, readme = (pathlib.Path(name) for name in sys.argv[1:3])
+    report, readme = (pathlib.Path(name) for name in sys.argv[1:3])
     machine = (f"{datetime.date.today()}, {processor()}, Linux {platform.release()}, "
                f"SQLite {version('libsqlite3-0')}, JsonCpp {version('libjsoncpp25')}, "
                f"{first_line('g++', '--version')}; a shared virtual machine.")
     text = readme.read_text()
-    block = f"<!-- figures -->\n{machine}\n\n{table.read_text().strip()}\n<!-- end of figures -->"
-    readme.write_text(re.sub(r"<!-- figures -->.*<!-- end of figures -->", lambda _: block, text,
-                             flags=re.DOTALL))
+    for name, lead in (("marks", ""), ("table", f"{machine}\n\n")):
+        block = (f"<!-- {name} -->\n{lead}{(report / f'{name}.md').read_text().strip()}\n"
+                 f"<!-- end of {name} -->")
+        text = re.sub(rf"<!-- {name} -->.*<!-- end of {name} -->", lambda _, block=block: block,
+                      text, flags=re.DOTALL)
+    readme.write_text(text)
 
 
 if __name__ == "__main__":

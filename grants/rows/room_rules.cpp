@@ -47,9 +47,9 @@ struct Claim {
   std::string isOfPair;  // one user with one application
   std::string isOfUser;
   std::string isOfApplication;
-  std::string givesWay;  // what of one's own goes beyond a bound
-  std::string order;     // and what of it first
-  std::string yields;    // what of anybody's goes when the table is full
+  std::string givesWay;    // what of one's own goes beyond a bound
+  std::string (*order)();  // and what of it first; asks the settings
+  std::string yields;      // what of anybody's goes when the table is full
   int pairBound;
 };
 
@@ -79,7 +79,7 @@ Crowd count(Store& store, const Claim& claim) {
 /// Removes the first `most` of the rows that meet `condition`; how many went.
 long long evict(Store& store, const Claim& claim, const std::string& condition, long long most) {
   return store.countErased(claim.table, "id IN (SELECT id FROM " + std::string(claim.table) +
-                                            " WHERE " + condition + " ORDER BY " + claim.order +
+                                            " WHERE " + condition + " ORDER BY " + claim.order() +
                                             " LIMIT " + std::to_string(most) + ")");
 }
 
@@ -96,8 +96,8 @@ std::optional<Excess> excessOf(const std::string& condition, long long found, lo
 }
 
 /// By the first bound that the crowd has reached.
-std::optional<Excess> excessOf(const Claim& claim, const Crowd& crowd, const Policy& policy) {
-  const long long limit = getTableRowMax(claim.limitKey);
+std::optional<Excess> excessOf(const Claim& claim, const Crowd& crowd, long long limit,
+                               const Policy& policy) {
   auto excess = excessOf(claim.isOfPair, crowd.ofPair, claim.pairBound);
   if (!excess) {
     excess = excessOf(claim.isOfUser, crowd.ofUser, limit / std::max(policy.userPart, 1));
@@ -134,7 +134,7 @@ void clearDead(Store& store, const Claim& claim, long long rows, long long limit
 std::optional<Crowd> makeRoom(Store& store, const Claim& claim) {
   const long long limit = getTableRowMax(claim.limitKey);
   Crowd crowd = count(store, claim);
-  while (const auto excess = excessOf(claim, crowd, store.policy)) {
+  while (const auto excess = excessOf(claim, crowd, limit, store.policy)) {
     if (!evictOwn(store, claim, *excess)) {
       if (claim.givesWay == kAll) Store::failMissed();
       return {};
@@ -155,12 +155,32 @@ std::string isOf(const std::string& application) {
   return isOneOf(names::kClientId, {Store::sealed(application)});
 }
 
+std::string tokenOrder() {
+  return renewal(names::kAccessToken, names::kTokenExpired) + ",id";
+}
+
+std::string codeOrder() {
+  return renewal(names::kCode, names::kGrantCodeExpired) + ",id";
+}
+
+std::string spentCodesFirst() {
+  return isSpentCode() + " DESC," + codeOrder();
+}
+
 Claim tokenClaim(const Store& store, const std::string& application, long long now) {
-  Claim claim{
-      names::kTokenTable, names::kTokenMax, errors::kTokenFull, "", "", "", "", kAll, "", "", 1};
+  Claim claim{names::kTokenTable,
+              names::kTokenMax,
+              errors::kTokenFull,
+              "",
+              "",
+              "",
+              "",
+              kAll,
+              tokenOrder,
+              "",
+              1};
   claim.isDead = isDeadToken(store.policy, now);
   claim.isOfApplication = isOf(application);
-  claim.order = renewal(names::kAccessToken, names::kTokenExpired) + ",id";
   return claim;
 }
 
@@ -181,7 +201,7 @@ bool hasRoomForLogin(Store& store, const Claim& claim, long long waiting) {
   crowd.ofPair += waiting;
   crowd.ofUser += waiting;
   crowd.ofApplication += waiting;
-  return !excessOf(claim, crowd, store.policy);
+  return !excessOf(claim, crowd, getTableRowMax(claim.limitKey), store.policy);
 }
 
 }  // namespace
@@ -223,8 +243,7 @@ bool makeRoomForCode(Store& store, const std::string& user, const std::string& a
       store, {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull, isDeadCode(now),
               "(NOT " + isSpentCode() + " AND " + isOfUser + " AND " + isOfApplication + ")",
               isOfUser, isOfApplication, evicts == Evicts::kNothing ? isSpentCode() : kAll,
-              isSpentCode() + " DESC," + renewal(names::kCode, names::kGrantCodeExpired) + ",id",
-              isSpentCode(), store.policy.codesOfOne});
+              spentCodesFirst, isSpentCode(), store.policy.codesOfOne});
   return crowd &&
          (evicts == Evicts::kOldest ||
           hasRoomForLogin(store, loginClaim(store, user, application, evicts, now), crowd->ofPair));
@@ -255,9 +274,8 @@ void makeRoomForPushed(Store& store, const std::string& application, long long n
   const std::string isOfOne = "(" + isPushedRequest() + " AND " + isOf(application) + ")";
   const bool isRoom =
       makeRoom(store, {names::kGrantCodeTable, names::kGrantCodeMax, errors::kGrantCodeFull,
-                       isDeadCode(now), isOfOne, isPushedRequest(), kNone, isOfOne,
-                       renewal(names::kCode, names::kGrantCodeExpired) + ",id", isSpentCode(),
-                       store.policy.pushedOfOne})
+                       isDeadCode(now), isOfOne, isPushedRequest(), kNone, isOfOne, codeOrder,
+                       isSpentCode(), store.policy.pushedOfOne})
           .has_value();
   if (!isRoom) fail(errors::kGrantCodeFull);
 }

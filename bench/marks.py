@@ -1,0 +1,92 @@
+#!/usr/bin/env python3
+"""Prints every mark, what was measured, and whether it is met.
+
+usage: marks.py RESULTS-FOLDER INSTRUCTIONS
+
+RESULTS-FOLDER holds what scripts/bench has measured and, where scripts/service
+--cost has run, service.json. A mark that nothing was measured for says so.
+"""
+
+import json
+import pathlib
+import sys
+
+from results import Medium, instructions
+
+VERIFICATION = "P1 cold verification"
+WRITERS = "P2 eight writers of 100 tokens"
+
+
+class Marks:
+    def __init__(self, folder, counts):
+        self.disk, self.tmpfs = (Medium(folder, medium) for medium in ("disk", "tmpfs"))
+        self.counts = instructions(counts)
+        service = pathlib.Path(folder) / "service.json"
+        self.service = json.loads(service.read_text()) if service.exists() else {}
+
+    def counted(self, machine):
+        return (self.counts[(machine, "stores-static", "verify")] /
+                self.counts[(machine, "bare", "verify")])
+
+    def rate(self, way):
+        """The most requests a second, whatever the number of callers."""
+        return max(self.service[way]["rates"].values())
+
+    def lines(self):
+        """(mark, what, bound, whether it is the least, how to find the figure)"""
+        disk, tmpfs = self.disk, self.tmpfs
+        yield "M1", "cold verification, static, time on tmpfs", 1.10, False, \
+            lambda: tmpfs.ratio(VERIFICATION, "static")[0]
+        yield "M1", "cold verification, static, instructions, amd64", 0.65, False, \
+            lambda: self.counted("amd64")
+        yield "M2", "cold verification, static, instructions, armhf", 0.70, False, \
+            lambda: self.counted("armhf")
+        yield "M3", "cold verification, shared library, time on tmpfs", 1.55, False, \
+            lambda: tmpfs.ratio(VERIFICATION)[0]
+        for rows in (900, 9900):
+            name = f"B2 issue a token pair/{rows}"
+            yield "M4", f"issue a pair among {rows}, disk", 1.08, False, \
+                lambda name=name: disk.ratio(name)[0]
+            yield "M4", f"issue a pair among {rows}, tmpfs", 1.7, False, \
+                lambda name=name: tmpfs.ratio(name)[0]
+        for how in ("L1 login whole, kept open", "L2 login whole, opened twice"):
+            for rows in (100, 1000, 9000):
+                yield "M5", f"{how[3:]}, among {rows}, disk", 1.10, False, \
+                    lambda name=f"{how}/{rows}": disk.ratio(name)[0]
+        yield "M6", "refresh among 9,900, by primary key beside it, disk", 1.3, False, \
+            lambda: disk.ratio("L3 refresh/9900")[0]
+        yield "M6", "the same, among 9,900 against among 100, tmpfs", 1.3, False, \
+            lambda: (tmpfs.median("L3 refresh/9900", "library") /
+                     tmpfs.median("L3 refresh/100", "library"))
+        for medium, measured in (("disk", disk), ("tmpfs", tmpfs)):
+            yield "M7", f"purge of grants/, 5,000 of 10,000, {medium}", 1.3, False, \
+                lambda measured=measured: measured.ratio("L5 purge of half of the rows/10000")[0]
+        yield "M8", "/api/whoami, static CGI, of the rate of a program that does nothing", 0.75, \
+            True, lambda: self.rate("static CGI") / self.rate("nothing, static CGI")
+        yield "M9", "/api/whoami by FastCGI, of the rate of the static CGI", 8, True, \
+            lambda: self.rate("FastCGI") / self.rate("static CGI")
+        yield "M9", "/api/whoami by FastCGI, of the rate of oidc-provider on Node", 2, True, \
+            lambda: self.rate("FastCGI") / self.rate("oidc-provider on Node")
+        yield "M10", "peak memory of a static CGI verification, MiB", 4, False, \
+            lambda: self.service["static CGI"]["peak_kib"] / 1024
+        for side in ("library", "static"):
+            yield "M11", f"eight writers, {side}, tmpfs", 1.6, False, \
+                lambda side=side: tmpfs.ratio(WRITERS, side)[0]
+
+
+def main():
+    print("| Mark | What | Bound | Measured | |")
+    print("|---|---|---|---|---|")
+    for mark, what, bound, is_least, find in Marks(sys.argv[1], sys.argv[2]).lines():
+        try:
+            figure = find()
+        except KeyError:
+            print(f"| {mark} | {what} | {'≥' if is_least else '≤'} {bound:g} | – | not measured |")
+            continue
+        met = figure >= bound if is_least else figure <= bound
+        print(f"| {mark} | {what} | {'≥' if is_least else '≤'} {bound:g} | {figure:.2f} | "
+              f"{'met' if met else '**missed**'} |")
+
+
+if __name__ == "__main__":
+    main()

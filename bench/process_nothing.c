@@ -1,0 +1,5 @@
+/* Does nothing: what a process costs. */
+
+int main(void) {
+  return 0;
+}
