@@ -49,9 +49,11 @@ struct Request {
   std::string cookie;
   std::string origin;
   std::string accept;
-  std::string user;       // whom the web server has authenticated; empty: nobody
-  std::string peer;       // the IP address that the request came from; empty: not known
-  bool isSecure = false;  // it came by TLS
+  std::string user;        // who it is from; empty: nobody has signed in
+  long long authTime = 0;  // when that user's password was asked for
+  std::string session;     // the session's identifier; empty: the web server vouches for the user
+  std::string peer;        // the IP address that the request came from; empty: not known
+  bool isSecure = false;   // it came by TLS
 
   [[nodiscard]] bool isRead() const { return method == "GET" || method == "HEAD"; }
   [[nodiscard]] bool isForm() const { return contentType == "application/x-www-form-urlencoded"; }

@@ -3,6 +3,7 @@
 #include "service/pages/admin_view.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
+#include "service/pages/sign_in.h"
 
 namespace keldoauth::service {
 namespace {
@@ -28,6 +29,7 @@ bool isFromHere(const Settings& settings, const Request& request, const Paramete
 }  // namespace
 
 Answer admin(Context& context, const Request& request) {
+  if (request.user.empty()) return signInFirst(context.settings, request);
   // The web server should have kept others out; the settings have the last word.
   if (context.settings.administrators.count(request.user) == 0) {
     return messagePage(context.settings, 403, "Not for you",

@@ -88,9 +88,9 @@ Answer page(const Settings& settings, int status, const std::string& title,
   return pageUnder(settings, std::string(kPolicy) + "; form-action 'self'", status, title, main);
 }
 
-Answer pageLeadingAway(const Settings& settings, const std::string& title,
-                       const std::string& main) {
-  return pageUnder(settings, kPolicy, 200, title, main);
+Answer pageLeadingAway(const Settings& settings, const std::string& title, const std::string& main,
+                       int status) {
+  return pageUnder(settings, kPolicy, status, title, main);
 }
 
 Answer messagePage(const Settings& settings, int status, const std::string& title,

@@ -28,7 +28,8 @@ Answer page(const Settings& settings, int status, const std::string& title,
 /// The same for a page whose form takes the user away to an application. The
 /// browser would hold every redirect on that way against a list of targets, and
 /// where the application sends the user next is its own affair.
-Answer pageLeadingAway(const Settings& settings, const std::string& title, const std::string& main);
+Answer pageLeadingAway(const Settings& settings, const std::string& title, const std::string& main,
+                       int status = 200);
 
 /// A page that says one thing, with a link to `back`, a path
 /// of ours, if there is a way back.

@@ -5,6 +5,7 @@
 
 #include "service/pages/admin_pages.h"
 #include "service/pages/html.h"
+#include "service/pages/sign_in.h"
 #include "service/protocol/endpoints.h"
 
 namespace keldoauth::service {
@@ -19,6 +20,8 @@ constexpr Route kRoutes[] = {
     {"/oauth/register", registerApplication, tellAsJson},
     {"/oauth/register/", manageRegistration, tellAsJson},
     {"/oauth/revoke", revoke, tellAsJson, "POST"},
+    {"/oauth/sign-in", signInPage, failurePage},
+    {"/oauth/sign-out", signOutPage, failurePage},
     {"/oauth/token", token, tellAsJson, "POST"},
     {"/api/whoami", whoami, tellAsJson},
     {"/admin", admin, failurePage},

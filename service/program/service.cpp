@@ -7,6 +7,7 @@
 
 #include "grants/trouble.h"
 #include "service/http/web_address.h"
+#include "service/people/people.h"
 #include "service/protocol/cors.h"
 
 namespace keldoauth::service {
@@ -68,17 +69,22 @@ Answer Service::answer(const Request& request) try {
 
 Answer answerBy(const Route& route, const Settings& settings, KeptStore& store,
                 const Request& request) try {
+  Request known = request;
+  recognise(settings, known);
   try {
-    Answer answer = attempt(route, settings, store, request);
+    Answer answer = attempt(route, settings, store, known);
     if (!store.wasReplaced()) return answer;
   } catch (const Trouble&) {
     if (!store.wasReplaced()) throw;
   }
   store.drop();
-  return attempt(route, settings, store, request);
+  return attempt(route, settings, store, known);
 } catch (const Trouble& trouble) {
   store.drop();
   return tellTrouble(route, settings, trouble);
+} catch (const DirectoryTrouble& trouble) {
+  std::cerr << "keldoauth-service: " << trouble.what() << '\n';
+  return tellBusy(route, settings);
 } catch (const std::bad_alloc&) {
   store.drop();
   return tellBusy(route, settings);

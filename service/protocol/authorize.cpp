@@ -4,15 +4,13 @@
 #include "service/pages/consent_page.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
+#include "service/pages/sign_in.h"
 #include "service/protocol/authorization_request.h"
 #include "service/protocol/clients.h"
 #include "service/protocol/redirect.h"
-#include "utils/oauth_bounds.h"
 
 namespace keldoauth::service {
 namespace {
-
-constexpr std::size_t kMaxUser = KELDOAUTHSERVER::bounds::kUsername.max;
 
 [[noreturn]] void refuseWithPage(const Settings& settings, int status, const std::string& why) {
   throw Refusal{messagePage(settings, status, "This request cannot be answered", why)};
@@ -76,6 +74,20 @@ grants::CodeRequest codeRequest(const Request& request, const AuthorizationReque
   return code;
 }
 
+/// What came back from our own page; any other form is a request (OpenID Connect
+/// Core, 3.1.2.1).
+bool isDecision(const Request& request, const Parameters& given) {
+  return request.method == "POST" && (given.has("form_token") || given.has("decision"));
+}
+
+/// The form of another site comes without the cookie that says who the user is
+/// (SameSite). As a link it has it.
+Answer askWho(const Settings& settings, const Request& request, const Parameters& given) {
+  const std::string link = safeNext(settings, settings.link("/oauth/authorize?") + request.body);
+  const bool isLinkable = request.method == "POST" && !isDecision(request, given) && !link.empty();
+  return isLinkable ? redirectAnswer(request, link) : signInFirst(settings, request);
+}
+
 /// Faults that the application hears of.
 void requireGood(const Context& context, const Request& request, const Parameters& given,
                  AuthorizationRequest& asked) {
@@ -85,9 +97,7 @@ void requireGood(const Context& context, const Request& request, const Parameter
   if (request.user.empty() && asked.prompt.none) {
     refuse(context, request, asked, "login_required", "Nobody is signed in");
   }
-  if (request.user.empty() || request.user.size() > kMaxUser) {
-    refuseWithPage(context.settings, 403, "The web server does not say who you are.");
-  }
+  if (request.user.empty()) throw Refusal{askWho(context.settings, request, given)};
   const auto fault = grants::Codes::faultOf(codeRequest(request, asked));
   if (fault) refuse(context, request, asked, *fault);
 }
@@ -147,12 +157,6 @@ Answer answerOrAsk(Context& context, const Request& request, const Authorization
   const bool isRoom = refusal.why == grants::Why::kWouldEvict;
   refuse(context, request, asked, isRoom ? "interaction_required" : "consent_required",
          "The user has to be asked");
-}
-
-/// What came back from our own page; any other form is a request (OpenID Connect
-/// Core, 3.1.2.1).
-bool isDecision(const Request& request, const Parameters& given) {
-  return request.method == "POST" && (given.has("form_token") || given.has("decision"));
 }
 
 }  // namespace

@@ -30,6 +30,7 @@ constexpr std::size_t kLeastToken = 32;
 constexpr std::size_t kMostToken = 256;
 constexpr int kMostHours = 8760;
 constexpr char kKeysName[] = "service.keys.json";
+constexpr char kCountersFile[] = "/run/keldoauth/counters";
 
 // Texts -------------------------------------------------------------------------
 
@@ -164,6 +165,10 @@ void readKeysFile(const Json::Value& value, Settings& settings, Faults& faults) 
   settings.keysFile = readPath("keys_file", value, faults);
 }
 
+void readCountersFile(const Json::Value& value, Settings& settings, Faults& faults) {
+  settings.countersFile = value == "" ? "" : readPath("counters_file", value, faults);
+}
+
 constexpr struct {
   std::string_view name;
   void (*read)(const Json::Value& value, Settings& settings, Faults& faults);
@@ -174,7 +179,8 @@ constexpr struct {
              {"sign_in", readSignIn},
              {"htpasswd_file", readHtpasswdFile},
              {"session_hours", readSessionHours},
-             {"keys_file", readKeysFile}};
+             {"keys_file", readKeysFile},
+             {"counters_file", readCountersFile}};
 
 // The file ----------------------------------------------------------------------
 
@@ -212,6 +218,7 @@ Settings parseSettings(const std::string& text, const std::string& path) {
   Settings settings;
   settings.scopes = usualScopes();
   settings.keysFile = besides(path, kKeysName);
+  settings.countersFile = kCountersFile;
   Faults faults;
   readMembers(document, settings, faults);
   if (!document.isMember("issuer")) faults.emplace_back("issuer is missing");

@@ -12,6 +12,8 @@
 //   htpasswd_file         for the last
 //   session_hours         how long a sign-in lasts, 1 to 8760; 12 without it
 //   keys_file             service.keys.json beside this file without it
+//   counters_file         what went wrong how often; /run/keldoauth/counters
+//                         without it, "" counts nothing
 
 #ifndef KELDOAUTH_SERVICE_SETTINGS_SETTINGS_H
 #define KELDOAUTH_SERVICE_SETTINGS_SETTINGS_H
@@ -37,6 +39,7 @@ struct Settings {
   std::string htpasswdFile;
   long long sessionSeconds = 12LL * 60 * 60;
   std::string keysFile;
+  std::string countersFile;  // empty: nothing is counted
   std::string formKey;     // signs the tokens in forms
   std::string sessionKey;  // signs sessions
 

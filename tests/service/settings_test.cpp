@@ -70,7 +70,8 @@ TEST(SettingsTest, TakeEveryKey) {
     "sign_in": "htpasswd",
     "htpasswd_file": "/etc/keldoauth/people",
     "session_hours": 8760,
-    "keys_file": "/etc/keldoauth/keys"
+    "keys_file": "/etc/keldoauth/keys",
+    "counters_file": "/run/box/counters"
   })");
   EXPECT_EQ(settings.issuer, "https://box.example:8443/auth");
   EXPECT_EQ(settings.basePath, "/auth");
@@ -81,6 +82,7 @@ TEST(SettingsTest, TakeEveryKey) {
   EXPECT_EQ(settings.htpasswdFile, "/etc/keldoauth/people");
   EXPECT_EQ(settings.sessionSeconds, 8760LL * 3600);
   EXPECT_EQ(settings.keysFile, "/etc/keldoauth/keys");
+  EXPECT_EQ(settings.countersFile, "/run/box/counters");
 }
 
 TEST(SettingsTest, MakeAddressesBelowTheIssuersPath) {
@@ -92,6 +94,11 @@ TEST(SettingsTest, MakeAddressesBelowTheIssuersPath) {
 TEST(SettingsTest, TakeTheUsersOfTheSystem) {
   EXPECT_EQ(parsed(withIssuer(R"("sign_in": "system")")).signIn, SignIn::kSystem);
   EXPECT_EQ(parsed(withIssuer(R"("sign_in": "web-server")")).signIn, SignIn::kWebServer);
+}
+
+TEST(SettingsTest, CountFailuresUnlessToldNotTo) {
+  EXPECT_EQ(parsed(withIssuer(R"("sign_in": "system")")).countersFile, "/run/keldoauth/counters");
+  EXPECT_EQ(parsed(withIssuer(R"("counters_file": "")")).countersFile, "");
 }
 
 // What is refused -----------------------------------------------------------------
@@ -176,6 +183,7 @@ TEST(SettingsTest, RefuseValuesOfOtherKinds) {
       {"sign_in", {"\"pam\"", "1", "\"\"", "null"}},
       {"session_hours", {"0", "-1", "8761", "1.5", "\"12\"", "9999999999"}},
       {"keys_file", {"\"\"", "\"keys\"", "1", "\"/a\\u0000b\""}},
+      {"counters_file", {"\"counters\"", "1", "null", "\"/a\\u0000b\""}},
       {"htpasswd_file", {"\"people\"", "null"}}};
   for (const auto& [key, values] : kCases) {
     for (const std::string& value : values) {
