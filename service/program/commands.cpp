@@ -18,6 +18,7 @@ constexpr struct {
   Declare declare;
 } kCommands[] = {
     {"check", "Read the settings and say what is wrong with them", declareCheck},
+    {"keys", "Make, show or renew the keys that sign who somebody is", declareKeys},
 };
 
 std::string complaint(const CLI::App& app, const CLI::ParseError& error) {

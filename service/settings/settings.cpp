@@ -31,6 +31,7 @@ constexpr std::size_t kMostToken = 256;
 constexpr int kMostHours = 8760;
 constexpr char kKeysName[] = "service.keys.json";
 constexpr char kCountersFile[] = "/run/keldoauth/counters";
+constexpr char kSigningKeysName[] = "signing.keys.json";
 
 // Texts -------------------------------------------------------------------------
 
@@ -169,6 +170,10 @@ void readCountersFile(const Json::Value& value, Settings& settings, Faults& faul
   settings.countersFile = value == "" ? "" : readPath("counters_file", value, faults);
 }
 
+void readSigningKeysFile(const Json::Value& value, Settings& settings, Faults& faults) {
+  settings.signingKeysFile = readPath("signing_keys_file", value, faults);
+}
+
 constexpr struct {
   std::string_view name;
   void (*read)(const Json::Value& value, Settings& settings, Faults& faults);
@@ -180,7 +185,8 @@ constexpr struct {
              {"htpasswd_file", readHtpasswdFile},
              {"session_hours", readSessionHours},
              {"keys_file", readKeysFile},
-             {"counters_file", readCountersFile}};
+             {"counters_file", readCountersFile},
+             {"signing_keys_file", readSigningKeysFile}};
 
 // The file ----------------------------------------------------------------------
 
@@ -219,6 +225,7 @@ Settings parseSettings(const std::string& text, const std::string& path) {
   settings.scopes = usualScopes();
   settings.keysFile = besides(path, kKeysName);
   settings.countersFile = kCountersFile;
+  settings.signingKeysFile = besides(path, kSigningKeysName);
   Faults faults;
   readMembers(document, settings, faults);
   if (!document.isMember("issuer")) faults.emplace_back("issuer is missing");
@@ -232,12 +239,17 @@ Settings parseSettings(const std::string& text, const std::string& path) {
   return settings;
 }
 
-Settings readSettings(const std::string& path) {
+Settings readSettingsWithoutKeys(const std::string& path) {
   const TextFile file = readTextFile(path, kMaxFile);
   Settings settings = parseSettings(file.text, path);
   if (file.isOpenToAll && !settings.initialAccessToken.empty()) {
     throw SettingsFault({path + ": everybody can read it, and with it initial_access_token"});
   }
+  return settings;
+}
+
+Settings readSettings(const std::string& path) {
+  Settings settings = readSettingsWithoutKeys(path);
   const Keys keys = readKeys(settings.keysFile);
   settings.formKey = keys.form;
   settings.sessionKey = keys.session;

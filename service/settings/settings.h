@@ -14,6 +14,8 @@
 //   keys_file             service.keys.json beside this file without it
 //   counters_file         what went wrong how often; /run/keldoauth/counters
 //                         without it, "" counts nothing
+//   signing_keys_file     signing.keys.json beside this file without it: the keys
+//                         that sign who somebody is (signing/key_file.h)
 
 #ifndef KELDOAUTH_SERVICE_SETTINGS_SETTINGS_H
 #define KELDOAUTH_SERVICE_SETTINGS_SETTINGS_H
@@ -39,9 +41,10 @@ struct Settings {
   std::string htpasswdFile;
   long long sessionSeconds = 12LL * 60 * 60;
   std::string keysFile;
-  std::string countersFile;  // empty: nothing is counted
-  std::string formKey;     // signs the tokens in forms
-  std::string sessionKey;  // signs sessions
+  std::string countersFile;     // empty: nothing is counted
+  std::string signingKeysFile;  // read by who signs alone
+  std::string formKey;          // signs the tokens in forms
+  std::string sessionKey;       // signs sessions
 
   /// The whole address of `path`, for other programs.
   [[nodiscard]] std::string endpoint(const std::string& path) const { return issuer + path; }
@@ -64,6 +67,9 @@ class SettingsFault : public std::runtime_error {
 /// The settings but for the keys. `path` is where the text comes from. Throws
 /// SettingsFault.
 Settings parseSettings(const std::string& text, const std::string& path);
+
+/// The same for a file. Throws SettingsFault.
+Settings readSettingsWithoutKeys(const std::string& path);
 
 /// The settings with the keys. Throws SettingsFault.
 Settings readSettings(const std::string& path);

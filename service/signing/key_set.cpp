@@ -87,12 +87,16 @@ void KeySet::takeBackTheFuture(Algorithm algorithm, Time now) {
   }
 }
 
-void KeySet::rotate(Time now) {
+void KeySet::forget(Time now) {
   std::vector<DatedKey> kept;
   for (std::size_t i = 0; i < keys_.size(); ++i) {
     if (stateOf(i, now) != State::kOver) kept.push_back(keys_[i]);
   }
   keys_ = std::move(kept);
+}
+
+void KeySet::rotate(Time now) {
+  forget(now);
   for (const Algorithm algorithm : kAlgorithms) {
     takeBackTheFuture(algorithm, now);
     const std::size_t successor = currentOf(algorithm, now) + 1;

@@ -74,9 +74,12 @@ class KeySet {
   /// The JWK set for everybody: next, current and previous.
   [[nodiscard]] Json::Value publicSet(Time now) const;
 
-  /// Makes a next key where there is none, removes what is over. Calling it
+  /// Makes a next key where there is none, and removes what is over. Calling it
   /// twice rotates once. Throws KeyFault without random numbers.
   void rotate(Time now);
+
+  /// Only removes what is over.
+  void forget(Time now);
 
   /// For a key that has become known to others: fresh ones sign at once, and
   /// nothing that the old ones signed is good any more.

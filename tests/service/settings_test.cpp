@@ -57,6 +57,7 @@ TEST(SettingsTest, NeedNothingButAnIssuer) {
   EXPECT_EQ(settings.signIn, SignIn::kWebServer);
   EXPECT_EQ(settings.sessionSeconds, 12 * 3600);
   EXPECT_EQ(settings.keysFile, kKeysPath);
+  EXPECT_EQ(settings.signingKeysFile, "/tmp/signing.keys.json");
   EXPECT_EQ(settings.scopes.known("profile files.read"), "profile");
 }
 
@@ -71,12 +72,14 @@ TEST(SettingsTest, TakeEveryKey) {
     "htpasswd_file": "/etc/keldoauth/people",
     "session_hours": 8760,
     "keys_file": "/etc/keldoauth/keys",
-    "counters_file": "/run/box/counters"
+    "counters_file": "/run/box/counters",
+    "signing_keys_file": "/etc/keldoauth/signing"
   })");
   EXPECT_EQ(settings.issuer, "https://box.example:8443/auth");
   EXPECT_EQ(settings.basePath, "/auth");
   EXPECT_THAT(settings.administrators, ElementsAre("admin", "o'neil", "zoë"));
   EXPECT_EQ(settings.scopes.inWords("music.write"), "Change your “music”");
+  EXPECT_EQ(settings.signingKeysFile, "/etc/keldoauth/signing");
   EXPECT_EQ(settings.initialAccessToken, "0123456789abcdef0123456789ABCDEF");
   EXPECT_EQ(settings.signIn, SignIn::kHtpasswd);
   EXPECT_EQ(settings.htpasswdFile, "/etc/keldoauth/people");

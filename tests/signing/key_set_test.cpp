@@ -66,6 +66,16 @@ TEST_F(KeySetTest, NextRotationRemovesWhatIsOver) {
   EXPECT_THAT(states(kStart + kAhead + kAfter), ElementsAre(State::kCurrent, State::kNext));
 }
 
+TEST_F(KeySetTest, ForgettingRemovesWhatIsOverAndMakesNothing) {
+  const std::string old = signer(kStart);
+  set_.rotate(kStart);
+  set_.forget(kStart + kAhead + kAfter - 1);
+  EXPECT_NE(set_.find(old), nullptr);
+  set_.forget(kStart + kAhead + kAfter);
+  EXPECT_EQ(set_.find(old), nullptr);
+  EXPECT_THAT(states(kStart + kAhead + kAfter), ElementsAre(State::kCurrent));
+}
+
 TEST_F(KeySetTest, RotationsInARowAreOne) {
   set_.rotate(kStart);
   const std::string once = set_.text();

@@ -20,6 +20,7 @@ using Run = std::function<int(const std::string& settingsPath)>;
 using Declare = Run (*)(CLI::App& command);
 
 Run declareCheck(CLI::App& command);
+Run declareKeys(CLI::App& command);
 
 }  // namespace keldoauth::service
 
