@@ -1,11 +1,13 @@
 #include "service/signing/key_file.h"
 
 #include <sys/file.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <cstdint>
+#include <optional>
 
 #include "service/signing/base64url.h"
 #include "service/signing/key_fault.h"
@@ -67,24 +69,11 @@ class LockedFile {
 
 }  // namespace
 
-bool KeyFile::Stamp::operator==(const Stamp& other) const {
-  return device == other.device && inode == other.inode && changed.tv_sec == other.changed.tv_sec &&
-         changed.tv_nsec == other.changed.tv_nsec;
-}
-
-bool KeyFile::isCurrent() const {
-  struct stat status {};
-  return keys_.has_value() && lstat(path_.c_str(), &status) == 0 && Stamp(status) == stamp_;
-}
-
-const KeySet& KeyFile::keys() {
-  if (isCurrent()) return *keys_;
+KeySet KeyFile::read() const {
   const Descriptor file(openPrivate(path_));
   if (!file.isOpen()) failByErrno(path_);
-  const Stamp stamp(checkedStatus(path_, file));
-  keys_ = readKeys(path_, file);
-  stamp_ = stamp;
-  return *keys_;
+  checkedStatus(path_, file);
+  return readKeys(path_, file);
 }
 
 void KeyFile::create(const KeySet& keys, const Access& access) const {

@@ -3,11 +3,11 @@
 #ifndef KELDOAUTH_SERVICE_SIGNING_KEY_FILE_H
 #define KELDOAUTH_SERVICE_SIGNING_KEY_FILE_H
 
-#include <sys/stat.h>
+#include <sys/types.h>
 
 #include <functional>
-#include <optional>
 #include <string>
+#include <utility>
 
 #include "service/signing/key_set.h"
 
@@ -30,10 +30,7 @@ class KeyFile {
  public:
   explicit KeyFile(std::string path) : path_(std::move(path)) {}
 
-  /// Read at the first call, and again when another file has taken the place of
-  /// the one that was read or that one has changed. The reference is good until
-  /// the next call.
-  const KeySet& keys();
+  [[nodiscard]] KeySet read() const;
 
   /// Never overwrites: a file, link or whatever else of that name is left alone,
   /// and the call fails.
@@ -45,23 +42,7 @@ class KeyFile {
   void update(const std::function<void(KeySet&)>& change) const;
 
  private:
-  /// Tells one state of one file from all others.
-  struct Stamp {
-    dev_t device = 0;
-    ino_t inode = 0;
-    timespec changed{};
-
-    Stamp() = default;
-    explicit Stamp(const struct stat& status)
-        : device(status.st_dev), inode(status.st_ino), changed(status.st_ctim) {}
-    bool operator==(const Stamp& other) const;
-  };
-
-  [[nodiscard]] bool isCurrent() const;
-
   std::string path_;
-  std::optional<KeySet> keys_;
-  Stamp stamp_;
 };
 
 }  // namespace keldoauth::service::signing

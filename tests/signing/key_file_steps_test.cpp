@@ -49,7 +49,7 @@ class StepsTest : public SigningTest {
     return WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL;
   }
 
-  static std::string textInFile() { return KeyFile(kPath).keys().text(); }
+  static std::string textInFile() { return KeyFile(kPath).read().text(); }
 
   KeySet changed_ = anySet();
 };

@@ -48,7 +48,7 @@ signing::Access accessLike(const std::string& path) {
 }
 
 int show(const Settings& settings) {
-  print(KeyFile(settings.signingKeysFile).keys());
+  print(KeyFile(settings.signingKeysFile).read());
   return kDone;
 }
 
@@ -65,7 +65,7 @@ struct Rotation {
 };
 
 int rotate(const Settings& settings, const Rotation& wanted) {
-  KeyFile file(settings.signingKeysFile);
+  const KeyFile file(settings.signingKeysFile);
   file.update([&](KeySet& keys) {
     const signing::Time now = std::time(nullptr);
     if (wanted.isAtOnce) {
@@ -76,7 +76,7 @@ int rotate(const Settings& settings, const Rotation& wanted) {
       keys.forget(now);
     }
   });
-  print(file.keys());
+  print(file.read());
   return kDone;
 }
 
