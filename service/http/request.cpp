@@ -77,6 +77,16 @@ std::vector<std::string> Parameters::values(std::string_view name) const {
   return values;
 }
 
+std::string Parameters::textWithout(std::initializer_list<std::string_view> names) const {
+  std::string text;
+  for (const auto& [key, value] : pairs_) {
+    if (std::find(names.begin(), names.end(), key) != names.end()) continue;
+    if (!text.empty()) text += '&';
+    text += percentEncode(key) + "=" + percentEncode(value);
+  }
+  return text;
+}
+
 bool Parameters::isDoubled(std::string_view name) const {
   return std::count_if(pairs_.begin(), pairs_.end(),
                        [&](const auto& pair) { return pair.first == name; }) > 1;

@@ -32,6 +32,9 @@ class Parameters {
   /// Of a parameter that may occur several times; without those that are empty.
   [[nodiscard]] std::vector<std::string> values(std::string_view name) const;
 
+  /// All of them once more as a query or a form, but for `names`.
+  [[nodiscard]] std::string textWithout(std::initializer_list<std::string_view> names) const;
+
   [[nodiscard]] bool isDoubled(std::string_view name) const;
   [[nodiscard]] bool isAnyDoubled(std::initializer_list<std::string_view> names) const;
 

@@ -16,12 +16,14 @@ std::string hidden(const char* name, const std::string& value) {
 /// The request once more, to come back with the decision.
 std::string hiddenRequest(const Settings& settings, const std::string& user,
                           const AuthorizationRequest& asked) {
-  return hidden("client_id", asked.client.identifier.text()) +
-         hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
+  const std::string start = hidden("client_id", asked.client.identifier.text()) +
+                            hidden("form_token", formToken(settings, user, formSubject(asked)));
+  const std::string& pushed = asked.pushed.text();
+  if (!pushed.empty()) return start + hidden("request_uri", std::string(kReferenceStart) + pushed);
+  return start + hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
          hidden("response_type", "code") + hidden("scope", asked.scope) +
          hidden("state", asked.state) + hidden("code_challenge", asked.challenge) +
-         hidden("code_challenge_method", asked.challenge.empty() ? "" : "S256") +
-         hidden("form_token", formToken(settings, user, formSubject(asked)));
+         hidden("code_challenge_method", asked.challenge.empty() ? "" : "S256");
 }
 
 std::string scopeItems(const Settings& settings, const std::string& scope) {
@@ -55,7 +57,7 @@ administrator of the box can take the access back at any time.</p>
 std::string formSubject(const AuthorizationRequest& asked) {
   std::string subject = "consent";
   for (const std::string& part : {asked.client.identifier.text(), asked.redirect, asked.scope,
-                                  asked.state, asked.challenge}) {
+                                  asked.state, asked.challenge, asked.pushed.text()}) {
     subject += "." + base64Url(part);
   }
   return subject;

@@ -17,6 +17,7 @@ constexpr Route kRoutes[] = {
     {"/.well-known/oauth-authorization-server", metadata, tellAsJson, "GET, HEAD"},
     {"/oauth/authorize", authorize, failurePage},
     {"/oauth/introspect", introspect, tellAsJson},
+    {"/oauth/par", pushRequest, tellAsJson, "POST"},
     {"/oauth/register", registerApplication, tellAsJson},
     {"/oauth/register/", manageRegistration, tellAsJson},
     {"/oauth/revoke", revoke, tellAsJson, "POST"},

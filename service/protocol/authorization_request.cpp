@@ -1,7 +1,5 @@
 #include "service/protocol/authorization_request.h"
 
-#include <string_view>
-
 #include "service/http/encoding.h"
 #include "service/protocol/redirect.h"
 #include "service/settings/scopes.h"

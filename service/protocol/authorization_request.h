@@ -7,6 +7,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "service/protocol/clients.h"
 #include "service/settings/settings.h"
@@ -33,7 +34,11 @@ struct AuthorizationRequest {
   std::string state = {};
   std::string challenge = {};  // empty: none
   Prompt prompt = {};
+  grants::RequestReference pushed = {};  // empty: it came with the user's browser
 };
+
+/// How a reference to a pushed request begins (RFC 9126, 2.2).
+inline constexpr std::string_view kReferenceStart = "urn:ietf:params:oauth:request_uri:";
 
 /// What the application hears of a fault: the code of its standard, and why, in
 /// the characters of an error_description.

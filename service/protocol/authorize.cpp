@@ -43,10 +43,8 @@ std::string addressWith(const Settings& settings, const AuthorizationRequest& as
   refuse(context, request, asked, grants::codeText(refusal.error), why);
 }
 
-/// Until client and address are known to belong together, nobody is redirected
-/// anywhere.
-AuthorizationRequest readClient(Context& context, const Parameters& given) {
-  if (given.isAnyDoubled({"client_id", "redirect_uri"})) {
+grants::Application findClient(Context& context, const Parameters& given) {
+  if (given.isAnyDoubled({"client_id", "redirect_uri", "request_uri"})) {
     refuseWithPage(context.settings, 400, "The application or its address is named twice.");
   }
   const auto client =
@@ -58,7 +56,37 @@ AuthorizationRequest readClient(Context& context, const Parameters& given) {
     refuseWithPage(context.settings, 403,
                    "The administrator of this box has disabled this application.");
   }
-  const AuthorizationRequest asked = startOf(*client, given);
+  return *client;
+}
+
+/// What was pushed counts, and nothing that stands beside the reference.
+Parameters openPushed(Context& context, const grants::Application& client,
+                      const grants::RequestReference& reference) {
+  const auto text = context.store.open().pushed.open(client.identifier, reference);
+  const std::optional<Parameters> pushed =
+      text ? Parameters::parse(text->text()) : std::optional<Parameters>();
+  if (!pushed) {
+    refuseWithPage(context.settings, 400,
+                   "This request is too old, or it was used before. "
+                   "Go back to the application and start again.");
+  }
+  return *pushed;
+}
+
+grants::RequestReference referenceIn(const Parameters& given) {
+  const std::string uri = given.value("request_uri");
+  if (uri.rfind(kReferenceStart, 0) != 0) return {};
+  return grants::RequestReference(uri.substr(kReferenceStart.size()));
+}
+
+/// Until client and address are known to belong together, nobody is redirected
+/// anywhere. `given` becomes what was pushed.
+AuthorizationRequest readClient(Context& context, Parameters& given) {
+  const grants::Application client = findClient(context, given);
+  const grants::RequestReference reference = referenceIn(given);
+  if (!reference.text().empty()) given = openPushed(context, client, reference);
+  AuthorizationRequest asked = startOf(client, given);
+  asked.pushed = reference;
   const std::string fault = faultOfAddress(asked);
   if (!fault.empty()) refuseWithPage(context.settings, 400, fault);
   return asked;
@@ -71,6 +99,7 @@ grants::CodeRequest codeRequest(const Request& request, const AuthorizationReque
       asked.redirectWasGiven ? grants::AddressNamed::kInRequest : grants::AddressNamed::kImplied;
   if (!asked.challenge.empty()) code.pkce = grants::Pkce{grants::Challenge(asked.challenge)};
   code.from = peerAddress(request);
+  if (!asked.pushed.text().empty()) code.pushed = asked.pushed;
   return code;
 }
 
@@ -168,8 +197,9 @@ Answer authorize(Context& context, const Request& request) {
   const std::optional<Parameters> given = Parameters::parse(isPost ? request.body : request.query);
   if (!given) refuseWithPage(context.settings, 400, "The request cannot be read.");
 
-  AuthorizationRequest asked = readClient(context, *given);
-  requireGood(context, request, *given, asked);
+  Parameters question = *given;
+  AuthorizationRequest asked = readClient(context, question);
+  requireGood(context, request, question, asked);
   return isDecision(request, *given) ? decide(context, request, *given, asked)
                                      : answerOrAsk(context, request, asked);
 }

@@ -23,6 +23,10 @@ Answer manageRegistration(Context& context, const Request& request);
 /// 9207).
 Answer authorize(Context& context, const Request& request);
 
+/// Keeps an authorization request for a minute, so that the user's browser has
+/// only a reference to bring (RFC 9126).
+Answer pushRequest(Context& context, const Request& request);
+
 /// Turns a code, a refresh token or a client's own credentials into an access
 /// token (RFC 6749, 4.1.3, 4.4.2 and 6).
 Answer token(Context& context, const Request& request);

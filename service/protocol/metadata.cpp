@@ -22,6 +22,8 @@ Answer metadata(Context& context, const Request& request) {
   document["token_endpoint"] = own.endpoint("/oauth/token");
   document["registration_endpoint"] = own.endpoint("/oauth/register");
   document["introspection_endpoint"] = own.endpoint("/oauth/introspect");
+  document["pushed_authorization_request_endpoint"] = own.endpoint("/oauth/par");
+  document["require_pushed_authorization_requests"] = false;
   document["revocation_endpoint"] = own.endpoint("/oauth/revoke");
   document["response_types_supported"] = list({"code"});
   document["response_modes_supported"] = list({"query"});

@@ -22,7 +22,7 @@ from requests_oauthlib import OAuth2Session as RequestsSession
 import service
 from service import CALLBACK, ISSUER, consent, record
 
-WELL_KNOWN = ISSUER + "/.well-known/oauth-authorization-server"
+WELL_KNOWN = service.well_known("oauth-authorization-server")
 
 
 def metadata():

@@ -17,6 +17,7 @@ import subprocess
 import urllib.parse
 
 ISSUER = os.environ["SERVICE_ISSUER"]
+BASE = urllib.parse.urlsplit(ISSUER).path
 INITIAL_TOKEN = os.environ["SERVICE_INITIAL_TOKEN"]
 USERS = dict(pair.split(":", 1) for pair in os.environ["SERVICE_USERS"].split())
 RUN = os.environ["SERVICE_RUN"]
@@ -93,7 +94,7 @@ def variables(method, path, body, headers):
     """What a web server says of a request (RFC 3875)."""
     path, _, query = path.partition("?")
     authorization = headers.get("Authorization", "")
-    said = {"GATEWAY_INTERFACE": "CGI/1.1", "SCRIPT_NAME": path, "QUERY_STRING": query,
+    said = {"GATEWAY_INTERFACE": "CGI/1.1", "SCRIPT_NAME": BASE + path, "QUERY_STRING": query,
             "REQUEST_METHOD": method, "CONTENT_LENGTH": str(len(body)),
             "CONTENT_TYPE": headers.get("Content-Type", ""), "REMOTE_ADDR": "127.0.0.1",
             "HTTP_AUTHORIZATION": authorization}
@@ -122,13 +123,20 @@ def run(method, path, body, headers):
     return Answer(status, http.client.parse_headers(output), output.read())
 
 
+def well_known(name):
+    """The address that is made of the issuer's by RFC 8414, 3.1."""
+    return ISSUER.removesuffix(BASE) + "/.well-known/" + name + BASE
+
+
 def send(method, path, body=None, headers=None):
-    """One request on a connection of its own; redirects are not followed."""
+    """One request on a connection of its own; redirects are not followed. The path
+    is below the issuer's, or a whole address."""
     if _moment:
         return run(method, path, body, headers or {})
     if _carrier:
         return _carrier(method, path, body, headers or {})
     where = urllib.parse.urlsplit(ISSUER)
+    path = path.removeprefix(f"http://{where.netloc}") if path[0] != "/" else BASE + path
     connection = http.client.HTTPConnection(where.hostname, where.port, timeout=60)
     try:
         try:
