@@ -18,8 +18,9 @@ std::string hiddenRequest(const Settings& settings, const std::string& user,
                           const AuthorizationRequest& asked) {
   const std::string start = hidden("client_id", asked.client.identifier.text()) +
                             hidden("form_token", formToken(settings, user, formSubject(asked)));
-  const std::string& pushed = asked.pushed.text();
-  if (!pushed.empty()) return start + hidden("request_uri", std::string(kReferenceStart) + pushed);
+  if (asked.pushed) {
+    return start + hidden("request_uri", std::string(kReferenceStart) + asked.pushed->text());
+  }
   return start + hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
          hidden("response_type", "code") + hidden("scope", asked.scope) +
          hidden("state", asked.state) + hidden("code_challenge", asked.challenge) +
@@ -56,8 +57,9 @@ administrator of the box can take the access back at any time.</p>
 
 std::string formSubject(const AuthorizationRequest& asked) {
   std::string subject = "consent";
-  for (const std::string& part : {asked.client.identifier.text(), asked.redirect, asked.scope,
-                                  asked.state, asked.challenge, asked.pushed.text()}) {
+  for (const std::string& part :
+       {asked.client.identifier.text(), asked.redirect, asked.scope, asked.state, asked.challenge,
+        asked.pushed ? asked.pushed->text() : std::string()}) {
     subject += "." + base64Url(part);
   }
   return subject;

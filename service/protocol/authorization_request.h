@@ -34,7 +34,7 @@ struct AuthorizationRequest {
   std::string state = {};
   std::string challenge = {};  // empty: none
   Prompt prompt = {};
-  grants::RequestReference pushed = {};  // empty: it came with the user's browser
+  std::optional<grants::RequestReference> pushed = {};  // none: it came with the browser
 };
 
 /// How a reference to a pushed request begins (RFC 9126, 2.2).

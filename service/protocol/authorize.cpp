@@ -73,7 +73,7 @@ Parameters openPushed(Context& context, const grants::Application& client,
   return *pushed;
 }
 
-grants::RequestReference referenceIn(const Parameters& given) {
+std::optional<grants::RequestReference> referenceIn(const Parameters& given) {
   const std::string uri = given.value("request_uri");
   if (uri.rfind(kReferenceStart, 0) != 0) return {};
   return grants::RequestReference(uri.substr(kReferenceStart.size()));
@@ -83,8 +83,8 @@ grants::RequestReference referenceIn(const Parameters& given) {
 /// anywhere. `given` becomes what was pushed.
 AuthorizationRequest readClient(Context& context, Parameters& given) {
   const grants::Application client = findClient(context, given);
-  const grants::RequestReference reference = referenceIn(given);
-  if (!reference.text().empty()) given = openPushed(context, client, reference);
+  const auto reference = referenceIn(given);
+  if (reference) given = openPushed(context, client, *reference);
   AuthorizationRequest asked = startOf(client, given);
   asked.pushed = reference;
   const std::string fault = faultOfAddress(asked);
@@ -99,7 +99,7 @@ grants::CodeRequest codeRequest(const Request& request, const AuthorizationReque
       asked.redirectWasGiven ? grants::AddressNamed::kInRequest : grants::AddressNamed::kImplied;
   if (!asked.challenge.empty()) code.pkce = grants::Pkce{grants::Challenge(asked.challenge)};
   code.from = peerAddress(request);
-  if (!asked.pushed.text().empty()) code.pushed = asked.pushed;
+  code.pushed = asked.pushed;
   return code;
 }
 

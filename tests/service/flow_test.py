@@ -1,5 +1,6 @@
 """The service does what its standards say when everybody behaves."""
 
+import json
 import sqlite3
 import time
 import unittest
@@ -29,6 +30,108 @@ class Metadata(unittest.TestCase):
             answer = send("DELETE", address[len(service.ISSUER):], headers=service.as_user("alice"))
             self.assertEqual(answer.status, 405, address)
             self.assertTrue(answer.headers["Allow"])
+
+
+class OtherOrigins(unittest.TestCase):
+    """Scripts in other pages (CORS)."""
+
+    ORIGIN = {"Origin": "https://script.example"}
+    PREFLIGHT = {**ORIGIN, "Access-Control-Request-Method": "POST",
+                 "Access-Control-Request-Headers": "authorization"}
+
+    def test_may_read_what_needs_no_login_of_the_browser(self):
+        for method, path in (("GET", "/.well-known/oauth-authorization-server"),
+                             ("POST", "/oauth/token"), ("POST", "/oauth/revoke"),
+                             ("POST", "/oauth/par")):
+            answer = send(method, path, "", {**service.FORM, **self.ORIGIN})
+            self.assertEqual(answer.headers["Access-Control-Allow-Origin"], "*", path)
+            self.assertIsNone(answer.headers["Access-Control-Allow-Credentials"])
+            self.assertEqual(answer.status, 200 if method == "GET" else 401)
+
+    def test_are_told_so_beforehand(self):
+        for path in ("/oauth/token", "/oauth/revoke", "/oauth/par"):
+            answer = send("OPTIONS", path, headers=self.PREFLIGHT)
+            self.assertEqual((answer.status, answer.body), (204, b""))
+            self.assertEqual(answer.headers["Access-Control-Allow-Origin"], "*")
+            self.assertEqual(answer.headers["Access-Control-Allow-Methods"], "POST")
+            self.assertIn("Authorization", answer.headers["Access-Control-Allow-Headers"])
+
+    def test_may_read_nothing_else(self):
+        for path in ("/oauth/authorize", "/admin", "/oauth/register", "/oauth/introspect",
+                     "/oauth/register/" + "x" * 64, "/api/whoami", "/nowhere"):
+            for method in ("GET", "POST", "OPTIONS"):
+                answer = send(method, path, None, {**self.PREFLIGHT, **service.as_user("admin")})
+                self.assertIsNone(answer.headers["Access-Control-Allow-Origin"], (method, path))
+
+
+class PublicClient(unittest.TestCase):
+    """A native application: no secret, and a port of its system's choice."""
+
+    @classmethod
+    def setUpClass(cls):
+        cls.client = register(token_endpoint_auth_method="none",
+                              redirect_uris=["http://127.0.0.1/cb", "com.example.app:/cb"])
+
+    def test_logs_in_on_any_port_and_by_its_scheme(self):
+        for address in ("http://127.0.0.1:51004/cb", "http://127.0.0.1:51005/cb",
+                        "com.example.app:/cb"):
+            self.client.redirect = address
+            code, verifier = self.client.log_in()
+            answer = self.client.redeem(code, verifier)
+            self.assertEqual(answer.status, 200, answer.text)
+            self.assertEqual(whoami(answer.json["access_token"]).json["sub"], "alice")
+            answer = self.client.refresh(answer.json["refresh_token"])
+            self.assertEqual(answer.status, 200, answer.text)
+            self.assertEqual(self.client.post("revoke", token=answer.json["access_token"]).status,
+                             200)
+
+    def test_is_asked_about_each_time(self):
+        self.client.redirect = "http://127.0.0.1:51004/cb"
+        self.client.tokens()
+        self.assertEqual(self.client.ask(challenge_of("v" * 43), prompt=None).status, 200)
+
+
+class Remembered(unittest.TestCase):
+    def test_what_was_agreed_to_is_not_asked_again(self):
+        client = register()
+        client.tokens(scope="profile")
+        answer = client.ask(challenge_of("v" * 43), prompt=None)
+        self.assertEqual(answer.status, 302)
+        self.assertEqual(client.redeem(answer.returned["code"], "v" * 43).status, 200)
+        answer = client.ask(challenge_of("v" * 43), prompt=None, scope="profile files.read")
+        self.assertEqual(answer.status, 200)
+
+
+class Pushed(unittest.TestCase):
+    def test_request_that_was_pushed_logs_in_once(self):
+        client, verifier = register(), "v" * 43
+        answer = client.post("par", **client.question(challenge_of(verifier)))
+        self.assertEqual((answer.status, answer.json["expires_in"]), (201, 60))
+        question = service.encode({"client_id": client.id,
+                                   "request_uri": answer.json["request_uri"]})
+        page = send("GET", "/oauth/authorize?" + question, headers=service.as_user("alice"))
+        self.assertEqual(page.status, 200)
+        code = client.decide(page).returned["code"]
+        self.assertEqual(client.redeem(code, verifier).status, 200)
+        page = send("GET", "/oauth/authorize?" + question, headers=service.as_user("alice"))
+        self.assertEqual((page.status, page.location), (400, None))
+
+
+class Managing(unittest.TestCase):
+    def test_client_reads_replaces_and_removes_itself(self):
+        made = service.register_raw({"redirect_uris": [CALLBACK]}).json
+        address, token = made["registration_client_uri"], made["registration_access_token"]
+        self.assertTrue(address.startswith(service.ISSUER + "/"))
+        headers = {"Content-Type": "application/json", **service.bearer(token)}
+        read = send("GET", address, headers=headers)
+        self.assertEqual((read.status, read.json["client_secret"]), (200, made["client_secret"]))
+        changed = send("PUT", address, json.dumps({
+            "client_id": made["client_id"], "redirect_uris": ["https://new.example/cb"]}), headers)
+        self.assertEqual((changed.status, changed.json["redirect_uris"]),
+                         (200, ["https://new.example/cb"]))
+        gone = send("DELETE", address, headers=headers)
+        self.assertEqual((gone.status, gone.body), (204, b""))
+        self.assertEqual(send("GET", address, headers=headers).status, 401)
 
 
 class Registration(unittest.TestCase):

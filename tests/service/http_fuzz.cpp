@@ -41,15 +41,17 @@ void expectEncodings(const std::string& text) {
 }
 
 void expectAddress(const std::string& text) {
-  if (!service::isRedirectAddress(text)) return;
-  expect(text.find_first_of(" \r\n#") == std::string::npos, "one line, no fragment", text);
-  const std::string rest = text.substr(text.find("://") + 3);
+  constexpr auto kPublic = service::grants::ApplicationKind::kPublic;
+  if (!service::isRedirectAddress(text, kPublic)) return;
+  expect(text.find_first_of(" \r\n#\\") == std::string::npos, "one line, no fragment", text);
+  const bool isPrivate = service::formOf(text) == service::AddressForm::kPrivateUse;
+  const std::string rest = isPrivate ? text : text.substr(text.find("://") + 3);
   for (const std::string& entry : {text, rest}) {
     const service::Addresses registered{service::grants::RedirectAddress(entry)};
-    expect(service::isRegistered(text, registered), "equal to itself", text);
-    expect(!service::isRegistered(text + "x", registered), "exactly", text);
-    const std::string only = service::onlyAddress(registered);
-    expect(only.empty() || service::isRegistered(only, registered), "the default", text);
+    expect(service::isRegistered(text, registered, kPublic), "equal to itself", text);
+    expect(!service::isRegistered(text + "x", registered, kPublic), "exactly", text);
+    const std::string only = service::onlyAddress(registered, kPublic);
+    expect(only.empty() || service::isRegistered(only, registered, kPublic), "the default", text);
   }
   expect(text.rfind(service::originOf(text), 0) == 0, "origin", text);
 }

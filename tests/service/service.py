@@ -218,7 +218,11 @@ class Client:
         return answer.returned["code"], verifier
 
     def post(self, endpoint, **parameters):
-        headers = {**FORM, **basic(*map(urllib.parse.quote_plus, (self.id, self.secret)))}
+        headers = FORM
+        if self.secret:
+            headers = {**FORM, **basic(*map(urllib.parse.quote_plus, (self.id, self.secret)))}
+        else:
+            parameters = {"client_id": self.id, **parameters}
         return send("POST", "/oauth/" + endpoint, encode(parameters), headers)
 
     def redeem(self, code, verifier, **changes):
@@ -253,9 +257,11 @@ def register(**metadata):
     answer = register_raw(metadata)
     assert answer.status == 201, (answer.status, answer.text)
     made = answer.json
-    SEEN_SECRETS.add(made["client_secret"])
+    SEEN_SECRETS.add(made["registration_access_token"])
+    if "client_secret" in made:
+        SEEN_SECRETS.add(made["client_secret"])
     redirects = metadata["redirect_uris"]
-    return Client(made["client_id"], made["client_secret"], redirects[0] if redirects else None)
+    return Client(made["client_id"], made.get("client_secret"), redirects[0] if redirects else None)
 
 
 def whoami(token):
