@@ -117,10 +117,11 @@ Answer askWho(const Settings& settings, const Request& request, const Parameters
   return isLinkable ? redirectAnswer(request, link) : signInFirst(settings, request);
 }
 
-/// Faults that the application hears of.
+/// Faults that the application hears of. `question` is the request, `given` what
+/// the browser brought.
 void requireGood(const Context& context, const Request& request, const Parameters& given,
-                 AuthorizationRequest& asked) {
-  if (const auto fault = readRest(context.settings, given, asked)) {
+                 const Parameters& question, AuthorizationRequest& asked) {
+  if (const auto fault = readRest(context.settings, question, asked)) {
     refuse(context, request, asked, fault->error, fault->why);
   }
   if (request.user.empty() && asked.prompt.none) {
@@ -199,7 +200,7 @@ Answer authorize(Context& context, const Request& request) {
 
   Parameters question = *given;
   AuthorizationRequest asked = readClient(context, question);
-  requireGood(context, request, question, asked);
+  requireGood(context, request, *given, question, asked);
   return isDecision(request, *given) ? decide(context, request, *given, asked)
                                      : answerOrAsk(context, request, asked);
 }
