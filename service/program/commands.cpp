@@ -17,6 +17,7 @@ constexpr struct {
   const char* summary;
   Declare declare;
 } kCommands[] = {
+    {"setup", "Make the settings and the keys, and switch the service on", declareSetup},
     {"check", "Read the settings and say what is wrong with them", declareCheck},
     {"keys", "Make, show or renew the keys that sign who somebody is", declareKeys},
 };

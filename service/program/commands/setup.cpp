@@ -1,0 +1,181 @@
+#include <json/writer.h>
+#include <pwd.h>
+#include <spawn.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <CLI/App.hpp>
+#include <cerrno>
+#include <cstring>
+#include <iostream>
+#include <memory>
+#include <stdexcept>
+#include <vector>
+
+#include "service/program/commands/command.h"
+#include "service/settings/keys.h"
+#include "service/settings/private_text.h"
+#include "service/settings/settings.h"
+
+namespace keldoauth::service {
+namespace {
+
+constexpr char kSwitchOn[] = "/usr/sbin/lighttpd-enable-mod";
+constexpr char kServices[] = "/usr/sbin/service";
+constexpr int kSwitchedOnBefore = 2;  // of lighttpd-enable-mod
+
+struct Wishes {
+  std::string issuer;
+  std::vector<std::string> administrators;
+  std::string signIn = "system";
+  std::string htpasswdFile;
+  std::string webServer = "lighttpd";
+};
+
+std::string folderOf(const std::string& path) {
+  const std::size_t slash = path.rfind('/');
+  return slash == std::string::npos ? "." : path.substr(0, slash);
+}
+
+bool isThere(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) == 0;
+}
+
+// Files -------------------------------------------------------------------------
+
+/// The folder's group is the service's: what it has to read, that group can.
+void shareWithFolder(const std::string& path) {
+  struct stat folder {};
+  const bool shared = stat(folderOf(path).c_str(), &folder) == 0 &&
+                      lchown(path.c_str(), static_cast<uid_t>(-1), folder.st_gid) == 0 &&
+                      chmod(path.c_str(), S_IRUSR | S_IWUSR | S_IRGRP) == 0;
+  if (!shared) throw SettingsFault({path + ": " + std::strerror(errno)});
+}
+
+std::string quoted(const std::string& text) {
+  return Json::valueToQuotedString(text.c_str());
+}
+
+/// Laid out for the owner, who will edit it.
+std::string settingsText(const Wishes& wishes) {
+  std::string administrators;
+  for (const std::string& name : wishes.administrators) {
+    administrators += (administrators.empty() ? "" : ", ") + quoted(name);
+  }
+  std::string text = "{\n  \"issuer\": " + quoted(wishes.issuer) + ",\n  \"administrators\": [" +
+                     administrators + "],\n  \"sign_in\": " + quoted(wishes.signIn) + ",\n";
+  if (!wishes.htpasswdFile.empty()) {
+    text += "  \"htpasswd_file\": " + quoted(wishes.htpasswdFile) + ",\n";
+  }
+  return text + R"(  "scopes": {
+    "openid": "Know who you are on this box",
+    "profile": "See your user name on this box"
+  }
+}
+)";
+}
+
+// Checks ------------------------------------------------------------------------
+
+/// Throws SettingsFault. Nothing has been made yet.
+void checkWishes(const Wishes& wishes, const std::string& text, const std::string& path) {
+  parseSettings(text, path);
+  if (isThere(path)) {
+    throw SettingsFault({path + " is there already: edit it, and ask keldoauth-service check"});
+  }
+  if (wishes.signIn != "system") return;
+  for (const std::string& name : wishes.administrators) {
+    if (getpwnam(name.c_str()) == nullptr) {
+      throw SettingsFault({name + " is no user of this box; --sign-in htpasswd knows others"});
+    }
+  }
+}
+
+// The web server ----------------------------------------------------------------
+
+/// The exit status; -1 when it could not be started.
+int run(std::vector<std::string> words) {
+  std::vector<char*> arguments;
+  arguments.reserve(words.size() + 1);
+  for (std::string& word : words) arguments.push_back(word.data());
+  arguments.push_back(nullptr);
+  pid_t child = 0;
+  if (posix_spawn(&child, arguments[0], nullptr, nullptr, arguments.data(), environ) != 0) {
+    return -1;
+  }
+  int status = 0;
+  while (waitpid(child, &status, 0) < 0) {
+    if (errno != EINTR) return -1;
+  }
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+/// lighttpd's variable: below which of its paths the service lies.
+void tellPath(const std::string& path, const std::string& basePath) {
+  unlink(path.c_str());
+  makePrivateFile(path, "var.keldoauth_base = \"" + basePath + "\"\n");
+  shareWithFolder(path);
+}
+
+void switchOnLighttpd(const std::string& basePath, const std::string& folder) {
+  tellPath(folder + "/lighttpd.conf", basePath);
+  const int status = run({kSwitchOn, "keldoauth"});
+  if (status != 0 && status != kSwitchedOnBefore) {
+    throw std::runtime_error("lighttpd-enable-mod keldoauth did not succeed");
+  }
+  if (run({kServices, "lighttpd", "restart"}) != 0) {
+    throw std::runtime_error("all is set up, but lighttpd did not start again: see its own words");
+  }
+}
+
+// -------------------------------------------------------------------------------
+
+int setUp(const Wishes& wishes, const std::string& path) try {
+  const std::string text = settingsText(wishes);
+  checkWishes(wishes, text, path);
+  const Settings settings = parseSettings(text, path);
+  if (!isThere(settings.keysFile)) makeKeys(settings.keysFile);
+  shareWithFolder(settings.keysFile);
+  makePrivateFile(path, text);
+  shareWithFolder(path);
+  std::cout << "Made " << path << " and " << settings.keysFile << ".\n" << std::flush;
+
+  if (wishes.webServer == "lighttpd") switchOnLighttpd(settings.basePath, folderOf(path));
+  std::cout << "The service is " << settings.issuer << "\n"
+            << "Administration: " << settings.endpoint("/admin") << "\n";
+  if (settings.issuer.rfind("https:", 0) == 0) {
+    std::cout << "It answers by TLS alone: a web server without a certificate needs one now "
+                 "(lighttpd-enable-mod ssl; /etc/lighttpd/server.pem).\n";
+  }
+  return kDone;
+} catch (const SettingsFault& fault) {
+  for (const std::string& line : fault.faults()) std::cerr << line << '\n';
+  return kFaulty;
+}
+
+}  // namespace
+
+Run declareSetup(CLI::App& command) {
+  const auto wishes = std::make_shared<Wishes>();
+  command.add_option("--issuer", wishes->issuer, "How the world calls it: https://box.example")
+      ->type_name("ADDRESS")
+      ->required();
+  command
+      .add_option("--admin", wishes->administrators,
+                  "A user who may administer it; once for each of several")
+      ->type_name("USER")
+      ->required();
+  command.add_option("--sign-in", wishes->signIn, "Who says who a user is")
+      ->check(CLI::IsMember({"system", "htpasswd", "web-server"}))
+      ->capture_default_str();
+  command.add_option("--htpasswd-file", wishes->htpasswdFile, "For --sign-in htpasswd")
+      ->type_name("FILE");
+  command.add_option("--web-server", wishes->webServer, "Which one to set up with it")
+      ->check(CLI::IsMember({"lighttpd", "none"}))
+      ->capture_default_str();
+  return [wishes](const std::string& path) { return setUp(*wishes, path); };
+}
+
+}  // namespace keldoauth::service
