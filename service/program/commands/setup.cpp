@@ -1,3 +1,4 @@
+#include <grp.h>
 #include <json/writer.h>
 #include <pwd.h>
 #include <spawn.h>
@@ -13,13 +14,17 @@
 #include <stdexcept>
 #include <vector>
 
+#include "grants/grants.h"
 #include "service/program/commands/command.h"
 #include "service/settings/keys.h"
 #include "service/settings/private_text.h"
 #include "service/settings/settings.h"
+#include "utils/oauth_names.h"
 
 namespace keldoauth::service {
 namespace {
+
+namespace grants = KELDOAUTHSERVER::grants;
 
 constexpr char kSwitchOn[] = "/usr/sbin/lighttpd-enable-mod";
 constexpr char kServices[] = "/usr/sbin/service";
@@ -93,6 +98,46 @@ void checkWishes(const Wishes& wishes, const std::string& text, const std::strin
   }
 }
 
+// The store ---------------------------------------------------------------------
+
+/// Becomes the user whom the folder of the store belongs to, for good.
+void becomeOwnerOf(const std::string& folder) {
+  struct stat status {};
+  const bool done =
+      stat(folder.c_str(), &status) == 0 &&
+      (geteuid() != 0 ||
+       (setgroups(0, nullptr) == 0 && setresgid(status.st_gid, status.st_gid, status.st_gid) == 0 &&
+        setresuid(status.st_uid, status.st_uid, status.st_uid) == 0));
+  if (!done) throw SettingsFault({folder + ": " + std::strerror(errno)});
+}
+
+/// The store and its key are the service's from their first moment: what root
+/// made there the service could not open.
+int openStoreAsItsOwner() try {
+  becomeOwnerOf(folderOf(KELDOAUTHSERVER::names::kDatabaseFile));
+  const grants::Grants store;
+  return kDone;
+} catch (const std::exception& error) {
+  std::cerr << "keldoauth-service: the store: " << error.what() << '\n';
+  return kFaulty;
+}
+
+int statusOf(pid_t child) {
+  int status = 0;
+  while (waitpid(child, &status, 0) < 0) {
+    if (errno != EINTR) return -1;
+  }
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+void makeStore() {
+  const pid_t child = fork();
+  if (child == 0) _exit(openStoreAsItsOwner());
+  if (child < 0 || statusOf(child) != kDone) {
+    throw std::runtime_error("the store cannot be opened by the user whose folder it is in");
+  }
+}
+
 // The web server ----------------------------------------------------------------
 
 /// The exit status; -1 when it could not be started.
@@ -105,11 +150,7 @@ int run(std::vector<std::string> words) {
   if (posix_spawn(&child, arguments[0], nullptr, nullptr, arguments.data(), environ) != 0) {
     return -1;
   }
-  int status = 0;
-  while (waitpid(child, &status, 0) < 0) {
-    if (errno != EINTR) return -1;
-  }
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  return statusOf(child);
 }
 
 /// lighttpd's variable: below which of its paths the service lies.
@@ -136,6 +177,7 @@ int setUp(const Wishes& wishes, const std::string& path) try {
   const std::string text = settingsText(wishes);
   checkWishes(wishes, text, path);
   const Settings settings = parseSettings(text, path);
+  makeStore();
   if (!isThere(settings.keysFile)) makeKeys(settings.keysFile);
   shareWithFolder(settings.keysFile);
   makePrivateFile(path, text);
