@@ -30,7 +30,7 @@ constexpr std::size_t kLeastToken = 32;
 constexpr std::size_t kMostToken = 256;
 constexpr int kMostHours = 8760;
 constexpr char kKeysName[] = "service.keys.json";
-constexpr char kCountersFile[] = "/run/keldoauth/counters";
+constexpr char kCountersFile[] = "/var/lib/keldoauth/counters";
 constexpr char kSigningKeysName[] = "signing.keys.json";
 
 // Texts -------------------------------------------------------------------------

@@ -12,7 +12,7 @@
 //   htpasswd_file         for the last
 //   session_hours         how long a sign-in lasts, 1 to 8760; 12 without it
 //   keys_file             service.keys.json beside this file without it
-//   counters_file         what went wrong how often; /run/keldoauth/counters
+//   counters_file         what went wrong how often; /var/lib/keldoauth/counters
 //                         without it, "" counts nothing
 //   signing_keys_file     signing.keys.json beside this file without it: the keys
 //                         that sign who somebody is (signing/key_file.h)

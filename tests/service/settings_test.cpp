@@ -100,7 +100,7 @@ TEST(SettingsTest, TakeTheUsersOfTheSystem) {
 }
 
 TEST(SettingsTest, CountFailuresUnlessToldNotTo) {
-  EXPECT_EQ(parsed(withIssuer(R"("sign_in": "system")")).countersFile, "/run/keldoauth/counters");
+  EXPECT_EQ(parsed(withIssuer(R"("sign_in": "system")")).countersFile, "/var/lib/keldoauth/counters");
   EXPECT_EQ(parsed(withIssuer(R"("counters_file": "")")).countersFile, "");
 }
 

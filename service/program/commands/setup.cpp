@@ -9,6 +9,7 @@
 #include <CLI/App.hpp>
 #include <cerrno>
 #include <cstring>
+#include <ctime>
 #include <iostream>
 #include <memory>
 #include <stdexcept>
@@ -19,6 +20,8 @@
 #include "service/settings/keys.h"
 #include "service/settings/private_text.h"
 #include "service/settings/settings.h"
+#include "service/signing/key_file.h"
+#include "service/signing/key_set.h"
 #include "utils/oauth_names.h"
 
 namespace keldoauth::service {
@@ -180,6 +183,10 @@ int setUp(const Wishes& wishes, const std::string& path) try {
   makeStore();
   if (!isThere(settings.keysFile)) makeKeys(settings.keysFile);
   shareWithFolder(settings.keysFile);
+  if (!isThere(settings.signingKeysFile)) {
+    signing::KeyFile(settings.signingKeysFile).create(signing::KeySet::make(std::time(nullptr)), {});
+  }
+  shareWithFolder(settings.signingKeysFile);
   makePrivateFile(path, text);
   shareWithFolder(path);
   std::cout << "Made " << path << " and " << settings.keysFile << ".\n" << std::flush;
