@@ -23,6 +23,7 @@
 #include "service/signing/key_file.h"
 #include "service/signing/key_set.h"
 #include "utils/oauth_names.h"
+#include "utils/oauth_utils.h"
 
 namespace keldoauth::service {
 namespace {
@@ -31,6 +32,7 @@ namespace grants = KELDOAUTHSERVER::grants;
 
 constexpr char kSwitchOn[] = "/usr/sbin/lighttpd-enable-mod";
 constexpr char kServices[] = "/usr/sbin/service";
+constexpr unsigned kIdentifierCharacters = 64;
 constexpr int kSwitchedOnBefore = 2;  // of lighttpd-enable-mod
 
 struct Wishes {
@@ -119,6 +121,9 @@ void becomeOwnerOf(const std::string& folder) {
 int openStoreAsItsOwner() try {
   becomeOwnerOf(folderOf(KELDOAUTHSERVER::names::kDatabaseFile));
   const grants::Grants store;
+  // The first identifier that is encrypted makes the key.
+  const grants::ApplicationId nobody(KELDOAUTHSERVER::getRandomStr(kIdentifierCharacters));
+  static_cast<void>(store.applications.find(nobody));
   return kDone;
 } catch (const std::exception& error) {
   std::cerr << "keldoauth-service: the store: " << error.what() << '\n';
@@ -184,7 +189,8 @@ int setUp(const Wishes& wishes, const std::string& path) try {
   if (!isThere(settings.keysFile)) makeKeys(settings.keysFile);
   shareWithFolder(settings.keysFile);
   if (!isThere(settings.signingKeysFile)) {
-    signing::KeyFile(settings.signingKeysFile).create(signing::KeySet::make(std::time(nullptr)), {});
+    signing::KeyFile(settings.signingKeysFile)
+        .create(signing::KeySet::make(std::time(nullptr)), {});
   }
   shareWithFolder(settings.signingKeysFile);
   makePrivateFile(path, text);
