@@ -67,6 +67,12 @@ foreach(part TOOLS SERVICE)
   endif()
 endforeach()
 
+if(KELDOAUTH_POSTGRESQL)
+  find_package(PostgreSQL 14 QUIET)
+  keldoauth_need(PostgreSQL_FOUND "libpq 14" libpq-dev
+    "for KELDOAUTH_POSTGRESQL; -DKELDOAUTH_POSTGRESQL=OFF does without")
+endif()
+
 if(KELDOAUTH_MISSING)
   message(FATAL_ERROR "keldoauth: these are missing:${KELDOAUTH_MISSING}")
 endif()

@@ -5,6 +5,7 @@
 #include "grants/rows/store.h"
 #include "stores/oauth_log.h"
 #include "tests/grants/grants_test.h"
+#include "tests/support/server_world.h"
 #include "utils/oauth_names.h"
 
 namespace grants_test {
@@ -26,9 +27,10 @@ class HostileClockTest : public GrantsTest {
   /// Whether the write lock is held at the moment.
   static bool isLocked() {
     sqlite3* db = nullptr;
-    sqlite3_open(kDatabase, &db);
-    const int result = sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
-    sqlite3_close(db);
+    const support::StoreCalls store = support::storeCalls();
+    store.open(kDatabase, &db);
+    const int result = store.exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
+    store.close(db);
     return result == SQLITE_BUSY;
   }
 

@@ -50,6 +50,12 @@ int onOpen(sqlite3* db, char** /*error*/, const struct sqlite3_api_routines* /*u
 
 }  // namespace
 
+/// Where the store is on a server: what the engine in SQLite's place is asked.
+extern "C" __attribute__((visibility("default"))) void keldoauth_test_note_statement(
+    const char* sql) {
+  onStatement(0, nullptr, nullptr, const_cast<char*>(sql));
+}
+
 void Statements::watch() {
   state = {};
   sqlite3_auto_extension(reinterpret_cast<void (*)()>(onOpen));
@@ -68,17 +74,17 @@ void Statements::refuseCommits(bool refuse) {
 }
 void Statements::dontWaitForLocks() {
   state.waits = 0;
-  sqlite3_busy_handler(state.newest, onLock, nullptr);
+  if (state.newest != nullptr) sqlite3_busy_handler(state.newest, onLock, nullptr);
 }
 int Statements::waits() {
   return state.waits;
 }
 void Statements::refuseBegins() {
-  sqlite3_set_authorizer(state.newest, onAction, nullptr);
+  if (state.newest != nullptr) sqlite3_set_authorizer(state.newest, onAction, nullptr);
 }
 void Statements::limitStatementsTo(int bytes) {
-  sqlite3_limit(state.newest, SQLITE_LIMIT_SQL_LENGTH, bytes);
+  if (state.newest != nullptr) sqlite3_limit(state.newest, SQLITE_LIMIT_SQL_LENGTH, bytes);
 }
 void Statements::limitTextsTo(int bytes) {
-  sqlite3_limit(state.newest, SQLITE_LIMIT_LENGTH, bytes);
+  if (state.newest != nullptr) sqlite3_limit(state.newest, SQLITE_LIMIT_LENGTH, bytes);
 }

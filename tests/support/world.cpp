@@ -11,6 +11,7 @@
 #include <thread>
 
 #include "tests/support/private_mounts.h"
+#include "tests/support/server_world.h"
 
 namespace support {
 namespace {
@@ -47,6 +48,7 @@ void World::SetUp() {
   FakeIds::release();
   SystemLog::clear();
   ::unsetenv("REMOTE_ADDR");
+  if (isOnServer()) chooseServer();
 }
 
 void World::TearDown() {
@@ -84,11 +86,12 @@ std::vector<Row> World::sql(const std::string& statement) {
   std::vector<Row> rows;
   sqlite3* db = nullptr;
   char* error = nullptr;
-  sqlite3_open(kDatabase, &db);
-  EXPECT_EQ(sqlite3_exec(db, statement.c_str(), collectRow, &rows, &error), SQLITE_OK)
+  const StoreCalls store = storeCalls();
+  store.open(kDatabase, &db);
+  EXPECT_EQ(store.exec(db, statement.c_str(), collectRow, &rows, &error), SQLITE_OK)
       << statement << ": " << (error != nullptr ? error : "");
-  sqlite3_free(error);
-  sqlite3_close(db);
+  store.free(error);
+  store.close(db);
   return rows;
 }
 
