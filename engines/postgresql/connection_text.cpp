@@ -1,5 +1,6 @@
 #include "engines/postgresql/connection_text.h"
 
+#include <arpa/inet.h>
 #include <fcntl.h>
 #include <libpq-fe.h>
 #include <sys/stat.h>
@@ -136,9 +137,13 @@ std::string partFor(const std::vector<std::string>& all, std::size_t i, const ch
   return all[i];
 }
 
+/// A name that begins like an address of this box may be anybody's.
 bool isOnThisBox(const std::string& host) {
+  in_addr address{};
+  const bool isLoopback = inet_pton(AF_INET, host.c_str(), &address) == 1 &&
+                          (ntohl(address.s_addr) >> 24) == IN_LOOPBACKNET;
   return host.front() == '/' || host.front() == '@' || host == "localhost" || host == "::1" ||
-         host.rfind("127.", 0) == 0;
+         isLoopback;
 }
 
 void requireIdentity(const Options& options) {

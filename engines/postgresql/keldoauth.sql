@@ -210,7 +210,12 @@ WHERE name IN ('server_version', 'fsync', 'full_page_writes', 'synchronous_commi
                'synchronous_standby_names', 'log_statement', 'log_min_error_statement',
                'log_min_messages', 'log_min_duration_statement', 'track_activities')
 ORDER BY name;
-SELECT format('GRANT SELECT ON keldoauth.server_standbys, keldoauth.server_settings TO %I',
+CREATE OR REPLACE VIEW keldoauth.server_address AS
+SELECT coalesce(host(inet_server_addr()), 'this box') AS address, setting AS port,
+       pg_postmaster_start_time()::text AS since
+FROM pg_settings WHERE name = 'port';
+SELECT format('GRANT SELECT ON keldoauth.server_standbys, keldoauth.server_settings, '
+              'keldoauth.server_address TO %I',
               :'role') \gexec
 
 COMMIT;

@@ -73,7 +73,7 @@ void dropTrigger(const std::string& name) {
 bool isTrigger(const std::string& sql) {
   static const std::regex kCreate(
       "CREATE TRIGGER (\\w+) (BEFORE|AFTER) (\\w+) ON (\\w+)(?: WHEN (.*?))? BEGIN "
-      "SELECT RAISE\\((ABORT, ('\\w+')|IGNORE)\\); END;?");
+      "SELECT RAISE\\(((?:ABORT|FAIL), ('\\w+')|IGNORE)\\); END;?");
   static const std::regex kDrop("DROP TRIGGER (\\w+);?");
   std::smatch found;
   if (std::regex_match(sql, found, kDrop)) {

@@ -10,6 +10,7 @@
 #include <string>
 
 #include "tests/stores/text_operations.h"
+#include "tests/support/server_world.h"
 
 using namespace KELDOAUTHSERVER;
 using support::Clock;
@@ -64,16 +65,16 @@ const Expiring kKinds[] = {
 /// A connection of the test's own that keeps a lock while it lives.
 class Lock {
  public:
-  explicit Lock(const char* file) { sqlite3_open(file, &db_); }
+  explicit Lock(const char* file) { store_.open(file, &db_); }
   ~Lock() {
     sqlite3_finalize(reading_);
-    sqlite3_close(db_);
+    store_.close(db_);
   }
   Lock(const Lock&) = delete;
   Lock& operator=(const Lock&) = delete;
 
   void write() {
-    EXPECT_EQ(sqlite3_exec(db_, "BEGIN IMMEDIATE;", nullptr, nullptr, nullptr), SQLITE_OK);
+    EXPECT_EQ(store_.exec(db_, "BEGIN IMMEDIATE;", nullptr, nullptr, nullptr), SQLITE_OK);
   }
   void read(const std::string& table) {
     sqlite3_prepare_v2(db_, ("SELECT * FROM " + table).c_str(), -1, &reading_, nullptr);
@@ -81,6 +82,7 @@ class Lock {
   }
 
  private:
+  const support::StoreCalls store_ = support::storeCalls();
   sqlite3* db_ = nullptr;
   sqlite3_stmt* reading_ = nullptr;
 };

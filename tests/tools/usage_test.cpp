@@ -52,6 +52,8 @@ const std::vector<Command>& allCommands() {
                                              {"log", "list"},
                                              {"log", "add"},
                                              {"log", "clear"},
+                                             {"engine", "show"},
+                                             {"engine", "set"},
                                              {"", "purge"},
                                              {"", "status"},
                                              {"", "backup"},

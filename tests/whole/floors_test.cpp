@@ -34,6 +34,8 @@ const std::vector<Floor>& floors() {
                                       {"utils", 1},
                                       {"platform/standin", 2},
                                       {"core", 2},
+                                      {"engines/choice", 2},
+                                      {"engines/postgresql", 2},
                                       {"stores", 3},
                                       {"grants", 4},
                                       {"examples", 5},
@@ -83,8 +85,8 @@ Texts includesOf(const std::filesystem::path& path) {
 
 Includes readHouse() {
   Includes house;
-  for (const char* root : {"platform", "utils", "core", "stores", "grants", "examples", "service",
-                           "bench", "tools/keldoauth"}) {
+  for (const char* root : {"platform", "utils", "core", "engines", "stores", "grants", "examples",
+                           "service", "bench", "tools/keldoauth"}) {
     for (const auto& entry : std::filesystem::recursive_directory_iterator(root)) {
       const std::string kind = entry.path().extension();
       if (kind == ".h" || kind == ".cpp") house[entry.path()] = includesOf(entry.path());

@@ -31,6 +31,7 @@ constexpr Group kGroups[] = {
     {"code", "Grant codes", codeCommands},
     {"token", "Access and refresh tokens", tokenCommands},
     {"log", "Audit log", logCommands},
+    {"engine", "Where the store is", engineCommands},
 };
 
 /// What the command line asked for.

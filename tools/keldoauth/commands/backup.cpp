@@ -13,6 +13,7 @@
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/database_file.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
+#include "tools/keldoauth/storage/engine_choice.h"
 #include "tools/keldoauth/storage/files.h"
 #include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_names.h"
@@ -50,6 +51,7 @@ void warnOfStranger(const std::string& stranger) {
 }
 
 Answer backup(const Arguments& arguments) {
+  requireFile("'pg_dump -Fc', run by the server's administrator, makes a copy");
   Draft draft(*arguments.file);
   copyStoreTo(draft);
   Answer answer;
@@ -163,6 +165,7 @@ void readInto(DatabaseFile& copy, const std::string& path) {
 }
 
 Answer restore(const Arguments& arguments) {
+  requireFile("'pg_restore --clean', run by the server's administrator, puts back a copy");
   const std::string& path = *arguments.file;
   requireReadableFile(path);
   if (isSameFile(path, names::kDatabaseFile)) {

@@ -46,6 +46,7 @@ const std::vector<Command>& userCommands();
 const std::vector<Command>& codeCommands();
 const std::vector<Command>& tokenCommands();
 const std::vector<Command>& logCommands();
+const std::vector<Command>& engineCommands();
 const Command& purgeCommand();
 const Command& statusCommand();
 const Command& backupCommand();

@@ -24,6 +24,7 @@
 #include "tools/keldoauth/console/terminal.h"
 #include "tools/keldoauth/console/text.h"
 #include "tools/keldoauth/storage/encrypted_values.h"
+#include "tools/keldoauth/storage/engine_choice.h"
 #include "tools/keldoauth/storage/files.h"
 #include "tools/keldoauth/storage/key_files.h"
 #include "tools/keldoauth/storage/trouble.h"
@@ -33,6 +34,8 @@ using namespace KELDOAUTHSERVER;
 
 namespace tool {
 namespace {
+
+constexpr int kWrongKey = 23;  // SQLITE_AUTH, of a store on a server
 
 // Keys ------------------------------------------------------------------------------
 
@@ -95,6 +98,7 @@ void replaceKey(const KeyFiles& keys) {
                   "every value is encrypted with " + keys.next + "; run the command again");
   }
   try {
+    useKey(keys.current);
     removeKeyDrafts(keys.current);
     syncFolderOf(keys.current);
   } catch (const Failure& failure) {
@@ -119,7 +123,7 @@ struct Sorted {
 Sorted sortedValues(OAUTHDBBasic& store, const KeyFiles& keys) {
   Sorted sorted;
   useKey(keys.current);
-  for (const char* table : kTablesWithSecrets) {
+  for (const char* table : tablesWithSecrets()) {
     store.SetTabName(table);
     for (EncryptedValue& value : encryptedValues(store)) {
       const bool isDone = decrypt(value);
@@ -149,7 +153,7 @@ void convertValues(OAUTHDBBasic& store, const std::vector<Sorted::Value>& values
 }
 
 void requireAllReadable(OAUTHDBBasic& store) {
-  for (const char* table : kTablesWithSecrets) {
+  for (const char* table : tablesWithSecrets()) {
     store.SetTabName(table);
     for (EncryptedValue& value : encryptedValues(store)) {
       if (!decrypt(value)) throw Failure(kUnavailable, "a value cannot be read back");
@@ -157,7 +161,16 @@ void requireAllReadable(OAUTHDBBasic& store) {
   }
 }
 
+/// On a server the store knows which key it has, and lets no other in: after an
+/// interruption that is the one that waits.
+void useStoresKey(const KeyFiles& keys) {
+  if (!isOnServer() || access(keys.next.c_str(), F_OK) != 0) return;
+  const OAUTHDBBasic store;
+  if (store.GetErrCode() == kWrongKey) useKey(keys.next);
+}
+
 std::size_t convertStore(const KeyFiles& keys, NextKey& next) {
+  useStoresKey(keys);
   OAUTHDBBasic store;
   requireReady(store);
   Transaction transaction(store);

@@ -35,6 +35,7 @@ Answer status(const Arguments& /*arguments*/) {
   inspectKeyFiles(problems);
   inspectSettings(problems);
   document["database"] = inspectDatabase(document["files"], problems);
+  document["server"] = inspectServer(problems);
   document["lifetimes"] = inspectLifetimes();
   document["diagnostics"] = inspectDiagnostics(problems);
   document["problems"] = problems.list();
@@ -112,6 +113,17 @@ void printProblems(const Json::Value& problems, std::ostream& out) {
   }
 }
 
+void printServer(const Json::Value& server, std::ostream& out) {
+  if (server.isNull()) return;
+  out << "\nServer       " << cellText(server["address"]) << " port " << cellText(server["port"])
+      << ", PostgreSQL " << cellText(server["settings"]["server_version"]) << "\n";
+  for (const Json::Value& standby : server["standbys"]) {
+    out << "Standby      " << cellText(standby["name"]) << ", " << cellText(standby["sync"]) << ", "
+        << cellText(standby["state"]) << ", " << cellText(standby["lag_bytes"])
+        << " bytes behind\n";
+  }
+}
+
 void printStatus(const Json::Value& document, std::ostream& out) {
   const Json::Value& database = document["database"];
   printTable(out, inOrder(document["files"]), kFileColumns);
@@ -122,6 +134,7 @@ void printStatus(const Json::Value& document, std::ostream& out) {
   } else {
     out << "Database     " << cellText(database["message"]) << '\n';
   }
+  printServer(document["server"], out);
   const Json::Value& lifetimes = document["lifetimes"];
   out << "\nLifetimes    codes " << duration(lifetimes[names::kGrantCodeExpired].asInt64())
       << ", access tokens " << duration(lifetimes[names::kTokenExpired].asInt64()) << '\n';

@@ -48,6 +48,7 @@ struct Arguments {
   Text codeFile;
   Text contains;
   Text displayName;
+  Text engine;
   Text file;
   Text flowType;
   Text ip;
@@ -107,6 +108,7 @@ inline constexpr Option kClientArgument{"CLIENT", "", "Identifier, row id or nam
                                         &Arguments::client};
 inline constexpr Option kUserArgument{"NAME", "", "A user", &Arguments::username};
 inline constexpr Option kBackupFile{"FILE", "", "A copy of the database", &Arguments::file};
+inline constexpr Option kEngine{"ENGINE", "", "sqlite or postgresql", &Arguments::engine};
 inline constexpr Option kMessage{"MESSAGE", "", "Text of the entry", &Arguments::message};
 
 inline constexpr Option kClient{"--client", "CLIENT", "Client: identifier, row id or name",

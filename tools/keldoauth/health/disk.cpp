@@ -7,6 +7,7 @@
 #include <string>
 
 #include "tools/keldoauth/health/health.h"
+#include "tools/keldoauth/storage/engine_choice.h"
 #include "utils/oauth_names.h"
 
 namespace names = KELDOAUTHSERVER::names;
@@ -44,7 +45,7 @@ Json::Value inspectDisk(Problems& problems) {
   Json::Value document;
   document["free"] = Json::Value();
   document["needed"] = Json::Value();
-  if (!isKnown) return document;
+  if (!isKnown || isOnServer()) return document;
 
   stat(names::kDatabaseFile, &database);  // absent: of size 0
   const Bytes free = freeFor(folder.st_uid, disk);

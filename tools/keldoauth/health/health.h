@@ -28,7 +28,7 @@ class Problems {
 Json::Value inspectFiles(Problems& problems);
 
 /// Bytes "free" on the disk of the folder, and "needed" there for the largest
-/// purge; null where that cannot be known.
+/// purge; null where that cannot be known, and for a store on a server.
 Json::Value inspectDisk(Problems& problems);
 
 /// Key files that should not be there.
@@ -38,6 +38,10 @@ void inspectKeyFiles(Problems& problems);
 /// inspectDatabase() found in them.
 void inspectCipher(const KELDOAUTHSERVER::grants::Grants& grants, const Json::Value& tables,
                    Problems& problems);
+
+/// Address, settings and standbys of the server that the store is on; null for a
+/// file.
+Json::Value inspectServer(Problems& problems);
 
 /// Damage, and what the library does not put into a database.
 void inspectSoundness(Problems& problems);

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "tools/keldoauth/storage/engine_choice.h"
 #include "tools/keldoauth/storage/trouble.h"
 #include "utils/oauth_bounds.h"
 
@@ -56,7 +57,7 @@ std::string encrypted(std::string text) {
 bool isAllReadable() {
   OAUTHDBBasic store;
   requireReady(store);
-  for (const char* table : kTablesWithSecrets) {
+  for (const char* table : tablesWithSecrets()) {
     store.SetTabName(table);
     std::vector<EncryptedValue> values = encryptedValues(store);
     if (!std::all_of(values.begin(), values.end(), decrypt)) return false;

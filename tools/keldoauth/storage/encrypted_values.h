@@ -13,11 +13,6 @@
 
 namespace tool {
 
-/// The tables with encrypted columns.
-inline constexpr const char* kTablesWithSecrets[] = {KELDOAUTHSERVER::names::kClientInfoTable,
-                                                     KELDOAUTHSERVER::names::kGrantCodeTable,
-                                                     KELDOAUTHSERVER::names::kTokenTable};
-
 struct EncryptedValue {
   std::string id;  // of the row
   std::string column;

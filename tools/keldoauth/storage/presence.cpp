@@ -10,6 +10,7 @@
 
 #include "core/tables.h"
 #include "tools/keldoauth/console/failure.h"
+#include "tools/keldoauth/storage/engine_choice.h"
 #include "tools/keldoauth/storage/key_files.h"
 #include "utils/oauth_names.h"
 
@@ -47,6 +48,7 @@ bool lacksTables() {
 }  // namespace
 
 Presence databasePresence() {
+  if (isOnServer()) return Presence::kThere;
   struct stat status {};
   if (stat(names::kDatabaseFile, &status) == 0) {
     return lacksTables() ? Presence::kNoTables : Presence::kThere;
