@@ -26,11 +26,14 @@ constexpr char kOpening[] =
     "(SELECT ' '||string_agg(name,' ')||' ' FROM keldoauth.sqlite_master)";
 enum Column : int { kIsStandby, kIsSuitable, kSeal, kTables, kColumns };
 
-/// A warning that comes with a commit means that it was not waited for.
+/// A warning that comes with a commit means that it was not waited for; what
+/// comes to a connection at rest is a farewell.
 void noteNotice(void* hasWarning, const PGresult* notice) {
   const char* const severity = PQresultErrorField(notice, PG_DIAG_SEVERITY_NONLOCALIZED);
-  if (severity != nullptr && std::strcmp(severity, "WARNING") == 0) {
-    *static_cast<bool*>(hasWarning) = true;
+  for (const char* const noted : {"WARNING", "FATAL", "PANIC"}) {
+    if (severity != nullptr && std::strcmp(severity, noted) == 0) {
+      *static_cast<bool*>(hasWarning) = true;
+    }
   }
 }
 
@@ -154,7 +157,8 @@ bool Server::connect(const Servers& servers, std::string& reason) {
       }
       if (attempt->state() != Attempt::State::kDone) continue;
       connection_ = attempt->connection();
-      PQsetNoticeReceiver(connection_.get(), noteNotice, &wasWarned_);
+      saidFarewell_ = false;
+      PQsetNoticeReceiver(connection_.get(), noteNotice, &saidFarewell_);
       seal_ = attempt->seal;
       tables_ = attempt->tables;
       return true;
@@ -181,10 +185,10 @@ const PGresult* Reply::failure() const {
 
 bool Server::isConnected() {
   if (connection_ == nullptr) return false;
-  pollfd socket{PQsocket(connection_.get()), POLLIN, 0};
-  // Nothing comes of its own accord but a farewell.
-  if (poll(&socket, 1, 0) > 0 && PQconsumeInput(connection_.get()) == 0) disconnect();
-  if (connection_ != nullptr && PQstatus(connection_.get()) != CONNECTION_OK) disconnect();
+  // The farewell may be here before the end of the connection is.
+  const bool isThere = PQconsumeInput(connection_.get()) == 1;
+  const bool isIdle = isThere && PQisBusy(connection_.get()) == 0;
+  if (!isIdle || saidFarewell_ || PQstatus(connection_.get()) != CONNECTION_OK) disconnect();
   return connection_ != nullptr;
 }
 
@@ -207,7 +211,7 @@ Reply Server::ask(const std::string& text) {
     const bool isReady = deadline.wait(sockets, kForever);
     isGood = unsent >= 0 && (isReady ? PQconsumeInput(connection) == 1 : !deadline.isOver());
   }
-  PQsetNoticeReceiver(connection, noteNotice, &wasWarned_);
+  PQsetNoticeReceiver(connection, noteNotice, &saidFarewell_);
   reply.isCutOff = !isGood || PQstatus(connection) != CONNECTION_OK;
   if (reply.isCutOff) disconnect();
   return reply;

@@ -62,7 +62,7 @@ class Server {
   std::unique_ptr<PGconn, FinishConnection> connection_;
   std::string seal_;
   std::string tables_;
-  bool wasWarned_ = false;  // at a time when nothing was asked
+  bool saidFarewell_ = false;
 };
 
 }  // namespace keldoauth::postgresql

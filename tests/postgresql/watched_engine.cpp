@@ -34,7 +34,12 @@ Function underTest(const char* name) {
 /// As the server's owner of the tables, past the library under test.
 void tell(const std::string& sql) {
   static PGconn* const connection = PQconnectdb(std::getenv("KELDOAUTH_TEST_SERVER"));
-  PGresult* const result = PQexec(connection, sql.c_str());
+  PGresult* result = PQexec(connection, sql.c_str());
+  if (PQresultStatus(result) == PGRES_FATAL_ERROR) {  // a test has made the server hang up
+    PQclear(result);
+    PQreset(connection);
+    result = PQexec(connection, sql.c_str());
+  }
   const ExecStatusType status = PQresultStatus(result);
   if (status != PGRES_COMMAND_OK && status != PGRES_TUPLES_OK) {
     std::fprintf(stderr, "%s: %s", sql.c_str(), PQerrorMessage(connection));
