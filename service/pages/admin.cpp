@@ -1,7 +1,7 @@
 #include "service/pages/admin_actions.h"
 #include "service/pages/admin_pages.h"
-#include "service/pages/admin_view.h"
 #include "service/pages/form_token.h"
+#include "service/pages/frame.h"
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
 
@@ -10,15 +10,12 @@ namespace {
 
 Answer show(Context& context, const Request& request, const Parameters& query) {
   const std::string view = query.value("view");
-  const std::string done = query.value("done");
-  if (view == "access") {
-    return accessPage(context, request, done, {query.value("user"), query.value("application")});
-  }
-  if (view == "log") {
-    return logPage(context, request, query.value("filter"), query.value("page"));
-  }
+  if (view == "access") return accessPage(context, request, query);
+  if (view == "application") return applicationPage(context, request, query);
+  if (view == "log") return logPage(context, request, query);
+  if (view == "register") return registerPage(context, request, {});
   if (view == "storage") return storagePage(context, request);
-  return applicationsPage(context, request, done, {});
+  return applicationsPage(context, request, query);
 }
 
 bool isFromHere(const Settings& settings, const Request& request, const Parameters& form) {
@@ -30,10 +27,9 @@ bool isFromHere(const Settings& settings, const Request& request, const Paramete
 
 Answer admin(Context& context, const Request& request) {
   if (request.user.empty()) return signInFirst(context.settings, request);
-  // The web server should have kept others out; the settings have the last word.
-  if (context.settings.administrators.count(request.user) == 0) {
+  if (!isAdministrator(context.settings, request)) {
     return messagePage(context.settings, 403, "Not for you",
-                       "This page is for the administrators of the box.");
+                       "This page is for the administrators of the box.", kAccount.path);
   }
   const bool isForm = request.method == "POST";
   if (!isForm && !request.isRead()) return methodNotAllowed("GET, HEAD, POST");

@@ -7,90 +7,168 @@
 #include "service/pages/admin_pages.h"
 #include "service/pages/html.h"
 #include "service/protocol/clients.h"
-#include "service/protocol/redirect.h"
-#include "service/settings/scopes.h"
 
 namespace keldoauth::service {
 namespace {
 
-/// Back to a page that can be reloaded without doing it again.
+// Each leads back to a page that can be loaded again without doing it again; and
+// sent once more, each does nothing more.
+
 Answer done(const Context& context, const Request& request, const std::string& word) {
   return redirectAnswer(request, context.settings.link("/admin?done=") + word);
-}
-
-std::string chosenScope(const ScopeTable& scopes, const Parameters& form) {
-  std::string chosen;
-  for (const KnownScope& scope : scopes) {
-    if (!form.has("scope." + scope.name)) continue;
-    if (!chosen.empty()) chosen += ' ';
-    chosen += scope.name;
-  }
-  return chosen;
-}
-
-std::string faultOf(const Draft& draft) {
-  std::string fault = faultOfName(draft.name);
-  if (!fault.empty()) return fault;
-  if (draft.redirect.size() > kMaxRedirect) return "The redirect address is too long.";
-  if (!isRedirectAddress(draft.redirect, grants::ApplicationKind::kConfidential)) {
-    return "The redirect address must start with https://, or with http:// for 127.0.0.1 and "
-           "localhost, and have no fragment.";
-  }
-  return draft.scope.empty() ? "Choose at least one thing that it may ask to do." : "";
 }
 
 grants::Actor by(const Request& request) {
   return grants::Actor(request.user);
 }
 
-Answer faulty(Context& context, const Request& request, Draft draft, const std::string& fault) {
-  draft.fault = fault;
-  return applicationsPage(context, request, "", draft);
+std::string sentence(const grants::Refusal& refusal) {
+  return std::string(grants::explain(refusal.why)) + ".";
+}
+
+// New ones ------------------------------------------------------------------------
+
+grants::NewApplication applicationIn(const Draft& draft) {
+  grants::NewApplication application{grants::ApplicationName(draft.name),
+                                     addressesIn<grants::RedirectAddress>(draft.addresses),
+                                     grants::Scope(draft.scope), draft.kind};
+  application.logoutAddresses = addressesIn<grants::LogoutAddress>(draft.logoutAddresses);
+  application.needsPkce = draft.needsPkce;
+  return application;
+}
+
+/// To what the same form registered when it was sent before.
+Answer sentAgain(Context& context, const Request& request, const Draft& draft,
+                 const grants::ApplicationId& identifier) {
+  const grants::Applications& applications = context.store.open().applications;
+  const auto there = applications.find(identifier);
+  const bool isSame = there && there->name.text() == draft.name;
+  return redirectAnswer(
+      request, pathWithSecret(context.settings, request, identifier,
+                              applications.secretOf(identifier), isSame ? "registered" : "again"));
+}
+
+Answer add(Context& context, const Request& request, Draft draft, const std::string& once) {
+  grants::NewApplication application = applicationIn(draft);
+  if (!once.empty()) application.identifier = identifierFrom(context.settings, once);
+  try {
+    const auto added = context.store.open().applications.add(application, by(request));
+    if (added) {
+      return redirectAnswer(request, pathWithSecret(context.settings, request, added->identifier,
+                                                    added->secret, "registered"));
+    }
+    if (added.refusal().why == grants::Why::kTaken) {
+      return sentAgain(context, request, draft, *application.identifier);
+    }
+    draft.fault = sentence(added.refusal());
+  } catch (const grants::Trouble& trouble) {
+    if (trouble.kind() != grants::Trouble::Kind::kFull) throw;
+    draft.fault = "There is no room for another application. Remove one first.";
+  }
+  return registerPage(context, request, draft, once);
 }
 
 Answer registerClient(Context& context, const Request& request, const Parameters& form) {
-  const Draft draft{form.value("name"), form.value("redirect"),
-                    chosenScope(context.settings.scopes, form), ""};
-  const std::string fault = faultOf(draft);
-  if (!fault.empty()) return faulty(context, request, draft, fault);
-  const grants::ApplicationName name(draft.name);
-  try {
-    const auto registered = context.store.open().applications.add(
-        {name, {grants::RedirectAddress(draft.redirect)}, grants::Scope(draft.scope)}, by(request));
-    if (registered) return secretPage(context, request, name, *registered);
-    return faulty(context, request, draft,
-                  std::string(grants::explain(registered.refusal().why)) + ".");
-  } catch (const grants::Trouble& trouble) {
-    if (trouble.kind() != grants::Trouble::Kind::kFull) throw;
-    return faulty(context, request, draft,
-                  "There is no room for another application. Remove one first.");
-  }
+  Draft draft = readDraft(form, offeredScopes(context.settings));
+  const std::string once = form.value("once");
+  draft.fault = faultOf(draft);
+  if (!draft.fault.empty()) return registerPage(context, request, draft, once);
+  return add(context, request, draft, once);
+}
+
+// Those that are there ------------------------------------------------------------
+
+grants::ApplicationId clientIn(const Parameters& form) {
+  return grants::ApplicationId(form.value("client"));
 }
 
 /// The word for what became of it; the only refusal is that it is not there.
 template <typename Value>
-Answer changed(const Context& context, const Request& request,
+Answer changed(const Context& context, const Request& request, const Parameters& form,
                const grants::Outcome<Value>& outcome, const char* word) {
-  return done(context, request, outcome ? word : "gone");
+  if (!outcome) return done(context, request, "gone");
+  return redirectAnswer(request,
+                        pathWithSecret(context.settings, request, clientIn(form), {}, word));
 }
 
 Answer enable(Context& context, const Request& request, const Parameters& form) {
-  const grants::ApplicationId client(form.value("client"));
-  return changed(context, request, context.store.open().applications.enable(client, by(request)),
-                 "enabled");
+  return changed(context, request, form,
+                 context.store.open().applications.enable(clientIn(form), by(request)), "enabled");
 }
 
 Answer disable(Context& context, const Request& request, const Parameters& form) {
-  const grants::ApplicationId client(form.value("client"));
-  return changed(context, request, context.store.open().applications.disable(client, by(request)),
+  return changed(context, request, form,
+                 context.store.open().applications.disable(clientIn(form), by(request)),
                  "disabled");
 }
 
 Answer remove(Context& context, const Request& request, const Parameters& form) {
-  const grants::ApplicationId client(form.value("client"));
-  return changed(context, request, context.store.open().applications.remove(client, by(request)),
-                 "removed");
+  const auto removed = context.store.open().applications.remove(clientIn(form), by(request));
+  return done(context, request, removed ? "removed" : "gone");
 }
+
+/// What stays as it was is left alone, however it is stored.
+grants::ApplicationChange changeTo(const Draft& draft, const Draft& before) {
+  grants::ApplicationChange change;
+  if (draft.name != before.name) change.name = grants::ApplicationName(draft.name);
+  if (typedWords(draft.addresses) != typedWords(before.addresses)) {
+    change.addresses = addressesIn<grants::RedirectAddress>(draft.addresses);
+  }
+  if (typedWords(draft.logoutAddresses) != typedWords(before.logoutAddresses)) {
+    change.logoutAddresses = addressesIn<grants::LogoutAddress>(draft.logoutAddresses);
+  }
+  if (draft.scope != tidyScope(before.scope)) change.scope = grants::Scope(draft.scope);
+  if (draft.needsPkce != before.needsPkce) change.needsPkce = draft.needsPkce;
+  return change;
+}
+
+bool isAny(const grants::ApplicationChange& change) {
+  return change.name || change.addresses || change.logoutAddresses || change.scope ||
+         change.needsPkce;
+}
+
+Answer change(Context& context, const Request& request, const Parameters& form) {
+  grants::Applications& applications = context.store.open().applications;
+  const auto client = applications.find(clientIn(form));
+  if (!client) return done(context, request, "gone");
+  const Draft before = draftOf(*client);
+  Draft draft = readDraft(form, offeredScopes(context.settings, before.scope));
+  draft.kind = before.kind;
+  if (draft.kind == grants::ApplicationKind::kPublic) draft.needsPkce = true;
+  draft.fault = faultOf(draft, before);
+  if (!draft.fault.empty()) return applicationPage(context, request, form, &draft);
+  const grants::ApplicationChange wanted = changeTo(draft, before);
+  if (isAny(wanted)) {
+    const auto outcome = applications.change(client->identifier, wanted, by(request));
+    if (!outcome && outcome.refusal().why == grants::Why::kNoApplication) {
+      return done(context, request, "gone");
+    }
+    if (!outcome) {
+      draft.fault = sentence(outcome.refusal());
+      return applicationPage(context, request, form, &draft);
+    }
+  }
+  return redirectAnswer(
+      request, pathWithSecret(context.settings, request, client->identifier, {}, "changed"));
+}
+
+/// The second of two clicks finds another secret than the form was shown for, and
+/// is shown that.
+Answer renew(Context& context, const Request& request, const Parameters& form) {
+  grants::Applications& applications = context.store.open().applications;
+  const grants::ApplicationId identifier = clientIn(form);
+  std::optional<grants::Secret> secret = applications.secretOf(identifier);
+  if (!secret) return done(context, request, "gone");
+  if (equalSecrets(form.value("was"), markOf(context.settings, *secret))) {
+    const auto renewed = applications.renewSecret(identifier, by(request));
+    if (!renewed) return done(context, request, "gone");
+    secret = *renewed;
+  }
+  return redirectAnswer(request,
+                        pathWithSecret(context.settings, request, identifier, secret, "renewed"));
+}
+
+// Access --------------------------------------------------------------------------
 
 Answer ended(const Context& context, const Request& request, const grants::Ended& ended,
              const std::string& shown) {
@@ -110,7 +188,7 @@ grants::Ended endOwn(grants::Grants& store, const grants::ApplicationId& client,
 }
 
 Answer revoke(Context& context, const Request& request, const Parameters& form) {
-  const grants::ApplicationId client(form.value("client"));
+  const grants::ApplicationId client = clientIn(form);
   const grants::User user(form.value("user"));
   if (user.text().empty()) {
     return ended(context, request, endOwn(context.store.open(), client, by(request)),
@@ -129,8 +207,9 @@ Answer revokeAll(Context& context, const Request& request, const Parameters& for
 constexpr struct {
   std::string_view name;
   Answer (*act)(Context& context, const Request& request, const Parameters& form);
-} kActions[] = {{"register", registerClient}, {"enable", enable}, {"disable", disable},
-                {"remove", remove},           {"revoke", revoke}, {"revoke-all", revokeAll}};
+} kActions[] = {{"register", registerClient}, {"change", change},       {"renew", renew},
+                {"enable", enable},           {"disable", disable},     {"remove", remove},
+                {"revoke", revoke},           {"revoke-all", revokeAll}};
 
 }  // namespace
 

@@ -1,20 +1,13 @@
 #include "service/pages/admin_pages.h"
 
-#include <algorithm>
-
 #include "service/http/encoding.h"
-#include "service/pages/admin_view.h"
+#include "service/pages/frame.h"
 #include "service/pages/html.h"
 
 namespace keldoauth::service {
 namespace {
 
 constexpr int kRows = 200;
-
-/// No log is so long that it had more pages.
-int pageNumber(const std::string& text) {
-  return static_cast<int>(std::clamp(number(text), 1LL, 1000LL));
-}
 
 std::string logTurn(const Settings& settings, const std::string& filter, int page,
                     const char* word) {
@@ -31,9 +24,9 @@ std::string logTurns(const Settings& settings, const std::string& filter, int pa
 
 }  // namespace
 
-Answer logPage(Context& context, const Request& request, const std::string& filter,
-               const std::string& number) {
-  const int page = pageNumber(number);
+Answer logPage(Context& context, const Request& request, const Parameters& query) {
+  const std::string filter = query.value("filter");
+  const int page = pageNumber(query.value("page"));
   grants::AuditFilter wanted;
   wanted.contains = filter;
   wanted.most = kRows + 1;  // one more, when another page follows
@@ -56,7 +49,7 @@ Answer logPage(Context& context, const Request& request, const std::string& filt
                    "character.</p>\n",
                    {context.settings.link("/admin"), filter}) +
                   (rows.empty() ? "<p class=\"empty\">No entry.</p>\n"
-                                : "<div class=\"card\"><table>\n<thead><tr><th "
+                                : "<div class=\"card\"><table class=\"log\">\n<thead><tr><th "
                                   "scope=\"col\">Time</th><th scope=\"col\">Entry</th></tr></thead>"
                                   "\n<tbody>\n" +
                                       rows + "</tbody></table></div>\n") +

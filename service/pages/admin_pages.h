@@ -6,41 +6,42 @@
 #include <string>
 
 #include "service/context.h"
+#include "service/pages/admin_draft.h"
 
 namespace keldoauth::service {
 
-/// The fields of the registration form, to be shown again with its fault.
-struct Draft {
-  std::string name;
-  std::string redirect;
-  std::string scope = "profile";
-  std::string fault;
-};
+/// Fifty of those that are registered, by their names.
+Answer applicationsPage(Context& context, const Request& request, const Parameters& query);
 
-/// Whose access is shown: a user's, or an application's own; empty for the list.
-struct Shown {
-  std::string user;
-  std::string application;
-};
+/// A form for a new one. It carries a number that is drawn for it, from which the
+/// identifier follows: sent a second time it finds what it registered before.
+Answer registerPage(const Context& context, const Request& request, const Draft& draft,
+                    const std::string& once = "");
 
-// `done` is the word for what was done just now; an unknown word says nothing.
+/// The identifier that such a form's application gets.
+grants::ApplicationId identifierFrom(const Settings& settings, const std::string& once);
 
-Answer applicationsPage(Context& context, const Request& request, const std::string& done,
-                        const Draft& draft);
-Answer accessPage(Context& context, const Request& request, const std::string& done,
-                  const Shown& shown);
+/// All about one application: the card for pasting, the form to change it, and
+/// what ends it. With a `draft` that form has its texts and its fault.
+Answer applicationPage(Context& context, const Request& request, const Parameters& query,
+                       const Draft* draft = nullptr);
 
-/// The page with this `number`: 1 is the newest; any text will do.
-Answer logPage(Context& context, const Request& request, const std::string& filter,
-               const std::string& number);
+/// The path of that page for an application whose secret has just been made: for
+/// a quarter of an hour it shows it, to this administrator.
+std::string pathWithSecret(const Settings& settings, const Request& request,
+                           const grants::ApplicationId& identifier,
+                           const std::optional<grants::Secret>& secret, const std::string& done);
+
+/// Stands in the form that renews a secret for the one to be renewed, so that a
+/// form that is sent twice renews it once.
+std::string markOf(const Settings& settings, const grants::Secret& secret);
+
+Answer accessPage(Context& context, const Request& request, const Parameters& query);
+Answer logPage(Context& context, const Request& request, const Parameters& query);
 Answer storagePage(Context& context, const Request& request);
 
-/// The only time that a secret is shown.
-Answer secretPage(const Context& context, const Request& request,
-                  const grants::ApplicationName& name, const grants::Registered& registered);
-
 /// /admin: applications, access, audit log and storage, for the administrators of
-/// the box. The web server has authenticated the user.
+/// the box.
 Answer admin(Context& context, const Request& request);
 
 }  // namespace keldoauth::service

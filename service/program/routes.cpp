@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <iterator>
 
+#include "service/pages/account.h"
 #include "service/pages/admin_pages.h"
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
@@ -25,6 +26,7 @@ constexpr Route kRoutes[] = {
     {"/oauth/sign-out", signOutPage, failurePage},
     {"/oauth/token", token, tellAsJson, "POST"},
     {"/api/whoami", whoami, tellAsJson},
+    {"/account", account, failurePage},
     {"/admin", admin, failurePage},
 };
 
