@@ -155,9 +155,9 @@ Answer takeBack(Context& context, const Request& request, const Parameters& form
                        kAccount.path);
   }
   const grants::Ended ended = end(context, request, what);
-  const char* done = "ended";
-  if (ended.codes + ended.tokens == 0) done = what.rfind(kLoginStart, 0) == 0 ? "moved" : "gone";
-  return redirectAnswer(request, context.settings.link("/account?done=") + done);
+  const bool wasThere = ended.codes + ended.tokens > 0;
+  return redirectAnswer(
+      request, context.settings.link(wasThere ? "/account?done=ended" : "/account?done=gone"));
 }
 
 }  // namespace

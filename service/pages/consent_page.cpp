@@ -2,7 +2,9 @@
 
 #include "service/http/encoding.h"
 #include "service/pages/form_token.h"
+#include "service/pages/frame.h"
 #include "service/pages/html.h"
+#include "service/pages/sign_in.h"
 #include "service/protocol/redirect.h"
 
 namespace keldoauth::service {
@@ -27,29 +29,55 @@ std::string hiddenRequest(const Settings& settings, const std::string& user,
          hidden("code_challenge_method", asked.challenge.empty() ? "" : "S256");
 }
 
-std::string scopeItems(const Settings& settings, const std::string& scope) {
-  std::string items;
-  for (const std::string& name : scopeNames(scope)) {
-    items += fill("<li>{}</li>\n", {settings.scopes.inWords(name)});
-  }
-  return items;
+/// How to become somebody else, and come back here.
+std::string whoAsks(const Settings& settings, const Request& request) {
+  const std::string change =
+      settings.signIn == SignIn::kWebServer
+          ? "Not you? Close all windows of the browser: it remembers the password.</p>\n"
+          : fill("<a href=\"{}\">Not you?</a></p>\n", {signInPath(settings, request)});
+  return fill("<p class=\"eyebrow\">Signed in as <strong><bdi>{}</bdi></strong>. ",
+              {request.user}) +
+         change;
 }
 
-constexpr char kQuestion[] = R"(<main class="card consent">
-<p class="eyebrow">Signed in as <strong>{}</strong></p>
-<h1><bdi class="app">{}</bdi> asks for access to your box</h1>
-<p>You will return to <strong class="address">{}</strong></p>
-<h2>It would be able to</h2>
-<ul class="scopes">
+constexpr char kPrivateUse[] = R"(<p class="fault">The answer goes to an app on your device, the one
+that opens addresses with <strong class="address">{}</strong>. Another app can say that it is
+<bdi>{}</bdi>: allow this only if you have started it yourself just now.</p>
 )";
+
+constexpr char kLoopback[] = R"(<p class="fault">The answer goes to a program on the device that you
+are using, at <strong class="address">{}</strong>. Any program there can say that it is
+<bdi>{}</bdi>: allow this only if you have started it yourself just now.</p>
+)";
+
+constexpr char kWeb[] = R"(<p>You will return to <strong class="address">{}</strong></p>
+)";
+
+constexpr char kOwnWord[] = R"(<p class="hint">It registered itself: its name is its own word, and
+nobody on this box has looked at it. Go by the address.</p>
+)";
+
+std::string whereTo(const AuthorizationRequest& asked) {
+  const std::string origin = originOf(asked.redirect);
+  const std::string& name = asked.client.name.text();
+  const bool isPublic = asked.client.kind == grants::ApplicationKind::kPublic;
+  switch (formOf(asked.redirect)) {
+    case AddressForm::kPrivateUse:
+      return fill(kPrivateUse, {origin, name});
+    case AddressForm::kLoopback:
+      return fill(isPublic ? kLoopback : kWeb, {origin, name});
+    default:
+      return fill(kWeb, {origin}) + (asked.client.registeredItself ? kOwnWord : "");
+  }
+}
 
 constexpr char kDecision[] = R"(<div class="actions">
 <button class="primary" name="decision" value="allow">Allow</button>
 <button name="decision" value="refuse">Refuse</button>
 </div>
 </form>
-<p class="hint">Allow this only if you started it yourself and trust the application. The
-administrator of the box can take the access back at any time.</p>
+<p class="hint">Allow this only if you started it yourself and trust the application. You can take
+the access back at any time: <a href="{}">My applications</a></p>
 </main>
 )";
 
@@ -65,15 +93,17 @@ std::string formSubject(const AuthorizationRequest& asked) {
   return subject;
 }
 
-Answer consentPage(const Settings& settings, const std::string& user,
+Answer consentPage(const Settings& settings, const Request& request,
                    const AuthorizationRequest& asked) {
-  const std::string origin = originOf(asked.redirect);
-  return pageLeadingAway(settings, asked.client.name.text() + " asks for access",
-                         fill(kQuestion, {user, asked.client.name.text(), origin}) +
-                             scopeItems(settings, asked.scope) +
-                             fill("</ul>\n<form method=\"post\" action=\"{}\">\n",
-                                  {settings.link("/oauth/authorize")}) +
-                             hiddenRequest(settings, user, asked) + kDecision);
+  const std::string& name = asked.client.name.text();
+  return pageLeadingAway(
+      settings, name + " asks for access",
+      "<main class=\"card consent\">\n" + whoAsks(settings, request) +
+          fill("<h1><bdi class=\"app\">{}</bdi> asks for access to your box</h1>\n", {name}) +
+          whereTo(asked) + "<h2>It would be able to</h2>\n" + scopeWords(settings, asked.scope) +
+          fill("<form method=\"post\" action=\"{}\">\n", {settings.link("/oauth/authorize")}) +
+          hiddenRequest(settings, request.user, asked) +
+          fill(kDecision, {settings.link(kAccount.path)}));
 }
 
 }  // namespace keldoauth::service

@@ -13,7 +13,9 @@ namespace keldoauth::service {
 /// What the form's token is bound to: everything that the user decides about.
 std::string formSubject(const AuthorizationRequest& asked);
 
-Answer consentPage(const Settings& settings, const std::string& user,
+/// Says in words what the application will be able to do, where the answer goes,
+/// and whom else that may reach.
+Answer consentPage(const Settings& settings, const Request& request,
                    const AuthorizationRequest& asked);
 
 }  // namespace keldoauth::service

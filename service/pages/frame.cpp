@@ -44,8 +44,9 @@ bool isAdministrator(const Settings& settings, const Request& request) {
 Answer framed(const View& current, const Settings& settings, const Request& request,
               const std::string& heading, const std::string& content, int status) {
   return page(settings, status, heading + " – sign-in to this box",
-              "<a class=\"skip\" href=\"#content\">Skip to the content</a>\n"
-              "<header class=\"bar\">\n<p class=\"brand\">Sign-in to this box</p>\n" +
+              fill("<link rel=\"stylesheet\" href=\"{}\">\n", {settings.link("/style/lists.css")}) +
+                  "<a class=\"skip\" href=\"#content\">Skip to the content</a>\n"
+                  "<header class=\"bar\">\n<p class=\"brand\">Sign-in to this box</p>\n" +
                   whoLine(settings, request) + navigation(settings, request, current) +
                   fill("</header>\n<main id=\"content\" class=\"wide\">\n<h1><bdi>{}</bdi></h1>\n",
                        {heading}) +
@@ -67,9 +68,6 @@ std::string notice(const std::string& done) {
       {"disabled", "The application is disabled. Its tokens do not work while it is."},
       {"ended", "That access is taken back."},
       {"gone", "That is gone already: there was nothing more to do."},
-      {"moved",
-       "That sign-in was renewed or has ended since the page was shown. Nothing was "
-       "changed: please look again."},
       {"registered", "The application is registered."},
       {"removed", "The application is removed, with all access that it had."},
       {"renewed", "The application has a new secret. The old one is no good any more."},

@@ -183,7 +183,7 @@ Answer answerOrAsk(Context& context, const Request& request, const Authorization
   if (issued) return answerWith(context, request, asked, *issued);
   const grants::Refusal& refusal = issued.refusal();
   if (refusal.error != grants::Error::kAccessDenied) refuse(context, request, asked, refusal);
-  if (!asked.prompt.none) return consentPage(context.settings, request.user, asked);
+  if (!asked.prompt.none) return consentPage(context.settings, request, asked);
   const bool isRoom = refusal.why == grants::Why::kWouldEvict;
   refuse(context, request, asked, isRoom ? "interaction_required" : "consent_required",
          "The user has to be asked");

@@ -1,4 +1,5 @@
-"""The administrator's page, without a browser: what its forms do and refuse."""
+"""The administrator's page and the user's own, without a browser: what their forms
+do and refuse."""
 
 import html
 import re
@@ -14,17 +15,44 @@ def show(query="", user="admin"):
 
 
 def submit(action, token=None, **fields):
-    token = Form(show().text).fields["form_token"] if token is None else token
+    token = Form(show("?view=register").text).fields["form_token"] if token is None else token
     return send("POST", "/admin", encode({"action": action, "form_token": token, **fields}),
                 {**FORM, **as_user("admin")})
 
 
-def register_by_hand(name):
+def follow(answer, user="admin"):
+    assert answer.status == 303, (answer.status, answer.text)
+    return send("GET", answer.location[len(service.BASE):], headers=as_user(user))
+
+
+def pasted(page):
+    """Identifier and secret, as the card for pasting has them."""
+    return re.findall(r"<code[^>]*>([0-9a-f]{64})</code>", page.text)
+
+
+def register_by_hand(name, **more):
     """An application that the administrator has registered, with two scopes."""
     answer = submit("register", name=name, redirect=service.CALLBACK,
-                    **{"scope.profile": "1", "scope.files.read": "1"})
-    identifier, secret = re.findall(r"<code[^>]*>([0-9a-f]{64})</code>", answer.text)
-    return service.Client(identifier, secret)
+                    **{"scope.profile": "1", "scope.files.read": "1"}, **more)
+    return service.Client(*pasted(follow(answer)))
+
+
+def about(client, word=None):
+    """The path of an application's page; with the word for what was done."""
+    path = "/admin?view=application&client=" + client.id
+    return path + "&done=" + word if word else path
+
+
+def forms(page):
+    """The hidden fields of each form of a page that changes something."""
+    return [Form(part).fields
+            for part in re.findall(r'<form method="post".*?</form>', page.text, re.DOTALL)]
+
+
+def fields_of(client, action):
+    """Of the form that does this to an application."""
+    page = send("GET", about(client), headers=as_user("admin"))
+    return next(fields for fields in forms(page) if fields["action"] == action)
 
 
 class Page(unittest.TestCase):
@@ -33,7 +61,9 @@ class Page(unittest.TestCase):
         self.assertIn(show(user="alice").status, (401, 403))
 
     def test_policy_allows_no_script(self):
-        for query in ("", "?view=access", "?view=log", "?view=storage"):
+        client = register()
+        for query in ("", "?view=access", "?view=log", "?view=storage", "?view=register",
+                      about(client).removeprefix("/admin")):
             answer = show(query)
             self.assertEqual(answer.status, 200, query)
             policy = answer.headers["Content-Security-Policy"]
@@ -43,21 +73,116 @@ class Page(unittest.TestCase):
             self.assertEqual(answer.headers["Cache-Control"], "no-store")
 
     def test_style_is_served(self):
-        self.assertEqual(send("GET", "/style/service.css").headers.get_content_type(), "text/css")
+        for name in ("service", "lists"):
+            sheet = send("GET", f"/style/{name}.css")
+            self.assertEqual((sheet.status, sheet.headers.get_content_type()), (200, "text/css"))
         self.assertEqual(send("GET", "/style/../http.cpp").status, 404)
 
 
 class Applications(unittest.TestCase):
-    def test_registered_one_works_and_its_secret_is_shown_once(self):
+    def test_registered_one_works_and_its_secret_is_shown_to_who_registered_it(self):
         answer = submit("register", name="O'Brien's <Viewer>", redirect=service.CALLBACK,
                         **{"scope.profile": "1"})
-        self.assertEqual(answer.status, 200)
-        identifier, secret = re.findall(r"<code[^>]*>([0-9a-f]{64})</code>", answer.text)
-        client = service.Client(identifier, secret)
+        page = follow(answer)
+        client = service.Client(*pasted(page))
+        for text in (service.ISSUER, service.CALLBACK, "Copy it now"):
+            self.assertIn(html.escape(text), page.text)
         self.assertEqual(whoami(client.tokens()["access_token"]).status, 200)
-        page = show().text
-        self.assertNotIn(secret, page)
-        self.assertIn(html.escape("O'Brien's <Viewer>").replace("&#x27;", "&#39;"), page)
+        self.assertIn(html.escape("O'Brien's <Viewer>").replace("&#x27;", "&#39;"), show().text)
+        for path in ("/admin", about(client), about(client) + "&secret_token=9999999999.x"):
+            page = send("GET", path, headers=as_user("admin")).text
+            self.assertNotIn(client.secret, page)
+
+    def test_secret_is_not_shown_a_quarter_of_an_hour_later(self):
+        answer = submit("register", name="Slow", redirect=service.CALLBACK,
+                        **{"scope.profile": "1"})
+        self.assertIn("Copy it now", follow(answer).text)
+        with service.later(15 * 60 + 1):
+            page = follow(answer)
+        self.assertEqual(page.status, 200)
+        self.assertNotIn("Copy it now", page.text)
+
+    def test_form_that_is_sent_twice_registers_one(self):
+        form = Form(show("?view=register").text).fields
+        fields = {**form, "name": "Twice", "redirect": service.CALLBACK, "scope.profile": "1"}
+        first, second = [submit(form["action"], form["form_token"], **{
+            name: value for name, value in fields.items() if name not in ("action", "form_token")})
+            for _ in range(2)]
+        pages = [follow(first), follow(second)]
+        self.assertEqual(pasted(pages[0]), pasted(pages[1]))
+        self.assertEqual(len(pasted(pages[0])), 2)
+        self.assertEqual(show("?contains=Twice").text.count("<bdi>Twice</bdi>"), 1)
+        fields.update(name="Another", action="register")
+        again = send("POST", "/admin", encode(fields), {**FORM, **as_user("admin")})
+        self.assertIn("done=again", again.location)
+        self.assertIn("had been sent before", follow(again).text)
+        self.assertNotIn("Another", show("?contains=Another").text.split("</form>")[-1])
+
+    def test_secret_is_renewed_once_by_two_clicks(self):
+        client = register_by_hand("Renewed")
+        fields = fields_of(client, "renew")
+        answers = [send("POST", "/admin", encode(fields), {**FORM, **as_user("admin")})
+                   for _ in range(2)]
+        secrets = [pasted(follow(answer)) for answer in answers]
+        self.assertEqual(secrets[0], secrets[1])
+        self.assertNotEqual(secrets[0][1], client.secret)
+        renewed = service.Client(*secrets[0])
+        self.assertEqual(client.post("token", grant_type="client_credentials").status, 401)
+        self.assertEqual(renewed.post("token", grant_type="client_credentials").status, 200)
+
+    def test_public_one_has_no_secret_and_its_own_scheme(self):
+        answer = submit("register", name="Pocket", kind="public",
+                        redirect="http://127.0.0.1/back\r\ncom.example.pocket:/back",
+                        **{"scope.profile": "1"})
+        page = follow(answer)
+        self.assertEqual(len(pasted(page)), 1)
+        for text in ("It is a public application", "com.example.pocket:/back", "“none”"):
+            self.assertIn(text, page.text)
+        self.assertNotIn("Renew", page.text)
+        self.assertNotIn("without_pkce", page.text)
+
+    def test_addresses_scopes_and_name_are_changed(self):
+        client = register_by_hand("Before")
+        fields = {**fields_of(client, "change"), "name": "After <b>",
+                  "redirect": "https://a.example/x https://b.example/y",
+                  "logout": "https://a.example/bye", "without_pkce": "1", "scope.files.read": "1"}
+        fields.pop("scope.profile", None)
+        for _ in range(2):
+            answer = send("POST", "/admin", encode(fields), {**FORM, **as_user("admin")})
+            self.assertEqual(answer.location, service.BASE + about(client, "changed"))
+        page = follow(answer).text
+        for text in ("<bdi>After &lt;b&gt;</bdi>", "https://b.example/y", "https://a.example/bye",
+                     "<code>files.read</code>"):
+            self.assertIn(text, page)
+        self.assertEqual(client.ask("", redirect_uri="https://b.example/y", scope="files.read",
+                                    code_challenge=None, code_challenge_method=None).status, 200)
+        log = show("?view=log&filter=" + client.id[:8]).text
+        self.assertEqual(log.count("Application changed"), 1, log)
+
+    def test_faulty_change_changes_nothing(self):
+        client = register_by_hand("Steady")
+        for change in ({"redirect": "http://evil.example/"}, {"name": " "}, {"logout": "x:y"},
+                       {"scope.profile": None}):
+            fields = {**fields_of(client, "change"), "name": "Steady", "scope.profile": "1",
+                      "redirect": service.CALLBACK, **change}
+            answer = send("POST", "/admin", encode(fields), {**FORM, **as_user("admin")})
+            self.assertEqual(answer.status, 400, change)
+            self.assertIn('role="alert"', answer.text)
+        self.assertEqual(client.ask("x" * 43, scope="files.read").status, 200)
+
+    def test_they_are_shown_by_fifties_and_found(self):
+        made = [register(client_name=f"Many {i:03}") for i in range(101)]
+        seen, path = [], "?contains=many"
+        while path:
+            page = show(path).text
+            found = re.findall(r"<bdi>(Many \d+)</bdi>", page)
+            self.assertLessEqual(len(found), 50)
+            seen += found
+            following = re.search(r'href="[^"]*/admin([^"]+)">Next', page)
+            path = following and html.unescape(following[1])
+        self.assertEqual(seen, [f"Many {i:03}" for i in range(101)])
+        self.assertIn("<bdi>Many 007</bdi>", show("?contains=" + made[7].id).text)
+        self.assertIn("No application is registered that fits", show("?contains=zzz").text)
 
     def test_faulty_draft_comes_back_with_what_was_typed(self):
         for redirect in ("http://evil.example/", "javascript:alert(1)", "https://a.example/#x"):
@@ -76,11 +201,13 @@ class Applications(unittest.TestCase):
     def test_disabled_one_gets_nothing_until_enabled(self):
         client = register()
         pair = client.tokens()
-        self.assertEqual(submit("disable", client=client.id).location, "/admin?done=disabled")
+        self.assertEqual(submit("disable", client=client.id).location,
+                         service.BASE + about(client, "disabled"))
         self.assertEqual(client.ask("x" * 43).status, 403)
         self.assertEqual(client.refresh(pair["refresh_token"]).json["error"], "invalid_client")
         self.assertEqual(whoami(pair["access_token"]).status, 401)
-        self.assertEqual(submit("enable", client=client.id).location, "/admin?done=enabled")
+        self.assertEqual(submit("enable", client=client.id).location,
+                         service.BASE + about(client, "enabled"))
         self.assertEqual(whoami(pair["access_token"]).status, 200)
 
     def test_one_with_many_tokens_is_removed_in_one_go(self):
@@ -123,8 +250,8 @@ class Access(unittest.TestCase):
         pairs = [client.tokens("bob"), client.tokens("bob", scope="profile files.read")]
         code, verifier = client.log_in("bob")
         page = show("?view=access&user=bob").text
-        self.assertEqual(page.count("<h3>Revoked</h3>"), 1)
-        self.assertIn("<dt>Grants</dt><dd>3</dd>", page)
+        self.assertEqual(page.count("<bdi>Revoked</bdi></h3>"), 1)
+        self.assertIn("<dt>Sign-ins</dt><dd>3</dd>", page)
         self.assertIn("<li>files.read</li>", page)
         fields = Form(page[page.index('method="post"') - 6:]).fields
         answer = submit("revoke", **{k: fields[k] for k in ("client", "user")})
@@ -185,10 +312,11 @@ class Access(unittest.TestCase):
         client = register(client_name="Own <self>")
         own = client.post("token", grant_type="client_credentials").json["access_token"]
         pair = client.tokens("bob")
-        self.assertIn(f'application={client.id}"><bdi>Own &lt;self&gt;', show("?view=access").text)
+        self.assertIn(f'application={client.id}">for itself',
+                      show("?view=access&contains=own+%3Cself").text)
         page = show("?view=access&application=" + client.id).text
-        self.assertIn("<h3>Own &lt;self&gt;</h3>", page)
-        self.assertIn("<dt>Grants</dt><dd>1</dd>", page)
+        self.assertIn("<h3><bdi>Own &lt;self&gt;</bdi></h3>", page)
+        self.assertIn("<dt>Sign-ins</dt><dd>1</dd>", page)
         answer = submit("revoke", client=client.id, user="")
         self.assertEqual(answer.location,
                          "/admin?done=revoked&view=access&application=" + client.id)
@@ -210,11 +338,12 @@ class Access(unittest.TestCase):
         with sqlite3.connect(service.DATABASE) as file:
             for table in ("oauth_token", "oauth_grantCode"):
                 file.execute(f"UPDATE {table} SET expired_time=CAST(unixepoch()-60 AS text)")
-        users = show("?view=access").text
+        users = show("?view=access&with=" + client.id).text
+        self.assertEqual(users.count("<tr><td"), 1, users)
         self.assertIn("<bdi>o&#39;neil</bdi>", users)
-        self.assertNotIn("Fading", users)
         shown = show("?view=access&user=o%27neil").text
-        self.assertIn("Can be renewed", shown)
+        self.assertIn("Idle, can renew", shown)
+        self.assertIn("Can renew until", shown)
         self.assertNotIn("not signed in yet", shown)
 
 
@@ -262,10 +391,12 @@ class AuditLog(unittest.TestCase):
 
 
 class Storage(unittest.TestCase):
-    def test_rows_stand_beside_their_limits(self):
+    def test_room_that_is_left_is_said(self):
         with sqlite3.connect(service.DATABASE) as file:
             count = file.execute("SELECT count(*) FROM oauth_clientInfo").fetchone()[0]
-        self.assertIn(f"<strong>{count}</strong> of 1000 rows", show("?view=storage").text)
+        page = show("?view=storage").text
+        self.assertIn(f"Room for <strong>{1000 - count}</strong> more", page)
+        self.assertIn(f"{count} of 1000<", page)
 
     def test_what_gives_way_is_counted(self):
         with sqlite3.connect(service.DATABASE) as file:
@@ -273,15 +404,36 @@ class Storage(unittest.TestCase):
                 file.execute(f"DELETE FROM {table}")
         client = register()
         client.log_in()
-        self.assertNotIn("would give way", show("?view=storage").text)
+        self.assertNotIn("give way", show("?view=storage").text)
         client.tokens()
-        self.assertIn("1 would give way to new rows</p>", show("?view=storage").text)
+        self.assertIn("1 give way when others need the room</p>", show("?view=storage").text)
+
+    def test_full_is_said_with_what_to_do(self):
+        with sqlite3.connect(service.DATABASE) as file:
+            most = 1000 - file.execute("SELECT count(*) FROM oauth_clientInfo").fetchone()[0]
+            columns = [row[1] for row in file.execute("PRAGMA table_info(oauth_clientInfo)")
+                       if row[1] not in ("id", "client_id")]
+            names = ", ".join(columns)
+            file.executemany(
+                f"INSERT INTO oauth_clientInfo(client_id, {names}) SELECT ?, {names} "
+                "FROM oauth_clientInfo ORDER BY id LIMIT 1", [(f"full{i}",) for i in range(most)])
+        try:
+            page = show("?view=storage").text
+            self.assertIn('<strong class="full">Full</strong>', page)
+            self.assertIn("remove those that nobody uses", page)
+            answer = submit("register", name="One more", redirect=service.CALLBACK,
+                            **{"scope.profile": "1"})
+            self.assertEqual(answer.status, 400)
+            self.assertIn("There is no room for another application", answer.text)
+        finally:
+            with sqlite3.connect(service.DATABASE) as file:
+                file.execute("DELETE FROM oauth_clientInfo WHERE client_id LIKE 'full%'")
 
 
 class Forgery(unittest.TestCase):
     def test_form_without_a_token_of_ours_changes_nothing(self):
         client = register()
-        genuine = Form(show().text).fields["form_token"]
+        genuine = Form(show("?view=register").text).fields["form_token"]
         consent = Form(client.ask("x" * 43, "admin").text).fields["form_token"]
         late = "1" + genuine[10:] if genuine[10] == "." else "1." + genuine.split(".")[1]
         for token in ("", "x", genuine[:-1], "9" + genuine, consent, late):
@@ -292,9 +444,91 @@ class Forgery(unittest.TestCase):
 
     def test_query_does_not_change_anything(self):
         client = register()
-        genuine = Form(show().text).fields["form_token"]
+        genuine = Form(show("?view=register").text).fields["form_token"]
         show(f"?action=disable&client={client.id}&form_token={genuine}")
         self.assertEqual(client.ask("x" * 43).status, 200)
+
+
+def account(user="alice", query=""):
+    return send("GET", "/account" + query, headers=as_user(user))
+
+
+def take_back(fields, user="alice"):
+    return send("POST", "/account", encode(fields), {**FORM, **as_user(user)})
+
+
+class Account(unittest.TestCase):
+    def setUp(self):
+        with sqlite3.connect(service.DATABASE) as file:
+            for table in ("oauth_token", "oauth_grantCode"):
+                file.execute(f"DELETE FROM {table}")
+
+    def test_says_what_each_application_can_do_in_words(self):
+        register(client_name="My <reader>").tokens(scope="profile files.read")
+        page = account().text
+        for text in ("<bdi>My &lt;reader&gt;</bdi>", "See and download your files", "127.0.0.1",
+                     "Since", "Last used", "Can renew until", "In use"):
+            self.assertIn(text, page)
+        self.assertNotIn("xpired", page)
+        self.assertNotIn("/admin", page)
+        self.assertIn("/admin", account("admin").text)
+        self.assertIn("No application has access in your name", account("bob").text)
+
+    def test_access_is_taken_back_once(self):
+        client, other = register(client_name="A"), register(client_name="B")
+        pair, kept = client.tokens(), other.tokens()
+        bobs = client.tokens("bob")
+        fields = forms(account())[0]
+        self.assertEqual(fields["what"], "application." + client.id)
+        self.assertIn("done=ended", take_back(fields).location)
+        self.assertIn("taken back", account(query="?done=ended").text)
+        self.assertIn("done=gone", take_back(fields).location)
+        self.assertEqual(whoami(pair["access_token"]).status, 401)
+        for other_pair in (kept, bobs):
+            self.assertEqual(whoami(other_pair["access_token"]).status, 200)
+
+    def test_one_sign_in_of_several_is_ended(self):
+        client = register(client_name="Devices")
+        pairs = [client.tokens() for _ in range(3)]
+        ends = [fields for fields in forms(account()) if fields["what"].startswith("login.")]
+        self.assertEqual(len(ends), 3)
+        self.assertIn("done=ended", take_back(ends[0]).location)
+        self.assertEqual(sorted(whoami(pair["access_token"]).status for pair in pairs),
+                         [200, 200, 401])
+        self.assertIn("done=gone", take_back(ends[0]).location)
+
+    def test_sign_in_that_was_renewed_since_the_page_was_shown_is_ended(self):
+        client = register()
+        pairs = [client.tokens() for _ in range(2)]
+        ends = [fields for fields in forms(account()) if fields["what"].startswith("login.")]
+        pairs = [client.refresh(pair["refresh_token"]).json for pair in pairs]
+        self.assertIn("done=ended", take_back(ends[0]).location)
+        self.assertEqual(sorted(whoami(pair["access_token"]).status for pair in pairs),
+                         [200, 401])
+
+    def test_everything_is_taken_back(self):
+        pairs = [register().tokens() for _ in range(2)]
+        bobs = register().tokens("bob")
+        self.assertIn("done=ended", take_back(forms(account())[-1]).location)
+        for pair in pairs:
+            self.assertEqual(whoami(pair["access_token"]).status, 401)
+        self.assertEqual(whoami(bobs["access_token"]).status, 200)
+
+    def test_nobody_takes_back_what_is_anothers(self):
+        client = register()
+        pairs = [client.tokens() for _ in range(2)]
+        for fields in forms(account()):
+            answer = take_back(fields, "bob")
+            self.assertEqual(answer.status, 403)
+            self.assertIn('/account">Back</a>', answer.text)
+        # The tokens of bob's own forms cover what these are about.
+        client.tokens("bob")
+        bobs = forms(account("bob"))[0]
+        for fields in forms(account()):
+            self.assertEqual(take_back({**bobs, "what": fields["what"]}, "bob").status,
+                             303 if fields["what"] == bobs["what"] else 403)
+        for pair in pairs:
+            self.assertEqual(whoami(pair["access_token"]).status, 200)
 
 
 if __name__ == "__main__":

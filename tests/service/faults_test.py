@@ -28,7 +28,7 @@ def empty(*tables):
 
 
 def submit(action, **fields):
-    page = send("GET", "/admin", headers=as_user("admin"))
+    page = send("GET", "/admin?view=register", headers=as_user("admin"))
     form = {"action": action, "form_token": Form(page.text).fields["form_token"], **fields}
     return send("POST", "/admin", encode(form), {**FORM, **as_user("admin")})
 
@@ -108,7 +108,7 @@ class Crashes(unittest.TestCase):
             self.assertEqual(whoami(pair["access_token"]).status, 200 if there else 401)
 
         def request(prepared):
-            page = send("GET", "/admin", headers=as_user("admin"))
+            page = send("GET", "/admin?view=register", headers=as_user("admin"))
             form = {"action": "remove", "form_token": Form(page.text).fields["form_token"],
                     "client": prepared[0].id}
             answer = send("POST", "/admin", encode(form), {**FORM, **as_user("admin")})
@@ -138,8 +138,8 @@ class Names(unittest.TestCase):
             pair = answer.json
             self.check(client, pair)
         shown = send("GET", "/admin?view=access&user=o%27neil", headers=as_user("admin")).text
-        self.assertIn("<h3>O&#39;Brien&#39;&#39;s \\ app</h3>", shown)
-        self.assertIn("Access for o&#39;neil<", shown)
+        self.assertIn("<bdi>O&#39;Brien&#39;&#39;s \\ app</bdi></h3>", shown)
+        self.assertIn("Access for <bdi>o&#39;neil<", shown)
 
     def test_logged_out_everywhere_is_logged_out(self):
         clients = [register(), register()]
@@ -365,9 +365,10 @@ class Costs(unittest.TestCase):
         self.assertOpens(1, lambda: client.post("revoke", token=pair["access_token"]))
         self.assertOpens(1, lambda: service.register_raw({"redirect_uris": [service.CALLBACK]}),
                          201)
-        for query in ("", "?view=access", "?view=log", "?view=storage"):
+        for path in ("/account", "/admin", "/admin?view=access", "/admin?view=log",
+                     "/admin?view=storage", "/admin?view=application&client=" + client.id):
             self.assertOpens(
-                1, lambda: send("GET", "/admin" + query, headers=as_user("admin")))  # pylint: disable=cell-var-from-loop
+                1, lambda: send("GET", path, headers=as_user("admin")))  # pylint: disable=cell-var-from-loop
 
     def test_a_request_that_is_refused_for_its_form_does_not_open_it(self):
         self.assertOpens(0, lambda: send("GET", "/.well-known/oauth-authorization-server"))

@@ -76,7 +76,7 @@ class Races(unittest.TestCase):
 
     def test_what_the_administrator_ended_while_it_was_refreshed_is_gone(self):
         client = register()
-        page = send("GET", "/admin", headers=as_user("admin"))
+        page = send("GET", "/admin?view=register", headers=as_user("admin"))
         form = {**Form(page.text).fields, "action": "revoke", "client": client.id, "user": "alice"}
         for _ in range(ROUNDS):
             old = client.tokens()["refresh_token"]

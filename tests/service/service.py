@@ -98,7 +98,7 @@ def variables(method, path, body, headers):
             "REQUEST_METHOD": method, "CONTENT_LENGTH": str(len(body)),
             "CONTENT_TYPE": headers.get("Content-Type", ""), "REMOTE_ADDR": "127.0.0.1",
             "HTTP_AUTHORIZATION": authorization}
-    if path in ("/oauth/authorize", "/admin"):
+    if path in ("/oauth/authorize", "/account", "/admin"):
         login = base64.b64decode(authorization.partition(" ")[2]).decode()
         said["REMOTE_USER"] = login.partition(":")[0]
     return said

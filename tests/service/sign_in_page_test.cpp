@@ -390,7 +390,7 @@ TEST_F(SignInPageTest, AnApplicationsRequestWaitsForTheSignIn) {
   const Answer back = submit(form, "alice", "right");
   EXPECT_EQ(header(back, "Location"), "/oauth/authorize?" + query);
   const Answer consent = send(authorize, get("/oauth/authorize", query));
-  EXPECT_NE(consent.body.find("<strong>alice</strong>"), std::string::npos);
+  EXPECT_NE(consent.body.find("<bdi>alice</bdi>"), std::string::npos);
 }
 
 /// It comes without cookies: that it is nobody's says nothing.

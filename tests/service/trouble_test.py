@@ -46,7 +46,7 @@ def without_database():
 
 
 def admin_registers():
-    page = send("GET", "/admin", headers=as_user("admin"))
+    page = send("GET", "/admin?view=register", headers=as_user("admin"))
     form = {"action": "register", "form_token": Form(page.text).fields["form_token"],
             "name": "One more", "redirect": service.CALLBACK, "scope.profile": "1"}
     return send("POST", "/admin", encode(form), {**FORM, **as_user("admin")})
