@@ -94,12 +94,14 @@ std::string faultOfAddress(const AuthorizationRequest& asked) {
   const grants::Application& client = asked.client;
   if (asked.redirect.empty()) return "The application does not say which address to return to.";
   if (isRegistered(asked.redirect, client.addresses, client.kind)) return {};
-  const std::string why = "The address to return to is not one that the application registered: " +
-                          shownAddress(asked.redirect);
-  if (formOf(asked.redirect) != AddressForm::kLoopback) return why;
-  return why +
-         " . On this device itself the port may be any, but the rest must be as it was "
-         "registered; localhost, 127.0.0.1 and [::1] are three different names.";
+  std::string why = "The address to return to is not one that the application registered: " +
+                    shownAddress(asked.redirect);
+  if (formOf(asked.redirect) == AddressForm::kLoopback) {
+    why +=
+        " . On this device itself the port may be any, but the rest must be as it was "
+        "registered; localhost, 127.0.0.1 and [::1] are three different names.";
+  }
+  return why;
 }
 
 std::optional<RequestFault> readRest(const Settings& settings, const Parameters& given,

@@ -87,6 +87,31 @@ TEST_F(AuditTest, ClearingLeavesTheEntryThatSaysSo) {
   EXPECT_THAT(entries(), ElementsAre("Audit log cleared by [bob]"));
 }
 
+TEST_F(AuditTest, WhatApplicationsDoToThemselvesIsOneEntryForAllOfThem) {
+  for (const char* name : {"One", "Two", "Three"}) {
+    NewApplication application{ApplicationName(name), {kAddress}, kScope};
+    application.registersItself = true;
+    const auto added = grants().applications.add(application, Actor(name));
+    ASSERT_TRUE(added);
+    ASSERT_TRUE(grants().applications.change(added->identifier,
+                                             {ApplicationName(name + std::string("!"))}, kItself));
+    ASSERT_TRUE(grants().applications.remove(added->identifier, kItself));
+  }
+  EXPECT_THAT(entries(), ElementsAre(testing::StartsWith("Application registered itself[One "),
+                                     testing::StartsWith("Application changed itself[One! "),
+                                     testing::StartsWith("Application removed itself[One! ")));
+  for (const std::string& entry : entries()) EXPECT_THAT(entry, testing::EndsWith("(3 times)"));
+}
+
+TEST_F(AuditTest, WhatAnAdministratorDoesToOneThatRegisteredItselfHasAnEntryOfItsOwn) {
+  NewApplication application{ApplicationName("One"), {kAddress}, kScope};
+  application.registersItself = true;
+  const auto added = grants().applications.add(application, Actor("One"));
+  ASSERT_TRUE(grants().applications.remove(added->identifier, kAdmin));
+  EXPECT_THAT(entries().back(), testing::StartsWith("Application removed[One "));
+  EXPECT_THAT(entries().back(), testing::EndsWith("by [admin]"));
+}
+
 TEST_F(AuditTest, OtherProgramsEntriesAreRead) {
   KELDOAUTHSERVER::OAUTHDBLog(names::kLogTable).Add("Application registed[O'Frame]");
   EXPECT_THAT(entries(), ElementsAre("Application registed[O'Frame]"));
