@@ -96,6 +96,40 @@ class Authlib(unittest.TestCase):
         record(self.NAME, "revocation")
 
 
+class WithoutASecret(unittest.TestCase):
+    """As a native application: public, at whatever port its system gave it."""
+
+    REDIRECT = "http://127.0.0.1:51004/cb"
+
+    @classmethod
+    def setUpClass(cls):
+        cls.server = metadata()
+        cls.client = service.register(token_endpoint_auth_method="none",
+                                      redirect_uris=["http://127.0.0.1/cb"])
+
+    def test_authlib(self):
+        session = OAuth2Session(self.client.id, redirect_uri=self.REDIRECT, scope="profile",
+                                code_challenge_method="S256", token_endpoint_auth_method="none")
+        verifier = generate_token(48)
+        address, state = session.create_authorization_url(
+            self.server["authorization_endpoint"], code_verifier=verifier)
+        old = session.fetch_token(self.server["token_endpoint"], state=state,
+                                  authorization_response=consent(address),
+                                  code_verifier=verifier)
+        session.refresh_token(self.server["token_endpoint"], refresh_token=old["refresh_token"])
+        self.assertEqual(session.get(ISSUER + "/api/whoami").json()["sub"], "alice")
+
+    def test_requests_oauthlib(self):
+        session = RequestsSession(self.client.id, redirect_uri=self.REDIRECT, scope=["profile"])
+        verifier = generate_token(48)
+        address, _ = session.authorization_url(
+            self.server["authorization_endpoint"], code_challenge_method="S256",
+            code_challenge=create_s256_code_challenge(verifier))
+        session.fetch_token(self.server["token_endpoint"], code_verifier=verifier,
+                            authorization_response=consent(address), include_client_id=True)
+        self.assertEqual(session.get(ISSUER + "/api/whoami").json()["sub"], "alice")
+
+
 class RequestsOauthlib(unittest.TestCase):
     NAME = "requests-oauthlib " + importlib.metadata.version("requests-oauthlib")
 

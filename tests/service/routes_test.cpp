@@ -21,6 +21,22 @@ TEST(RoutesTest, KnowNoOtherPaths) {
   }
 }
 
+TEST(RoutesTest, LeadFromBelowAnEndpointThatEndsInASlash) {
+  EXPECT_EQ(routeOf("/oauth/register", "")->endpoint, registerApplication);
+  for (const char* path : {"/oauth/register/x", "/oauth/register/x/y", "/oauth/register//"}) {
+    ASSERT_NE(routeOf(path, ""), nullptr) << path;
+    EXPECT_EQ(routeOf(path, "")->endpoint, manageRegistration) << path;
+  }
+  EXPECT_EQ(routeOf("/oauth/register/", ""), nullptr);
+}
+
+TEST(RoutesTest, ScriptsOfOtherOriginsComeToNoPage) {
+  for (const char* path : {"/oauth/authorize", "/oauth/sign-in", "/oauth/sign-out", "/admin",
+                           "/oauth/register", "/oauth/register/x", "/oauth/introspect"}) {
+    EXPECT_EQ(routeOf(path, "")->openTo, nullptr) << path;
+  }
+}
+
 TEST(RoutesTest, StandBelowTheIssuersPath) {
   EXPECT_EQ(routeOf("/auth/oauth/token", "/auth")->endpoint, token);
   for (const char* path : {"/oauth/token", "/auth", "/authoauth/token", "/auth/auth/oauth/token"}) {
