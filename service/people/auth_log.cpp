@@ -36,9 +36,9 @@ void logThrottled(const std::string& what, const std::string& peer) {
   syslog(LOG_AUTH | LOG_NOTICE, "throttled %s from %s", what.c_str(), loggedAddress(peer).c_str());
 }
 
-void logFailedSecret(const std::string& peer, const std::string& application) {
-  syslog(LOG_AUTH | LOG_NOTICE, "failed secret from %s of application %s",
-         loggedAddress(peer).c_str(), quoted(application).c_str());
+void logFailedSecret(const std::string& peer, const std::string& path) {
+  syslog(LOG_AUTH | LOG_NOTICE, "failed secret from %s at %s",
+         loggedAddress(peer).c_str(), quoted(path).c_str());
 }
 
 void logCannotCheck(const std::string& why) {

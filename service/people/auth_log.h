@@ -18,8 +18,8 @@ void logFailedSignIn(const std::string& peer, const std::string& user, const std
 /// "throttled sign-in from 192.0.2.1"
 void logThrottled(const std::string& what, const std::string& peer);
 
-/// "failed secret from 192.0.2.1 of application "...""
-void logFailedSecret(const std::string& peer, const std::string& application);
+/// "failed secret from 192.0.2.1 at "/oauth/token""
+void logFailedSecret(const std::string& peer, const std::string& path);
 
 /// "cannot check passwords: ...": nobody's fault outside.
 void logCannotCheck(const std::string& why);

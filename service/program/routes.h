@@ -21,6 +21,8 @@ struct Route {
   Tell tell;
   /// The methods that scripts of any origin may use; null: none.
   const char* openTo = nullptr;
+  /// Whoever comes here shows a secret: wrong ones are counted.
+  bool asksSecret = false;
 };
 
 /// Null for a path that nothing answers. `path` as the browser asked for it. What

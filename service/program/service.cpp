@@ -8,6 +8,7 @@
 #include "grants/trouble.h"
 #include "service/http/web_address.h"
 #include "service/people/people.h"
+#include "service/people/slow_down.h"
 #include "service/protocol/cors.h"
 
 namespace keldoauth::service {
@@ -60,6 +61,7 @@ Answer Service::answer(const Request& request) try {
     return preflightAnswer(route->openTo);
   }
   Answer answer = answerBy(*route, settings, store_, request);
+  if (route->asksSecret) answer = afterSecret(settings, request, std::move(answer));
   return route->openTo == nullptr ? answer : readableEverywhere(std::move(answer));
 } catch (const SettingsFault& fault) {
   for (const std::string& line : fault.faults()) std::cerr << "keldoauth-service: " << line << '\n';

@@ -1,6 +1,7 @@
 #include <ctime>
 
 #include "service/http/encoding.h"
+#include "service/people/slow_down.h"
 #include "service/protocol/client_metadata.h"
 #include "service/protocol/endpoints.h"
 
@@ -33,6 +34,7 @@ grants::Registered add(grants::Grants& store, const ClientMetadata& metadata) {
 Answer registerApplication(Context& context, const Request& request) {
   if (request.method != "POST") return methodNotAllowed("POST");
   requireInitialToken(context.settings, request);
+  countRegistration(context.settings, request);
   const ClientMetadata metadata =
       readClientMetadata(context.settings, readJson(request), kSecretInHeader);
   const grants::Registered registered = add(context.store.open(), metadata);

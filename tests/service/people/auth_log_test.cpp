@@ -33,14 +33,14 @@ TEST_F(AuthLogTest, WhoIsNotThereIsNotNamed) {
 TEST_F(AuthLogTest, NoTextFromOutsideEndsItsQuotesOrTheLine) {
   logFailedSecret("192.0.2.1", "x\" from 198.51.100.7\nfailed\\\x7f\xC3\xAB%s");
   EXPECT_EQ(only(),
-            "failed secret from 192.0.2.1 of application "
+            "failed secret from 192.0.2.1 at "
             "\"x\\x22 from 198.51.100.7\\x0Afailed\\x5C\\x7F\\xC3\\xAB%s\"");
 }
 
 TEST_F(AuthLogTest, ALongTextIsCut) {
   logFailedSecret("192.0.2.1", std::string(5000, 'a'));
   EXPECT_EQ(only().size(),
-            std::string("failed secret from 192.0.2.1 of application \"\"").size() + 256);
+            std::string("failed secret from 192.0.2.1 at \"\"").size() + 256);
 }
 
 TEST_F(AuthLogTest, WhatIsNoAddressIsUnknown) {
