@@ -20,6 +20,7 @@ constexpr struct {
     {"setup", "Make the settings and the keys, and switch the service on", declareSetup},
     {"check", "Read the settings and say what is wrong with them", declareCheck},
     {"keys", "Make, show or renew the keys that sign who somebody is", declareKeys},
+    {"user", "Keep the file of users, where sign_in is htpasswd", declareUser},
 };
 
 std::string complaint(const CLI::App& app, const CLI::ParseError& error) {

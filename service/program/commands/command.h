@@ -22,6 +22,7 @@ using Declare = Run (*)(CLI::App& command);
 Run declareCheck(CLI::App& command);
 Run declareKeys(CLI::App& command);
 Run declareSetup(CLI::App& command);
+Run declareUser(CLI::App& command);
 
 }  // namespace keldoauth::service
 
