@@ -25,7 +25,8 @@ std::string hiddenRequest(const Settings& settings, const std::string& user,
   }
   return start + hidden("redirect_uri", asked.redirectWasGiven ? asked.redirect : "") +
          hidden("response_type", "code") + hidden("scope", asked.scope) +
-         hidden("state", asked.state) + hidden("code_challenge", asked.challenge) +
+         hidden("state", asked.state) + hidden("nonce", asked.nonce) +
+         hidden("code_challenge", asked.challenge) +
          hidden("code_challenge_method", asked.challenge.empty() ? "" : "S256");
 }
 
@@ -87,7 +88,7 @@ std::string formSubject(const AuthorizationRequest& asked) {
   std::string subject = "consent";
   for (const std::string& part :
        {asked.client.identifier.text(), asked.redirect, asked.scope, asked.state, asked.challenge,
-        asked.pushed ? asked.pushed->text() : std::string()}) {
+        asked.nonce, asked.pushed ? asked.pushed->text() : std::string()}) {
     subject += "." + base64Url(part);
   }
   return subject;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <iterator>
 
+#include "service/oidc/endpoints.h"
 #include "service/pages/account.h"
 #include "service/pages/admin_pages.h"
 #include "service/pages/html.h"
@@ -16,8 +17,11 @@ constexpr std::string_view kWellKnown = "/.well-known/";
 
 constexpr Route kRoutes[] = {
     {"/.well-known/oauth-authorization-server", metadata, tellAsJson, "GET, HEAD"},
+    {"/.well-known/openid-configuration", openIdConfiguration, tellAsJson, "GET, HEAD"},
     {"/oauth/authorize", authorize, failurePage},
     {"/oauth/introspect", introspect, tellAsJson, nullptr, true},
+    {"/oauth/jwks", publicKeys, tellAsJson, "GET, HEAD"},
+    {"/oauth/logout", logout, failurePage},
     {"/oauth/par", pushRequest, tellAsJson, "POST", true},
     {"/oauth/register", registerApplication, tellAsJson, nullptr, true},
     {"/oauth/register/", manageRegistration, tellAsJson, nullptr, true},
@@ -25,6 +29,7 @@ constexpr Route kRoutes[] = {
     {"/oauth/sign-in", signInPage, failurePage},
     {"/oauth/sign-out", signOutPage, failurePage},
     {"/oauth/token", token, tellAsJson, "POST", true},
+    {"/oauth/userinfo", userInfo, tellAsJson, "GET, HEAD, POST"},
     {"/api/whoami", whoami, tellAsJson},
     {"/account", account, failurePage},
     {"/admin", admin, failurePage},

@@ -10,6 +10,7 @@
 #include "service/people/people.h"
 #include "service/people/slow_down.h"
 #include "service/protocol/cors.h"
+#include "service/signing/key_fault.h"
 
 namespace keldoauth::service {
 namespace {
@@ -84,6 +85,9 @@ Answer answerBy(const Route& route, const Settings& settings, KeptStore& store,
 } catch (const Trouble& trouble) {
   store.drop();
   return tellTrouble(route, settings, trouble);
+} catch (const signing::KeyFault& fault) {
+  std::cerr << "keldoauth-service: " << fault.what() << '\n';
+  return route.tell(settings, kBroken);
 } catch (const DirectoryTrouble& trouble) {
   std::cerr << "keldoauth-service: " << trouble.what() << '\n';
   return tellBusy(route, settings);

@@ -1,6 +1,8 @@
 #include "service/protocol/authorization_request.h"
 
 #include "service/http/encoding.h"
+#include "service/oidc/authentication.h"
+#include "service/oidc/id_token.h"
 #include "service/protocol/redirect.h"
 #include "service/settings/scopes.h"
 
@@ -75,9 +77,22 @@ Fault readChallenge(const Parameters& given, AuthorizationRequest& asked) {
   return RequestFault{"invalid_request", "PKCE with the method S256 is required"};
 }
 
-Fault readScope(const Parameters& given, AuthorizationRequest& asked) {
+/// What an application gets that names nothing. Who somebody is, is signed for
+/// those alone that ask for it.
+std::string usualScope(const std::string& registered) {
+  std::string usual;
+  for (const std::string& name : scopeNames(registered)) {
+    if (name != kOpenId) usual += (usual.empty() ? "" : " ") + name;
+  }
+  return usual;
+}
+
+/// Who asks with OpenID Connect may name scopes that this box has never heard of
+/// (Core, 3.1.2.1): they do not count.
+Fault readScope(const Settings& settings, const Parameters& given, AuthorizationRequest& asked) {
   const std::string& registered = asked.client.scope.text();
-  asked.scope = tidyScope(given.has("scope") ? given.value("scope") : registered);
+  asked.scope = given.has("scope") ? tidyScope(given.value("scope")) : usualScope(registered);
+  if (asksWhoItIs(asked.scope)) asked.scope = settings.scopes.known(asked.scope);
   if (!asked.scope.empty() && isWithin(asked.scope, registered)) return {};
   return RequestFault{"invalid_scope", "The application is not registered for this scope"};
 }
@@ -115,7 +130,8 @@ std::optional<RequestFault> readRest(const Settings& settings, const Parameters&
   if (!fault) fault = faultOfResponse(given);
   if (!fault) fault = readPrompt(given, asked.prompt);
   if (!fault) fault = readChallenge(given, asked);
-  if (!fault) fault = readScope(given, asked);
+  if (!fault) fault = readScope(settings, given, asked);
+  if (!fault) fault = readAuthentication(given, asked);
   if (!fault) fault = faultOfResource(settings, given);
   return fault;
 }

@@ -35,6 +35,8 @@ struct AuthorizationRequest {
   std::string challenge = {};  // empty: none
   Prompt prompt = {};
   std::optional<grants::RequestReference> pushed = {};  // none: it came with the browser
+  std::string nonce = {};
+  std::optional<long long> maxAge = {};  // seconds
 };
 
 /// How a reference to a pushed request begins (RFC 9126, 2.2).

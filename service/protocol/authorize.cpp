@@ -1,6 +1,9 @@
 #include "service/protocol/endpoints.h"
 
 #include "service/http/encoding.h"
+#include "service/oidc/authentication.h"
+#include "service/oidc/id_token.h"
+#include "service/oidc/login_text.h"
 #include "service/pages/consent_page.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
@@ -100,6 +103,7 @@ grants::CodeRequest codeRequest(const Request& request, const AuthorizationReque
   if (!asked.challenge.empty()) code.pkce = grants::Pkce{grants::Challenge(asked.challenge)};
   code.from = peerAddress(request);
   code.pushed = asked.pushed;
+  if (asksWhoItIs(asked.scope)) code.text = packed({request.authTime, asked.nonce});
   return code;
 }
 
@@ -117,6 +121,22 @@ Answer askWho(const Settings& settings, const Request& request, const Parameters
   return isLinkable ? redirectAnswer(request, link) : signInFirst(settings, request);
 }
 
+/// The sign-in is as the application wants it.
+void requireFresh(const Context& context, const Request& request, const Parameters& given,
+                  AuthorizationRequest& asked) {
+  if (isDecision(request, given)) return;
+  if (!mustSignInAgain(context.settings, request, given, asked)) {
+    // With a session it has been done, and the page has nothing to add.
+    if (!request.session.empty()) asked.prompt.login = false;
+    return;
+  }
+  if (asked.prompt.none) {
+    refuse(context, request, asked, "login_required", "The user has to sign in again");
+  }
+  throw Refusal{request.isRead() ? signInAgain(context.settings, request)
+                                 : askWho(context.settings, request, given)};
+}
+
 /// Faults that the application hears of. `question` is the request, `given` what
 /// the browser brought.
 void requireGood(const Context& context, const Request& request, const Parameters& given,
@@ -128,6 +148,10 @@ void requireGood(const Context& context, const Request& request, const Parameter
     refuse(context, request, asked, "login_required", "Nobody is signed in");
   }
   if (request.user.empty()) throw Refusal{askWho(context.settings, request, given)};
+  if (const auto fault = faultOfKeys(context.settings, asked)) {
+    refuse(context, request, asked, fault->error, fault->why);
+  }
+  requireFresh(context, request, given, asked);
   const auto fault = grants::Codes::faultOf(codeRequest(request, asked));
   if (fault) refuse(context, request, asked, *fault);
 }

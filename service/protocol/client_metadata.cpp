@@ -11,7 +11,7 @@
 namespace keldoauth::service {
 namespace {
 
-constexpr char kDefaultScope[] = "profile";
+constexpr char kDefaultScope[] = "openid profile";
 
 [[noreturn]] void refuse(const std::string& why) {
   throw Refusal{oauthError(400, "invalid_client_metadata", why)};
@@ -57,10 +57,15 @@ bool usesRedirects(const Json::Value& document) {
   return types.isNull() || isAmong(types, "authorization_code");
 }
 
-Addresses readRedirects(const Json::Value& document, grants::ApplicationKind kind) {
-  const Json::Value& addresses = document["redirect_uris"];
-  if (!addresses.isNull() && !addresses.isArray()) refuseRedirect("redirect_uris must be an array");
-  Addresses read;
+/// The addresses under `name`.
+template <typename Address>
+std::vector<Address> readAddresses(const Json::Value& document, const char* name,
+                                   grants::ApplicationKind kind) {
+  const Json::Value& addresses = document[name];
+  if (!addresses.isNull() && !addresses.isArray()) {
+    refuseRedirect(std::string(name) + " must be an array");
+  }
+  std::vector<Address> read;
   for (const Json::Value& address : addresses) {
     if (!address.isString() || !isRedirectAddress(address.asString(), kind)) {
       refuseRedirect(
@@ -70,6 +75,11 @@ Addresses readRedirects(const Json::Value& document, grants::ApplicationKind kin
     if (address.asString().size() > kMaxRedirect) refuseRedirect("An address is too long");
     read.emplace_back(address.asString());
   }
+  return read;
+}
+
+Addresses readRedirects(const Json::Value& document, grants::ApplicationKind kind) {
+  Addresses read = readAddresses<grants::RedirectAddress>(document, "redirect_uris", kind);
   if (!usesRedirects(document)) return {};
   if (read.empty()) refuseRedirect("redirect_uris is missing");
   return read;
@@ -139,6 +149,8 @@ ClientMetadata readClientMetadata(const Settings& settings, const Json::Value& d
   read.name = readName(document);
   read.scope = readScope(settings.scopes, document);
   read.addresses = readRedirects(document, read.kind);
+  read.logoutAddresses =
+      readAddresses<grants::LogoutAddress>(document, "post_logout_redirect_uris", read.kind);
   return read;
 }
 
@@ -163,6 +175,10 @@ Json::Value clientInformation(const Settings& settings, const grants::Applicatio
     for (const grants::RedirectAddress& address : application.addresses) {
       document["redirect_uris"].append(address.text());
     }
+    for (const grants::LogoutAddress& address : application.logoutAddresses) {
+      document["post_logout_redirect_uris"].append(address.text());
+    }
+    document["id_token_signed_response_alg"] = "RS256";
     document["response_types"].append("code");
     document["grant_types"].append("authorization_code");
     document["grant_types"].append("refresh_token");

@@ -8,6 +8,7 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "service/protocol/clients.h"
 #include "service/protocol/redirect.h"
@@ -18,6 +19,7 @@ namespace keldoauth::service {
 struct ClientMetadata {
   grants::ApplicationName name;
   Addresses addresses;  // none: it only acts for itself
+  std::vector<grants::LogoutAddress> logoutAddresses;
   grants::Scope scope;
   grants::ApplicationKind kind;
   std::string method;  // at the token endpoint

@@ -75,6 +75,7 @@ Answer replace(Context& context, const Request& request, const Holder& holder) {
   grants::ApplicationChange change;
   change.name = metadata.name;
   change.addresses = metadata.addresses;
+  change.logoutAddresses = metadata.logoutAddresses;
   change.scope = metadata.scope;
   const auto changed = context.store.open().applications.change(holder.application.identifier,
                                                                 change, grants::kItself);

@@ -1,5 +1,7 @@
 #include "service/protocol/endpoints.h"
 
+#include "service/oidc/endpoints.h"
+#include "service/oidc/id_token.h"
 #include "service/settings/scopes.h"
 
 namespace keldoauth::service {
@@ -40,6 +42,7 @@ Answer metadata(Context& context, const Request& request) {
   }
   document["authorization_response_iss_parameter_supported"] = true;
   for (const KnownScope& scope : own.scopes) document["scopes_supported"].append(scope.name);
+  if (offersOpenId(own)) addOpenIdMembers(own, document);
   return jsonAnswer(200, document);
 }
 

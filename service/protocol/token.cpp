@@ -1,8 +1,10 @@
 #include "service/protocol/endpoints.h"
 
+#include "service/oidc/id_token.h"
 #include "service/protocol/authorization_request.h"
 #include "service/protocol/clients.h"
 #include "service/settings/scopes.h"
+#include "service/signing/key_fault.h"
 
 namespace keldoauth::service {
 namespace {
@@ -51,13 +53,25 @@ grants::Outcome<grants::Pair> actForItself(grants::Grants& store, const Asking& 
   return store.tokens.issueToItself({asking.client.identifier, askedScope(form), asking.from});
 }
 
-Answer success(const grants::Pair& pair) {
+/// A refresh is done by now and need not say who the user is: a login must not be
+/// lost for want of a key.
+std::string idTokenOrNone(const Settings& settings, const grants::Application& client,
+                          const grants::Pair& pair, bool isRefresh) try {
+  return idTokenFor(settings, client.identifier, pair,
+                    isRefresh ? Occasion::kRefresh : Occasion::kLogin);
+} catch (const signing::KeyFault&) {
+  if (isRefresh) return {};
+  throw;
+}
+
+Answer success(const grants::Pair& pair, const std::string& idToken) {
   Json::Value document;
   document["access_token"] = pair.access.text();
   document["token_type"] = "Bearer";
   document["expires_in"] = static_cast<Json::Int64>(pair.expires - pair.issued);
   document["scope"] = pair.scope.text();
   if (pair.refresh) document["refresh_token"] = pair.refresh->text();
+  if (!idToken.empty()) document["id_token"] = idToken;
   return jsonAnswer(200, document).with("Pragma", "no-cache");
 }
 
@@ -82,7 +96,9 @@ Answer token(Context& context, const Request& request) {
   const grants::Application client = authenticate(store, credentials);
   if (const auto fault = faultOfResource(context.settings, form)) refuse(fault->error, fault->why);
   const auto pair = grantOf(form)(store, {client, peerAddress(request)}, form);
-  return pair ? success(*pair) : refusalAnswer(pair.refusal());
+  if (!pair) return refusalAnswer(pair.refusal());
+  const bool isRefresh = form.value("grant_type") == "refresh_token";
+  return success(*pair, idTokenOrNone(context.settings, client, *pair, isRefresh));
 }
 
 }  // namespace keldoauth::service

@@ -203,10 +203,11 @@ void readMembers(const Json::Value& document, Settings& settings, Faults& faults
   }
 }
 
-/// The scope that every box has something for: who somebody is.
+/// The scopes that every box has something for: who somebody is.
 ScopeTable usualScopes() {
   return ScopeTable(
-      std::vector<KnownScope>{{"profile", "See who you are: your user name on this box"}});
+      std::vector<KnownScope>{{"openid", "Know that it is you"},
+                              {"profile", "See who you are: your user name on this box"}});
 }
 
 std::string besides(const std::string& path, const char* name) {

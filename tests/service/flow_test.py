@@ -179,7 +179,7 @@ class Registration(unittest.TestCase):
 
     def test_empty_scope_is_the_default_one(self):
         answer = service.register_raw({"redirect_uris": [CALLBACK], "scope": ""})
-        self.assertEqual((answer.status, answer.json.get("scope")), (201, "profile"))
+        self.assertEqual((answer.status, answer.json.get("scope")), (201, "openid profile"))
 
     def test_host_may_have_an_underscore(self):
         client = register(redirect_uris=["https://my_app.lan:8443/cb"])

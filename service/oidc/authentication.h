@@ -1,0 +1,36 @@
+// What an application may ask for about the sign-in itself (OpenID Connect Core,
+// 3.1.2.1): how fresh it is, and a nonce that comes back in the token.
+
+#ifndef KELDOAUTH_SERVICE_OIDC_AUTHENTICATION_H
+#define KELDOAUTH_SERVICE_OIDC_AUTHENTICATION_H
+
+#include <optional>
+
+#include "service/http/answer.h"
+#include "service/protocol/authorization_request.h"
+
+namespace keldoauth::service {
+
+/// Reads `nonce` and `max_age` into `asked`.
+std::optional<RequestFault> readAuthentication(const Parameters& given,
+                                               AuthorizationRequest& asked);
+
+/// Whether what is asked for could be signed: nobody is to decide about, or to
+/// spend, what then cannot be given. A line on standard error when not.
+std::optional<RequestFault> faultOfKeys(const Settings& settings,
+                                        const AuthorizationRequest& asked);
+
+/// Whether the user who is signed in has to show the password once more: for
+/// prompt=login, or because it was shown more than max_age ago. Never where the
+/// web server asks, which does it with every request.
+bool mustSignInAgain(const Settings& settings, const Request& request, const Parameters& given,
+                     const AuthorizationRequest& asked);
+
+/// To the sign-in page and back here. The way back carries a mark of this moment
+/// under a key of the service: whoever comes with it and has signed in since is
+/// not asked another time.
+Answer signInAgain(const Settings& settings, const Request& request);
+
+}  // namespace keldoauth::service
+
+#endif  // KELDOAUTH_SERVICE_OIDC_AUTHENTICATION_H
