@@ -4,7 +4,8 @@ import sys
 
 FEATURES = ["metadata", "registration", "code with PKCE", "issuer in the response",
             "secret in the header", "secret in the body", "refresh", "client credentials",
-            "introspection", "revocation", "bearer challenge"]
+            "introspection", "revocation", "bearer challenge", "OpenID Connect: discovery",
+            "OpenID Connect: login", "OpenID Connect: userinfo", "OpenID Connect: sign-out"]
 
 
 def main():
