@@ -55,6 +55,7 @@ test('code with PKCE, state and issuer', async () => {
 test('refusal', async () => {
   const address = client.buildAuthorizationUrl(config, {
     redirect_uri: service.callback, scope: 'profile', code_challenge_method: 'S256',
+    prompt: 'consent',
     code_challenge: await client.calculatePKCECodeChallenge(client.randomPKCECodeVerifier()) })
   await assert.rejects(
     client.authorizationCodeGrant(config, await service.consent(address, 'alice', 'refuse')),
