@@ -41,8 +41,9 @@ std::string addressWith(const Settings& settings, const AuthorizationRequest& as
 [[noreturn]] void refuse(const Context& context, const Request& request,
                          const AuthorizationRequest& asked, const grants::Refusal& refusal) {
   const char* why = grants::explain(refusal.why);
-  if (refusal.error == grants::Error::kInvalidClient)
+  if (refusal.error == grants::Error::kInvalidClient) {
     refuseWithPage(context.settings, 403, std::string(why) + ".");
+  }
   refuse(context, request, asked, grants::codeText(refusal.error), why);
 }
 
@@ -52,9 +53,10 @@ grants::Application findClient(Context& context, const Parameters& given) {
   }
   const auto client =
       context.store.open().applications.find(grants::ApplicationId(given.value("client_id")));
-  if (!client)
+  if (!client) {
     refuseWithPage(context.settings, 400,
                    "The application that sent you here is not known to this box.");
+  }
   if (!client->isEnabled) {
     refuseWithPage(context.settings, 403,
                    "The administrator of this box has disabled this application.");
@@ -174,8 +176,9 @@ Answer decide(Context& context, const Request& request, const Parameters& given,
   if (decision == "refuse") {
     refuse(context, request, asked, "access_denied", "The user refused");
   }
-  if (decision != "allow")
+  if (decision != "allow") {
     refuseWithPage(context.settings, 400, "The form does not say what you decided.");
+  }
   const auto issued = context.store.open().codes.issue(codeRequest(request, asked));
   if (!issued) refuse(context, request, asked, issued.refusal());
   return answerWith(context, request, asked, *issued);
