@@ -28,7 +28,7 @@ if(KELDOAUTH_STATIC_JSONCPP AND SQLITE3_ARCHIVE AND BUILD_SHARED_LIBS)
     "$<INSTALL_INTERFACE:KeldOAuth::jsoncpp_archive;KeldOAuth::sqlite_archive;-lkeldcore;-lkeldcgi>"
     m)
   target_link_options(keldoauth_static INTERFACE
-    -static-libstdc++ -static-libgcc LINKER:-z,relro LINKER:-z,now)
+    -static-libstdc++ -static-libgcc LINKER:--gc-sections LINKER:-z,relro LINKER:-z,now)
 elseif(KELDOAUTH_STATIC_PROGRAMS)
   message(FATAL_ERROR
     "KELDOAUTH_STATIC_PROGRAMS takes libsqlite3.a and KELDOAUTH_STATIC_JSONCPP")

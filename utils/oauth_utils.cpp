@@ -66,7 +66,11 @@ bool loadSettings(Json::Value& root) {
   std::string text;
   if (!readSettingsFile(text)) return false;
 
-  const std::unique_ptr<Json::CharReader> parser(Json::CharReaderBuilder().newCharReader());
+  // Its own settings are a document that takes as long to make as ours to parse.
+  // It is never changed, and never destroyed: a process may still end in another
+  // thread.
+  static const auto& builder = *new Json::CharReaderBuilder;
+  const std::unique_ptr<Json::CharReader> parser(builder.newCharReader());
   return parser->parse(text.data(), text.data() + text.size(), &root, nullptr);
 }
 
