@@ -1,14 +1,15 @@
 #!/usr/bin/env python3
 """Prints every mark, what was measured, and whether it is met.
 
-usage: marks.py RESULTS-FOLDER INSTRUCTIONS
+usage: marks.py RESULTS-FOLDER INSTRUCTIONS SERVICE
 
-RESULTS-FOLDER holds what scripts/bench has measured and, where scripts/service
---cost has run, service.json. A mark that nothing was measured for says so.
+RESULTS-FOLDER holds what scripts/bench has measured, INSTRUCTIONS is the record,
+SERVICE the file of scripts/service --cost. A mark that nothing was measured for says so.
 """
 
 import json
 import pathlib
+import statistics
 import sys
 
 from results import Medium, instructions
@@ -18,10 +19,10 @@ WRITERS = "P2 eight writers of 100 tokens"
 
 
 class Marks:
-    def __init__(self, folder, counts):
+    def __init__(self, folder, counts, service):
         self.disk, self.tmpfs = (Medium(folder, medium) for medium in ("disk", "tmpfs"))
         self.counts = instructions(counts)
-        service = pathlib.Path(folder) / "service.json"
+        service = pathlib.Path(service)
         self.service = json.loads(service.read_text()) if service.exists() else {}
 
     def counted(self, machine):
@@ -29,8 +30,8 @@ class Marks:
                 self.counts[(machine, "bare", "verify")])
 
     def rate(self, way):
-        """The most requests a second, whatever the number of callers."""
-        return max(self.service[way]["rates"].values())
+        """The most requests a second that it has for any number of callers."""
+        return max(statistics.median(rounds) for rounds in self.service[way]["rates"].values())
 
     def lines(self):
         """(mark, what, bound, whether it is the least, how to find the figure)"""
@@ -77,7 +78,7 @@ class Marks:
 def main():
     print("| Mark | What | Bound | Measured | |")
     print("|---|---|---|---|---|")
-    for mark, what, bound, is_least, find in Marks(sys.argv[1], sys.argv[2]).lines():
+    for mark, what, bound, is_least, find in Marks(*sys.argv[1:4]).lines():
         try:
             figure = find()
         except KeyError:
