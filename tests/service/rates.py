@@ -1,5 +1,5 @@
-"""Requests a second of one way to serve, by number of callers, and the peak memory
-of one process; added to a file of JSON, in which every round is one figure more.
+"""Requests a second of one way to serve, by number of callers, the processor's time
+that one takes, web server included, and the peak memory of one process; added to a file of JSON, in which every round is one figure more.
 
 usage: rates.py FILE WAY PATH          within service/serve
        rates.py FILE WAY --provider    oidc-provider on Node, which it starts
@@ -20,14 +20,16 @@ PEER = pathlib.Path(__file__).parent / "peer" / "provider.mjs"
 
 
 def rate(address, token, callers):
-    """ApacheBench: one process that keeps its connections."""
+    """ApacheBench, one process that keeps its connections: requests a second, and how
+    many there were."""
     said = subprocess.run(
         ["ab", "-q", "-k", "-l", "-t", SECONDS, "-n", "10000000", "-c", str(callers),
          "-H", f"Authorization: Bearer {token}", address],
         check=True, capture_output=True, text=True).stdout
     assert "Non-2xx responses" not in said, said
     assert re.search(r"Failed requests: +0\n", said), said
-    return float(re.search(r"Requests per second: +([\d.]+)", said)[1])
+    return (float(re.search(r"Requests per second: +([\d.]+)", said)[1]),
+            int(re.search(r"Complete requests: +(\d+)", said)[1]))
 
 
 def peak_of(pid):
@@ -35,16 +37,24 @@ def peak_of(pid):
     return int(re.search(r"VmHWM:\s+(\d+) kB", status)[1])
 
 
-def peak_of_resident(program):
-    """The most of the processes that stay, which are the web server's children."""
-    peaks = []
-    for link in pathlib.Path("/proc").glob("[0-9]*/exe"):
-        try:
-            if os.readlink(link) == program:
-                peaks.append(peak_of(link.parent.name))
-        except OSError:
-            continue  # it has ended, or is another user's
-    return max(peaks)
+def seconds_of(pids):
+    """Of the processor, for processes and for those children that they waited for."""
+    ticks = 0
+    for pid in pids:
+        fields = pathlib.Path(f"/proc/{pid}/stat").read_text().rpartition(")")[2].split()
+        ticks += sum(int(field) for field in fields[11:15])
+    return ticks / os.sysconf("SC_CLK_TCK")
+
+
+def web_server():
+    return pathlib.Path(os.environ["SERVICE_RUN"], "lighttpd.pid").read_text().strip()
+
+
+def residents(program):
+    """The processes that stay, which are the web server's children."""
+    server = web_server()
+    children = pathlib.Path(f"/proc/{server}/task/{server}/children").read_text().split()
+    return [pid for pid in children if os.readlink(f"/proc/{pid}/exe") == program]
 
 
 def peak_of_one(program, path, token):
@@ -59,9 +69,12 @@ def peak_of_one(program, path, token):
     return int(done.stderr)
 
 
-def measure(address, token, peak):
-    rates = {str(callers): rate(address, token, callers) for callers in CALLERS}
-    return rates, peak()
+def measure(address, token, processes, peak):
+    rates, requests, before = {}, 0, seconds_of(processes)
+    for callers in CALLERS:
+        rates[str(callers)], complete = rate(address, token, callers)
+        requests += complete
+    return rates, (seconds_of(processes) - before) * 1000 / requests, peak()
 
 
 def measure_service(path):
@@ -73,8 +86,9 @@ def measure_service(path):
     if is_resident and name == "nothing":
         name = "nothing-fastcgi"
     program = os.path.realpath(os.path.join(os.environ["SERVICE_PROGRAMS"], name))
-    return measure(service.ISSUER + path, token,
-                   lambda: peak_of_resident(program) if is_resident
+    stay = residents(program) if is_resident else []
+    return measure(service.ISSUER + path, token, [web_server(), *stay],
+                   lambda: max(map(peak_of, stay)) if is_resident
                    else peak_of_one(program, path, token))
 
 
@@ -87,7 +101,8 @@ def measure_provider():
     try:
         # Its warnings come first, on the same stream.
         token = next(line.split()[1] for line in node.stdout if line.startswith("token "))
-        return measure(f"http://127.0.0.1:{port}/me", token, lambda: peak_of(node.pid))
+        return measure(f"http://127.0.0.1:{port}/me", token, [node.pid],
+                       lambda: peak_of(node.pid))
     finally:
         node.send_signal(signal.SIGTERM)
         node.wait()
@@ -95,11 +110,13 @@ def measure_provider():
 
 def main():
     file, way, path = pathlib.Path(sys.argv[1]), sys.argv[2], sys.argv[3]
-    rates, peak = measure_provider() if path == "--provider" else measure_service(path)
+    rates, milliseconds, peak = (
+        measure_provider() if path == "--provider" else measure_service(path))
     found = json.loads(file.read_text()) if file.exists() else {}
-    known = found.setdefault(way, {"rates": {}, "peak_kib": 0})
+    known = found.setdefault(way, {"rates": {}, "processor_ms": [], "peak_kib": 0})
     for callers, figure in rates.items():
         known["rates"].setdefault(callers, []).append(figure)
+    known["processor_ms"].append(milliseconds)
     known["peak_kib"] = max(known["peak_kib"], peak)
     file.write_text(json.dumps(found, indent=2))
 

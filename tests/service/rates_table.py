@@ -14,12 +14,13 @@ def main():
     found = json.loads(file.read_text())
     callers = list(next(iter(found.values()))["rates"])
     heads = "".join(f" {number} caller{'s' if number != '1' else ''} |" for number in callers)
-    print(f"| Requests a second |{heads} Peak memory |")
-    print("|---" * (len(callers) + 2) + "|")
+    print(f"| Requests a second |{heads} Processor, a request | Peak memory |")
+    print("|---" * (len(callers) + 3) + "|")
     data = [["way", *callers]]
     for way, known in found.items():
         medians = [statistics.median(known["rates"][number]) for number in callers]
         print(f"| {way} |{''.join(f' {rate:.0f} |' for rate in medians)} "
+              f"{statistics.median(known['processor_ms']):.2f} ms | "
               f"{known['peak_kib'] / 1024:.1f} MiB |")
         data.append([way, *(f"{rate:.1f}" for rate in medians)])
     # A column a way, a row a number of callers.
