@@ -104,7 +104,7 @@ class Surroundings {
     const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir("/proc/self/fd"), closedir);
     if (!open) return false;
     while (const dirent* entry = readdir(open.get())) {
-      const int descriptor = std::atoi(entry->d_name);
+      const int descriptor = static_cast<int>(std::strtol(entry->d_name, nullptr, 10));
       if (descriptor > STDERR_FILENO &&
           posix_spawn_file_actions_addclose(&files_, descriptor) != 0) {
         return false;

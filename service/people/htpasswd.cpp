@@ -19,8 +19,6 @@ namespace {
 
 using KELDOAUTHSERVER::File;
 
-constexpr std::size_t kDigestBytes = 32;
-
 std::string problemWith(const HtpasswdLine& line, bool hasColon, bool isSecond) {
   if (!hasColon) return "has no colon";
   if (!isUserName(line.name)) return "has a name that cannot be used";
@@ -39,8 +37,8 @@ const HtpasswdLine* find(const std::vector<HtpasswdLine>& lines, const std::stri
 /// Any number below `limit`, the same for the same digest.
 std::size_t pick(const std::string& digest, std::size_t limit) {
   std::size_t number = 0;
-  for (std::size_t i = 0; i < sizeof(std::size_t) && i < kDigestBytes; ++i) {
-    number = number << 8U | static_cast<unsigned char>(digest[i]);
+  for (const char byte : digest.substr(0, sizeof number)) {
+    number = number << 8U | static_cast<unsigned char>(byte);
   }
   return number % limit;
 }
