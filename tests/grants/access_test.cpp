@@ -78,6 +78,18 @@ TEST_F(AccessTest, ALoginEndsWithItsFamilyAtTheLatest) {
   EXPECT_EQ(all()[0].ends, kNow + kDay);
 }
 
+TEST_F(AccessTest, APolicyOfMoreThanAHundredYearsIsOneOfAHundred) {
+  constexpr long long kHundredYears = 100 * 365 * kDay;
+  for (const long long asked : {kHundredYears, kHundredYears + 1}) {
+    Policy policy;
+    policy.family = asked;
+    policy.idle = 2 * kHundredYears;
+    open(policy);
+    login(frame_);
+    EXPECT_EQ(all().back().ends, kNow + kHundredYears) << asked;
+  }
+}
+
 TEST_F(AccessTest, CodesComeFirstAndSpentOnesOnlyWhenAskedFor) {
   login(frame_);
   issue(frame_);
@@ -305,6 +317,17 @@ TEST_F(AccessTest, EverythingEnds) {
   EXPECT_EQ(ended.tokens, 4);
   EXPECT_THAT(all(), IsEmpty());
   EXPECT_EQ(sqlText("SELECT COUNT(*) FROM oauth_grantCode"), "0");
+}
+
+TEST_F(AccessTest, AUserWhomTheStoreCannotHoldHasNothingToEnd) {
+  login(frame_);
+  const User impossible(std::string("alice\0", 6));
+  for (const Ended& ended :
+       {access().endUser(impossible, kAdmin), access().endUserWith(impossible, frame_, kAdmin)}) {
+    EXPECT_EQ(ended.codes, 0);
+    EXPECT_EQ(ended.tokens, 0);
+  }
+  EXPECT_THAT(entries(), SizeIs(2));
 }
 
 TEST_F(AccessTest, NothingToEndLeavesNoEntry) {
