@@ -363,6 +363,9 @@ TEST_F(MemoryTest, BuildersGiveATextThatTheEngineRefuses) {
   EXPECT_GT(support::failEachAllocation([&] { text = store->GetUpdateParam(request); },
                                         refused("UPDATE " + table)),
             1);
+  EXPECT_GT(support::failEachAllocation([&] { text = store->ConcateParam(row, " AND "); },
+                                        refused("DELETE FROM " + table + " WHERE ")),
+            1);
   EXPECT_EQ(sqlText("SELECT count(*) FROM oauth_clientInfo WHERE scope='read'"), "1");
 }
 

@@ -164,6 +164,17 @@ TEST_F(ApplicationsTest, AddressesTogetherFitTheirColumn) {
   EXPECT_EQ(whyOf(refused), Why::kTooMuch);
 }
 
+TEST_F(ApplicationsTest, ChangedAddressesTogetherFitTheirColumn) {
+  const auto added = tryToAdd(photos());
+  ApplicationChange change;
+  change.addresses = {RedirectAddress("a:" + std::string(1000, 'x')),
+                      RedirectAddress("b:" + std::string(1000, 'x'))};
+  change.logoutAddresses = {LogoutAddress("c:" + std::string(40, 'x'))};
+  const auto refused = grants().applications.change(added->identifier, change, kAdmin);
+  EXPECT_EQ(errorOf(refused), Error::kInvalidRedirectUri);
+  EXPECT_EQ(whyOf(refused), Why::kTooMuch);
+}
+
 TEST_F(ApplicationsTest, ASecretCannotMakeAnApplicationPublic) {
   NewApplication application = photos();
   application.secret = Secret("public:" + std::string(57, 'x'));

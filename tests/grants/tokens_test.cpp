@@ -218,6 +218,12 @@ TEST_F(TokensTest, AnOwnTokenIsRevoked) {
             "Access ended[Photo Frame " + frame_.text().substr(0, 8) + "] by itself");
 }
 
+TEST_F(TokensTest, ALoginThatCouldNotBeRefreshedIsNotBegun) {
+  LoginRequest asked{User("alice"), frame_, Scope(std::string(1900, 's'))};
+  asked.text = CallerText(std::string(400, 't'));
+  EXPECT_EQ(whyOf(grants().tokens.issue(asked)), Why::kTooMuch);
+}
+
 TEST_F(TokensTest, NoUserCanStandWhereAnApplicationStandsForItself) {
   EXPECT_EQ(whyOf(grants().tokens.issue({User(kNoUser), frame_, kScope})), Why::kReservedUser);
 }

@@ -1,6 +1,7 @@
 // How the library reads numbers out of columns: seen through a row count, whose
 // trace shows the low 32 bits, and through the expiry of a token.
 
+#include "utils/decimal.h"
 #include "core/oauth_db_basic.h"
 #include "stores/oauth_token.h"
 #include "tests/support/case_name.h"
@@ -23,6 +24,13 @@ struct Number {
 
 void PrintTo(const Number& number, std::ostream* out) {
   *out << number.literal;
+}
+
+TEST(DecimalValueTest, NumbersAreReadAsTheirTexts) {
+  EXPECT_EQ(decimalValue(Json::Value(7)), 7);
+  EXPECT_EQ(decimalValue(Json::Value(-7)), -7);
+  EXPECT_EQ(decimalValue(Json::Value(Json::Value::maxInt64)), Json::Value::maxInt64);
+  EXPECT_EQ(decimalValue(Json::Value(true)), 0);
 }
 
 class DecimalTest : public support::World {};
