@@ -126,10 +126,11 @@ END $$;
 -- The tables that the stores created, by the names that they gave them: the
 -- server folds those, and keeps them as they were with the table.
 CREATE OR REPLACE VIEW keldoauth.sqlite_master AS
-SELECT 'table'::text COLLATE "C" AS type, given.name COLLATE "C" AS name,
-       given.name COLLATE "C" AS tbl_name, 0 AS rootpage, NULL::text AS sql
-FROM pg_class, LATERAL (SELECT obj_description(pg_class.oid, 'pg_class') AS name) AS given
-WHERE relnamespace = 'keldoauth'::regnamespace AND relkind = 'r' AND given.name IS NOT NULL;
+SELECT 'table'::text COLLATE "C" AS type, description COLLATE "C" AS name,
+       description COLLATE "C" AS tbl_name, 0 AS rootpage, NULL::text AS sql
+FROM pg_class JOIN pg_description
+  ON objoid = pg_class.oid AND classoid = 'pg_class'::regclass AND objsubid = 0
+WHERE relnamespace = 'keldoauth'::regnamespace AND relkind = 'r';
 SELECT format('GRANT SELECT ON keldoauth.sqlite_master TO %I', :'role') \gexec
 
 -- Functions of SQLite's -------------------------------------------------------
