@@ -26,7 +26,7 @@ if(KELDOAUTH_STATIC_JSONCPP AND SQLITE3_ARCHIVE AND BUILD_SHARED_LIBS)
     keldoauth_headers
     "$<BUILD_INTERFACE:${KELDOAUTH_STATIC_JSONCPP};${SQLITE3_ARCHIVE};keld::core;keld::cgi>"
     "$<INSTALL_INTERFACE:KeldOAuth::jsoncpp_archive;KeldOAuth::sqlite_archive;-lkeldcore;-lkeldcgi>"
-    m)
+    m ${CMAKE_DL_LIBS})
   target_link_options(keldoauth_static INTERFACE
     -static-libstdc++ -static-libgcc LINKER:--gc-sections LINKER:-z,relro LINKER:-z,now)
 elseif(KELDOAUTH_STATIC_PROGRAMS)

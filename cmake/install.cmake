@@ -34,7 +34,7 @@ if(NOT BUILD_SHARED_LIBS)
   # What an archive needs its consumers link.
   target_link_directories(keldoauth INTERFACE $<INSTALL_INTERFACE:${exported_LIBDIR}>)
   set(KELDOAUTH_PC_REQUIRES " sqlite3")
-  set(KELDOAUTH_PC_LIBS " -lkeldcore -lkeldcgi")
+  set(KELDOAUTH_PC_LIBS " -lkeldcore -lkeldcgi -ldl")
 endif()
 
 install(TARGETS keldoauth_headers keldoauth_flavour EXPORT KeldOAuthTargets)
