@@ -5,9 +5,13 @@
 #include "service/http/encoding.h"
 #include "service/people/address.h"
 #include "service/people/auth_log.h"
+#include "service/people/turnstile.h"
 
 namespace keldoauth::service {
 namespace {
+
+/// What PAM takes for a wrong password.
+constexpr int kBusySeconds = 2;
 
 /// Some directories take "Alice" for "alice": case makes no new account.
 std::string folded(std::string name) {
@@ -59,6 +63,11 @@ SignInOutcome signIn(const Directory& directory, Throttle& throttle, const SignI
   if (const int wait = counts.take(); wait != 0) {
     logThrottled("sign-in", attempt.peer);
     return {SignInEnd::kTooOften, "", wait};
+  }
+  const Turnstile turnstile(throttle.path());
+  if (!turnstile.isIn()) {
+    counts.giveBack();
+    return {SignInEnd::kTooOften, "", kBusySeconds};
   }
   const PasswordCheck check = directory.checkPassword(attempt.user, attempt.password);
   if (check.verdict == Verdict::kNo) {

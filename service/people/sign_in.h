@@ -22,7 +22,7 @@ struct SignInTry {
 enum class SignInEnd {
   kIn,
   kWrong,     // name or password; which one, nobody learns
-  kTooOften,  // the password was not looked at
+  kTooOften,  // or too many at once: the password was not looked at
   kCannotSay
 };
 

@@ -73,7 +73,7 @@ Throttle::Place Throttle::placeOf(Deed deed, const std::string& whom) const {
 }
 
 void Throttle::change(std::size_t bucket, const std::function<bool(CounterBucket&)>& change) {
-  if (!isOn_ || counters_.change(bucket, change) || hasComplained_) return;
+  if (path_.empty() || counters_.change(bucket, change) || hasComplained_) return;
   hasComplained_ = true;
   syslog(LOG_AUTH | LOG_WARNING, "cannot keep counters: failed sign-ins are not slowed down");
 }

@@ -32,7 +32,10 @@ class Throttle {
   /// The counters lie in `path`, below a folder that only the service may write
   /// to; an empty path counts nothing. `key` is secret.
   Throttle(const std::string& path, std::string key)
-      : isOn_(!path.empty()), counters_(path), key_(std::move(key)) {}
+      : path_(path), counters_(path), key_(std::move(key)) {}
+
+  /// Where the counters lie.
+  [[nodiscard]] const std::string& path() const { return path_; }
 
   /// 0: it may be done, and is counted. Otherwise it may not, is not counted, and
   /// could be done in so many seconds. Where counters cannot be kept everything
@@ -50,7 +53,7 @@ class Throttle {
   [[nodiscard]] Place placeOf(Deed deed, const std::string& whom) const;
   void change(std::size_t bucket, const std::function<bool(CounterBucket&)>& change);
 
-  bool isOn_;
+  std::string path_;
   bool hasComplained_ = false;
   CounterFile counters_;
   std::string key_;

@@ -39,8 +39,7 @@ TEST_F(AuthLogTest, NoTextFromOutsideEndsItsQuotesOrTheLine) {
 
 TEST_F(AuthLogTest, ALongTextIsCut) {
   logFailedSecret("192.0.2.1", std::string(5000, 'a'));
-  EXPECT_EQ(only().size(),
-            std::string("failed secret from 192.0.2.1 at \"\"").size() + 256);
+  EXPECT_EQ(only().size(), std::string("failed secret from 192.0.2.1 at \"\"").size() + 256);
 }
 
 TEST_F(AuthLogTest, WhatIsNoAddressIsUnknown) {

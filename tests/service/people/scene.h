@@ -7,6 +7,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <map>
 #include <string>
 #include <vector>
@@ -44,6 +45,7 @@ class TestDirectory : public keldoauth::service::Directory {
   std::map<std::string, Person> people;
   bool isBroken = false;
   mutable int checks = 0;
+  std::function<void()> meanwhile = [] {};  // runs in every check
 
   [[nodiscard]] keldoauth::service::PasswordCheck checkPassword(
       const std::string& user, const std::string& password) const override;
