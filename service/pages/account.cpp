@@ -86,8 +86,9 @@ std::string applicationItem(const Settings& settings, const Request& request, co
          scopeWords(settings, held.scope) + logins(settings, request, held) +
          "<div class=\"actions\">\n" + takeBackForm(settings, request, wordOf(held.application)) +
          fill(
-             "<button class=\"danger\" aria-label=\"Take back the access of {}\">Take access back"
-             "</button>\n</form>\n</div>\n</li>\n",
+             "<button class=\"danger\" aria-label=\"Take back access: {}\">Take back "
+             "access</button>\n"
+             "</form>\n</div>\n</li>\n",
              {held.name});
 }
 
