@@ -42,6 +42,11 @@ std::string whenCell(const char* term, long long time) {
   return cell(term, time == 0 ? "not known" : timeText(time));
 }
 
+std::string endCell(const AccessEntry& entry) {
+  const bool isLogin = entry.kind == AccessEntry::Kind::kLogin;
+  return cell(endTerm(entry), (isLogin ? "" : "ends ") + timeText(entry.ends));
+}
+
 std::string entryRow(const Settings& settings, const AccessEntry& entry) {
   return "<tr>" + cell("User", holderCell(settings, entry)) +
          cell("Application", applicationCell(settings, entry)) +

@@ -3,11 +3,17 @@
 #include "service/pages/form_token.h"
 #include "service/pages/frame.h"
 #include "service/pages/html.h"
+#include "service/settings/scopes.h"
 
 namespace keldoauth::service {
 namespace {
 
-constexpr char kDiscovery[] = "/.well-known/oauth-authorization-server";
+/// Where the rest of what it needs can be found.
+std::string discoveryOf(const Settings& settings, const grants::Application& client) {
+  return settings.endpoint(isWithin("openid", client.scope.text())
+                               ? "/.well-known/openid-configuration"
+                               : "/.well-known/oauth-authorization-server");
+}
 
 std::string secretSubject(const grants::ApplicationId& identifier, const grants::Secret& secret) {
   return "secret." + identifier.text() + "." + secret.text();
@@ -52,7 +58,7 @@ std::string pasteCard(const Settings& settings, const Request& request,
          secretRow(settings, request, client, secret, token) +
          addressRows("Redirect address", client.addresses) +
          addressRows("Logout address", client.logoutAddresses) +
-         row("Scopes", client.scope.text()) + row("Discovery", settings.endpoint(kDiscovery)) +
+         row("Scopes", client.scope.text()) + row("Discovery", discoveryOf(settings, client)) +
          row("Sign-in address", settings.endpoint("/oauth/authorize")) +
          row("Token address", settings.endpoint("/oauth/token")) +
          "</dl>\n<p class=\"hint\">Most applications need the first three alone, and find the rest "

@@ -87,8 +87,9 @@ the access back at any time: <a href="{}">My applications</a></p>
 std::string formSubject(const AuthorizationRequest& asked) {
   std::string subject = "consent";
   for (const std::string& part :
-       {asked.client.identifier.text(), asked.redirect, asked.scope, asked.state, asked.challenge,
-        asked.nonce, asked.pushed ? asked.pushed->text() : std::string()}) {
+       {asked.client.identifier.text(), asked.redirect,
+        std::string(asked.redirectWasGiven ? "given" : "implied"), asked.scope, asked.state,
+        asked.challenge, asked.nonce, asked.pushed ? asked.pushed->text() : std::string()}) {
     subject += "." + base64Url(part);
   }
   return subject;

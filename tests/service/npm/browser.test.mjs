@@ -90,6 +90,8 @@ async function inspect(page, name) {
     assert.deepEqual(grave.map(({ id, nodes }) => [id, nodes.map((node) => node.html)]), [],
       `${name} in ${look.name}`)
   }
+  await page.setViewportSize({ width: looks[0].width, height: looks[0].height })
+  await page.emulateMedia({ colorScheme: 'light', media: 'screen', forcedColors: 'none' })
 }
 
 /// How much too wide the page is, and what makes it so.
@@ -104,7 +106,6 @@ function measure() {
 /// What the Tab key reaches, in this order, until it leaves the page: names or texts.
 async function tabStops(page, most = 60) {
   const stops = []
-  await page.emulateMedia({ media: 'screen', forcedColors: 'none' })
   await page.reload()
   for (let i = 0; i < most; ++i) {
     await page.keyboard.press('Tab')
