@@ -51,7 +51,7 @@ std::string entryRow(const Settings& settings, const AccessEntry& entry) {
   return "<tr>" + cell("User", holderCell(settings, entry)) +
          cell("Application", applicationCell(settings, entry)) +
          cell("State", badgeOf(stateOf(entry))) + whenCell("Last used", entry.renewed) +
-         cell("From", escape(entry.from.text())) + whenCell(endTerm(entry), entry.ends) + "</tr>\n";
+         cell("From", escape(entry.from.text())) + endCell(entry) + "</tr>\n";
 }
 
 constexpr char kTableHead[] =
