@@ -62,7 +62,11 @@ const std::string& applicationIdCipher() {
 BareStore::BareStore(Sync sync) : sync_(sync) {
   require(sqlite3_open(names::kDatabaseFile, &db_), db_, "open");
   sqlite3_busy_timeout(db_, 5000);
-  if (sync == Sync::kExtra) run(schema::kSyncFolderToo);
+  startUp();
+}
+
+void BareStore::startUp() {
+  if (sync_ == Sync::kExtra) run(schema::kSyncFolderToo);
   select("SELECT * FROM sqlite_master WHERE name='oauth_meta' and type='table';");
   for (const schema::Step& step : schema::kSteps) run(step.table.statement);
 }

@@ -25,6 +25,8 @@ class BareStore {
   BareStore(const BareStore&) = delete;
   BareStore& operator=(const BareStore&) = delete;
 
+  void startUp();
+
   /// Ends the program when the statement fails.
   void run(const std::string& sql);
   /// The same with a callback that looks at nothing.

@@ -36,7 +36,7 @@ def at_full(measured, name):
 
 
 def process_lines(medium, measured):
-    for name, side in measured.times:
+    for name, side in sorted(measured.times):
         if not name.startswith("P"):
             continue
         ratio, low, high = measured.ratio(name, side)
@@ -49,13 +49,14 @@ def process_lines(medium, measured):
 def write_growth(path, media):
     with path.open("w", newline="") as file:
         table = csv.writer(file, delimiter="\t")
-        table.writerow(["operation", "medium", "rows", "library", "bare", "ratio"])
+        table.writerow(["operation", "medium", "rows", "library", "bare", "ratio", "processor"])
         for medium, measured in media.items():
             for name in measured.names():
                 match = re.match(r"([BL]\d+ [^/]*)/(\d+)$", name)
                 if match and measured.has(name, "library", "bare"):
                     table.writerow([match[1], medium, match[2], measured.median(name, "library"),
-                                    measured.median(name, "bare"), measured.ratio(name)[0]])
+                                    measured.median(name, "bare"), measured.ratio(name)[0],
+                                    measured.processor_ratio(name)])
 
 
 def main():
@@ -65,12 +66,14 @@ def main():
           "Processor's ratio | Baseline at FULL, ratio |")
     print("|---|---|---|---|---|---|---|")
     for medium, measured in media.items():
-        print(*work_lines(medium, measured), sep="\n")
+        for line in work_lines(medium, measured):
+            print(line)
     print("\n| Processes | Medium | Side | Time | Ratio to bare (lowest–highest round) | "
           "Processor's ratio | Peak memory |")
     print("|---|---|---|---|---|---|---|")
     for medium, measured in media.items():
-        print(*process_lines(medium, measured), sep="\n")
+        for line in process_lines(medium, measured):
+            print(line)
     for medium, measured in media.items():
         for failure in measured.failures:
             print(f"\n**Failed on {medium}: {failure}.**")

@@ -191,6 +191,22 @@ void constructBare(benchmark::State& state, Sync sync) {
   for (auto _ : state) BareStore store(sync);
 }
 
+// B9 ------------------------------------------------------------------------
+
+/// The setting and the five statements alone, on a connection that knows the
+/// tables.
+void startUpLibrary(benchmark::State& state) {
+  install({1000, 0, 0});
+  OAUTHDBToken tokens(names::kTokenTable);
+  for (auto _ : state) require(state, tokens.DBInit() != 0);
+}
+
+void startUpBare(benchmark::State& state) {
+  install({1000, 0, 0});
+  BareStore store;
+  for (auto _ : state) store.startUp();
+}
+
 // ---------------------------------------------------------------------------
 
 const bool registered = [] {
@@ -203,6 +219,7 @@ const bool registered = [] {
   add("B6 audit entry with rotation", auditLibrary, auditBare, {50, {1000, 10000}});
   add("B7 getRandomStr(64)", randomLibrary, randomBare, {0, {}});
   add("B8 construct and destroy", constructLibrary, constructBare, {0, {}});
+  add("B9 statements of start-up", startUpLibrary, startUpBare, {0, {}});
   return true;
 }();
 
