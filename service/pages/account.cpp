@@ -54,7 +54,7 @@ std::string takeBackForm(const Settings& settings, const Request& request,
 std::string facts(const AccessEntry& entry) {
   const std::string& from = entry.from.text();
   return "<dl class=\"facts\">\n" + timeRow("Since", entry.since) +
-         timeRow("Last used", entry.renewed) +
+         timeRow("Last used", lastUse(entry)) +
          (from.empty() ? "" : fill("<div><dt>From</dt><dd>{}</dd></div>\n", {from})) +
          timeRow(endTerm(entry), entry.ends) + "</dl>\n";
 }

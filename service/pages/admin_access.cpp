@@ -39,7 +39,7 @@ std::string cell(const char* term, const std::string& markup) {
 }
 
 std::string whenCell(const char* term, long long time) {
-  return cell(term, time == 0 ? "not known" : timeText(time));
+  return cell(term, time == 0 ? "–" : timeText(time));
 }
 
 std::string endCell(const AccessEntry& entry) {
@@ -50,7 +50,7 @@ std::string endCell(const AccessEntry& entry) {
 std::string entryRow(const Settings& settings, const AccessEntry& entry) {
   return "<tr>" + cell("User", holderCell(settings, entry)) +
          cell("Application", applicationCell(settings, entry)) +
-         cell("State", badgeOf(stateOf(entry))) + whenCell("Last used", entry.renewed) +
+         cell("State", badgeOf(stateOf(entry))) + whenCell("Last used", lastUse(entry)) +
          cell("From", escape(entry.from.text())) + endCell(entry) + "</tr>\n";
 }
 

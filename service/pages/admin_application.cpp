@@ -71,7 +71,8 @@ std::string clientField(const grants::Application& client) {
 
 std::string changeForm(const Context& context, const Request& request,
                        const grants::Application& client, const Draft& draft) {
-  return "<section class=\"card\" aria-labelledby=\"change\">\n<h2 id=\"change\">Change it</h2>\n" +
+  return "<section class=\"card screen\" aria-labelledby=\"change\">\n<h2 id=\"change\">Change "
+         "it</h2>\n" +
          formStart(context, request, "change") + clientField(client) +
          draftFields(context.settings, draft, false) +
          "<div class=\"actions\"><button class=\"primary\">Save</button></div>\n</form>\n"
@@ -131,7 +132,8 @@ std::string content(const Context& context, const Request& request, const Parame
          fill("<p><a href=\"{}{}\">Who has given it access</a></p>\n",
               {users, percentEncode(client.identifier.text())}) +
          "<div class=\"columns\">\n" + (draft.fault.empty() ? paste + change : change + paste) +
-         "</div>\n<h2 class=\"spaced\">Switch off, renew, remove</h2>\n<div class=\"actions\">\n" +
+         "</div>\n<h2 class=\"spaced screen\">Switch off, renew, remove</h2>\n<div "
+         "class=\"actions\">\n" +
          switchForm(context, request, client) +
          (secret ? renewForm(context, request, client, *secret) : "") +
          removeForm(context, request, client) + "</div>\n";

@@ -62,7 +62,7 @@ Answer storagePage(Context& context, const Request& request) {
   }
   return view(kStorage, context, request,
               "<p>What is no good any more makes room by itself, and nobody is signed out for it. "
-              "The limits are the settings’ of the library.</p>\n<ul class=\"cards small\">\n" +
+              "The limits stand in the library’s settings.</p>\n<ul class=\"cards small\">\n" +
                   items + "</ul>\n");
 }
 

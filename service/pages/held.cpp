@@ -20,7 +20,7 @@ void add(Held& held, AccessEntry&& entry) {
   held.state = std::max(held.state, stateOf(entry));
   held.scope = tidyScope(held.scope + " " + entry.scope.text());
   held.since = earlier(held.since, entry.since);
-  held.renewed = std::max(held.renewed, entry.renewed);
+  held.renewed = std::max(held.renewed, lastUse(entry));
   held.ends = std::max(held.ends, entry.ends);
   held.entries.push_back(std::move(entry));
 }
@@ -43,6 +43,10 @@ std::vector<Held> heldBy(std::vector<AccessEntry> entries) {
 
 std::string nameOf(const AccessEntry& entry) {
   return entry.applicationName ? entry.applicationName->text() : "An application that was removed";
+}
+
+long long lastUse(const AccessEntry& entry) {
+  return entry.kind == AccessEntry::Kind::kCode ? 0 : entry.renewed;
 }
 
 HeldState stateOf(const AccessEntry& entry) {

@@ -32,6 +32,8 @@ struct Held {
 std::vector<Held> heldBy(std::vector<grants::AccessEntry> entries);
 
 std::string nameOf(const grants::AccessEntry& entry);
+/// As near as the store comes to it: when it was renewed; 0 for what was not used.
+long long lastUse(const grants::AccessEntry& entry);
 HeldState stateOf(const grants::AccessEntry& entry);
 
 /// As markup.

@@ -7,7 +7,7 @@ import { chromium } from 'playwright-core'
 import { createHash, randomBytes } from 'node:crypto'
 import { execFileSync } from 'node:child_process'
 import { createServer } from 'node:http'
-import { mkdirSync } from 'node:fs'
+import { mkdirSync, readFileSync, writeFileSync } from 'node:fs'
 import { strict as assert } from 'node:assert'
 import { after, before, test } from 'node:test'
 import { createRequire } from 'node:module'
@@ -376,6 +376,58 @@ test('an administrator revokes the access of a user', async () => {
     assert.ok((await page.textContent('.notice')).includes('revoked'))
     assert.equal(await revoke.count(), count - 1)
   })
+})
+
+/// Has the service ask for passwords itself while `work` is done.
+async function withPeople(people, work) {
+  const folder = process.env.SERVICE_RUN
+  const path = folder + '/settings.json'
+  const before = readFileSync(path)
+  const file = folder + '/people'
+  for (const [name, password] of Object.entries(people)) {
+    execFileSync(process.env.SERVICE_PROGRAMS + '/keldoauth-service',
+      ['user', 'add', '--file', file, name], { input: password + '\n' })
+  }
+  writeFileSync(path, JSON.stringify({ ...JSON.parse(before), sign_in: 'htpasswd',
+    htpasswd_file: file, counters_file: folder + '/counters' }))
+  try {
+    await work()
+  } finally {
+    writeFileSync(path, before)
+  }
+}
+
+async function signIn(page, name, password) {
+  await page.getByLabel('User name').fill(name)
+  await page.getByLabel('Password').fill(password)
+  await page.getByRole('button', { name: 'Sign in' }).click()
+}
+
+test('people sign in, become somebody else, and sign out by pages', async () => {
+  await withPeople({ alice: 'of alice', carol: 'of carol' }, () => as('alice', async (page) => {
+    await page.goto(question('pages'))
+    await inspect(page, 'sign-in')
+    await signIn(page, 'alice', 'wrong')
+    assert.ok((await page.textContent('main')).includes('wrong'))
+    await inspect(page, 'sign-in-wrong')
+    await signIn(page, 'alice', 'of alice')
+    assert.ok((await page.textContent('.eyebrow')).includes('alice'))
+    await inspect(page, 'consent-session')
+    assert.deepEqual(await tabStops(page), ['Not you?', 'decision', 'decision', 'My applications'])
+    await page.getByRole('link', { name: 'Not you?' }).click()
+    await signIn(page, 'carol', 'of carol')
+    assert.ok((await page.textContent('.eyebrow')).includes('carol'))
+    await page.getByRole('button', { name: 'Allow' }).click()
+    await page.waitForURL(landingAddress + '/**')
+    await page.goto(service.issuer + '/account')
+    await page.getByRole('heading', { name: 'Holiday Photos' }).waitFor()
+    await inspect(page, 'account-session')
+    await page.getByRole('button', { name: 'Sign out' }).click()
+    await page.getByText('You are signed out').waitFor()
+    await inspect(page, 'signed-out')
+    await page.goto(service.issuer + '/account')
+    await page.getByLabel('User name').waitFor()
+  }))
 })
 
 test('every page of the administrator looks right', async () => {
