@@ -1,3 +1,4 @@
+#include <fcntl.h>
 #include <grp.h>
 #include <json/writer.h>
 #include <pwd.h>
@@ -148,16 +149,20 @@ void makeStore() {
 
 // The web server ----------------------------------------------------------------
 
-/// The exit status; -1 when it could not be started.
+/// What goes well says nothing. The exit status; -1 when it could not be started.
 int run(std::vector<std::string> words) {
   std::vector<char*> arguments;
   arguments.reserve(words.size() + 1);
   for (std::string& word : words) arguments.push_back(word.data());
   arguments.push_back(nullptr);
+  posix_spawn_file_actions_t actions;
+  if (posix_spawn_file_actions_init(&actions) != 0) return -1;
   pid_t child = 0;
-  if (posix_spawn(&child, arguments[0], nullptr, nullptr, arguments.data(), environ) != 0) {
-    return -1;
-  }
+  const bool hasStarted =
+      posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0) == 0 &&
+      posix_spawn(&child, arguments[0], &actions, nullptr, arguments.data(), environ) == 0;
+  posix_spawn_file_actions_destroy(&actions);
+  if (!hasStarted) return -1;
   return statusOf(child);
 }
 
