@@ -18,6 +18,7 @@ constexpr signing::Time kLifetime = 3600;
 static_assert(kLifetime < signing::kAfter, "a key is published as long as what it signed is good");
 
 constexpr std::size_t kMostSubject = 255;
+constexpr char kProfile[] = "profile";
 
 Json::Value claimsFor(const Settings& settings, const grants::ApplicationId& audience,
                       const grants::Pair& pair, Occasion occasion) {
@@ -28,6 +29,8 @@ Json::Value claimsFor(const Settings& settings, const grants::ApplicationId& aud
   claims["iat"] = static_cast<Json::Int64>(pair.issued);
   claims["exp"] = static_cast<Json::Int64>(pair.issued + kLifetime);
   claims["at_hash"] = signing::halfDigest(pair.access.text());
+  // There are web sites that never ask for more than this token.
+  if (sharesName(pair.scope.text())) claims["preferred_username"] = pair.user->text();
   const auto login = unpacked(pair.text);
   if (login) claims["auth_time"] = static_cast<Json::Int64>(login->authTime);
   if (login && occasion == Occasion::kLogin && !login->nonce.empty()) {
@@ -40,6 +43,10 @@ Json::Value claimsFor(const Settings& settings, const grants::ApplicationId& aud
 
 bool offersOpenId(const Settings& settings) {
   return !settings.scopes.known(kOpenId).empty();
+}
+
+bool sharesName(const std::string& scope) {
+  return isWithin(kProfile, scope);
 }
 
 bool asksWhoItIs(const std::string& scope) {

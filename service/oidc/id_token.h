@@ -22,6 +22,9 @@ bool offersOpenId(const Settings& settings);
 /// Whether `openid` is among the names of the scope.
 bool asksWhoItIs(const std::string& scope);
 
+/// Whether the scope lets an application know what the user is called here.
+bool sharesName(const std::string& scope);
+
 /// How applications know the user: by the name on this box. One that is not plain
 /// ASCII has a digest of it instead, which begins as no name does.
 std::string openIdSubject(const grants::User& user);

@@ -1,13 +1,11 @@
 #include "grants/grants.h"
 #include "service/oidc/endpoints.h"
 #include "service/oidc/id_token.h"
-#include "service/settings/scopes.h"
 
 namespace keldoauth::service {
 namespace {
 
 constexpr char kRealm[] = "Bearer realm=\"box\"";
-constexpr char kProfile[] = "profile";
 
 Answer refuse(int status, const std::string& error, const std::string& why,
               const std::string& more = "") {
@@ -51,9 +49,7 @@ Answer userInfo(Context& context, const Request& request) {
   }
   Json::Value document;
   document["sub"] = openIdSubject(*bearer->user);
-  if (isWithin(kProfile, bearer->scope.text())) {
-    document["preferred_username"] = bearer->user->text();
-  }
+  if (sharesName(bearer->scope.text())) document["preferred_username"] = bearer->user->text();
   return jsonAnswer(200, document);
 }
 

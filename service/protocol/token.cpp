@@ -11,6 +11,7 @@ namespace {
 
 /// Who asks for a token, and where from.
 struct Asking {
+  const Settings& settings;
   const grants::Application& client;
   grants::PeerAddress from;
 };
@@ -24,9 +25,12 @@ std::string required(const Parameters& form, const char* name) {
   return form.value(name);
 }
 
-std::optional<grants::Scope> askedScope(const Parameters& form) {
+/// Applications of OpenID Connect repeat what they asked for in the first place:
+/// names that this box has never heard of count here as little as there.
+std::optional<grants::Scope> askedScope(const Asking& asking, const Parameters& form) {
   if (!form.has("scope")) return {};
-  const std::string scope = tidyScope(form.value("scope"));
+  std::string scope = tidyScope(form.value("scope"));
+  if (asksWhoItIs(scope)) scope = asking.settings.scopes.known(scope);
   if (scope.empty()) refuse("invalid_scope", "scope names nothing");
   return grants::Scope(scope);
 }
@@ -45,12 +49,14 @@ grants::Outcome<grants::Pair> redeemCode(grants::Grants& store, const Asking& as
 grants::Outcome<grants::Pair> refresh(grants::Grants& store, const Asking& asking,
                                       const Parameters& form) {
   const grants::RefreshToken token(required(form, "refresh_token"));
-  return store.tokens.refresh({asking.client.identifier, token, askedScope(form), asking.from});
+  return store.tokens.refresh(
+      {asking.client.identifier, token, askedScope(asking, form), asking.from});
 }
 
 grants::Outcome<grants::Pair> actForItself(grants::Grants& store, const Asking& asking,
                                            const Parameters& form) {
-  return store.tokens.issueToItself({asking.client.identifier, askedScope(form), asking.from});
+  return store.tokens.issueToItself(
+      {asking.client.identifier, askedScope(asking, form), asking.from});
 }
 
 /// A refresh is done by now and need not say who the user is: a login must not be
@@ -95,7 +101,7 @@ Answer token(Context& context, const Request& request) {
   grants::Grants& store = context.store.open();
   const grants::Application client = authenticate(store, credentials);
   if (const auto fault = faultOfResource(context.settings, form)) refuse(fault->error, fault->why);
-  const auto pair = grantOf(form)(store, {client, peerAddress(request)}, form);
+  const auto pair = grantOf(form)(store, {context.settings, client, peerAddress(request)}, form);
   if (!pair) return refusalAnswer(pair.refusal());
   const bool isRefresh = form.value("grant_type") == "refresh_token";
   return success(*pair, idTokenOrNone(context.settings, client, *pair, isRefresh));

@@ -43,8 +43,10 @@ TEST_F(OidcTokensTest, LoginSaysWhoTheUserIs) {
   EXPECT_EQ(said["exp"].asInt64(), kNow + 3600);
   EXPECT_EQ(said["auth_time"].asInt64(), kNow);
   EXPECT_EQ(said["at_hash"], signing::halfDigest(tokens["access_token"].asString()));
-  EXPECT_THAT(said.getMemberNames(), UnorderedElementsAre("iss", "sub", "aud", "nonce", "iat",
-                                                          "exp", "auth_time", "at_hash"));
+  EXPECT_EQ(said["preferred_username"], "alice");
+  EXPECT_THAT(said.getMemberNames(),
+              UnorderedElementsAre("iss", "sub", "aud", "nonce", "iat", "exp", "auth_time",
+                                   "at_hash", "preferred_username"));
 }
 
 TEST_F(OidcTokensTest, TimeIsThatOfTheSignInNotOfTheLogin) {
@@ -96,6 +98,23 @@ TEST_F(OidcTokensTest, ScopesThatNobodyKnowsDoNotCount) {
       redeemed(app, returned(allowed(call(authorize, fromAlice(request))))["code"]);
   EXPECT_EQ(tokens["scope"], "openid");
   EXPECT_EQ(claims(tokens)["sub"], "alice");
+  EXPECT_FALSE(claims(tokens).isMember("preferred_username"));
+}
+
+TEST_F(OidcTokensTest, ScopesThatNobodyKnowsDoNotCountForARefreshEither) {
+  const grants::Registered app = application();
+  const Json::Value again = refreshed(app, login(app), "&scope=openid+profile+offline_access");
+  EXPECT_EQ(again["scope"], "openid profile");
+  EXPECT_TRUE(again.isMember("id_token"));
+}
+
+TEST_F(OidcTokensTest, ScopeThatTheBoxKnowsAndTheLoginDoesNotCannotBeHadByARefresh) {
+  const grants::Registered app = application();
+  const Json::Value tokens = login(app);
+  const Request request =
+      post("/oauth/token", "grant_type=refresh_token&scope=openid+files.read&refresh_token=" +
+                               tokens["refresh_token"].asString());
+  EXPECT_EQ(error(call(token, by(app, request))), "400 invalid_scope");
 }
 
 TEST_F(OidcTokensTest, LostKeysAreFoundOutBeforeTheUserIsAsked) {
