@@ -168,16 +168,19 @@ def encode(parameters):
 
 
 class Form(html.parser.HTMLParser):
-    """The hidden fields of the first form of a page."""
+    """Where the first form of a page goes, and its hidden fields."""
 
     def __init__(self, page):
         super().__init__()
+        self.action = None
         self.fields = {}
         self.done = False
         self.feed(page)
 
     def handle_starttag(self, tag, attributes):
         values = dict(attributes)
+        if tag == "form" and not self.done:
+            self.action = values.get("action")
         if tag == "input" and values.get("type") == "hidden" and not self.done:
             self.fields[values["name"]] = values["value"]
 

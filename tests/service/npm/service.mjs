@@ -28,22 +28,47 @@ function unescape(text) {
   return text.replace(/&(lt|gt|quot|#39|amp);/g, (entity) => characters[entity])
 }
 
-/// What a person does whom a client sent to `address`: where they end up.
-export async function consent(address, user = 'alice', decision = 'allow') {
-  const authorization = 'Basic ' + btoa(`${user}:${passwords[user]}`)
-  const page = await fetch(address, { headers: { authorization }, redirect: 'manual' })
-  const text = await page.text()
-  // They have agreed before.
-  if (page.status === 302) return new URL(page.headers.get('location'))
-  assert.equal(page.status, 200, text)
-  const fields = new URLSearchParams({ decision })
-  for (const [, name, value] of text.matchAll(/type="hidden" name="([^"]+)" value="([^"]*)"/g)) {
-    fields.set(name, unescape(value))
+const cookies = {}
+
+/// A request of a person's browser, which keeps the service's cookies.
+async function browse(address, user, form) {
+  const jar = (cookies[user] ??= new Map())
+  const headers = { cookie: [...jar].map((pair) => pair.join('=')).join('; ') }
+  if (process.env.SERVICE_SIGN_IN === 'web-server') {
+    headers.authorization = 'Basic ' + btoa(`${user}:${passwords[user]}`)
   }
-  const answer = await fetch(issuer + '/oauth/authorize', {
-    method: 'POST', headers: { authorization }, body: fields, redirect: 'manual' })
-  assert.equal(answer.status, 303)
-  return new URL(answer.headers.get('location'))
+  const answer = await fetch(address, {
+    method: form ? 'POST' : 'GET', headers, body: form, redirect: 'manual' })
+  for (const cookie of answer.headers.getSetCookie()) {
+    const [, name, value] = cookie.match(/^([^=]+)=([^;]*)/)
+    if (value) jar.set(name, value)
+    else jar.delete(name)
+  }
+  return answer
+}
+
+function hiddenFields(page) {
+  return [...page.matchAll(/type="hidden" name="([^"]+)" value="([^"]*)"/g)]
+    .map(([, name, value]) => [name, unescape(value)])
+}
+
+/// What a person does whom a client sent to `address`, signed in or not, asked or
+/// not: where they end up.
+export async function consent(address, user = 'alice', decision = 'allow') {
+  for (;;) {
+    let answer = await browse(address, user)
+    if (answer.status === 200) {
+      const page = await answer.text()
+      const given = page.includes('name="password"')
+        ? { user, password: passwords[user] } : { decision }
+      const action = new URL(unescape(page.match(/<form[^>]* action="([^"]+)"/)[1]), address)
+      answer = await browse(action, user,
+        new URLSearchParams([...hiddenFields(page), ...Object.entries(given)]))
+    }
+    assert.ok([302, 303].includes(answer.status), await answer.text())
+    address = new URL(answer.headers.get('location'), address)
+    if (address.origin !== new URL(issuer).origin) return address
+  }
 }
 
 export async function register(metadata = {}) {
