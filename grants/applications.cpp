@@ -82,7 +82,8 @@ RegistryWords wordsOf(const NewApplication& application) {
           textsOf(application.logoutAddresses),
           !application.needsPkce && !isPublic,
           application.registersItself,
-          {}};
+          {},
+          application.wantsEs256};
 }
 
 std::optional<Refusal> faultOf(const NewApplication& application) {
@@ -252,11 +253,12 @@ RegistryWords changedWords(const ApplicationRow& row, const ApplicationChange& c
   if (change.needsPkce && row.shown.kind != ApplicationKind::kPublic) {
     words.isPkceOptional = !*change.needsPkce;
   }
+  words.wantsEs256 = change.wantsEs256.value_or(words.wantsEs256);
   return words;
 }
 
 bool changesWords(const ApplicationChange& change) {
-  return change.addresses || change.logoutAddresses || change.needsPkce;
+  return change.addresses || change.logoutAddresses || change.needsPkce || change.wantsEs256;
 }
 
 /// Addresses that another program stored without a scheme may stay.

@@ -34,6 +34,9 @@ struct Application {
   bool needsPkce;         // always true of a public one
   bool registeredItself;  // not by an administrator
   long long row;          // for showing only: ids are given out again
+  /// Who a user is, is signed for it with ES256 and not with RS256, where that
+  /// is said at all.
+  bool wantsEs256 = false;
 };
 
 struct NewApplication {
@@ -48,6 +51,7 @@ struct NewApplication {
   std::vector<LogoutAddress> logoutAddresses = {};  // as the addresses
   bool needsPkce = true;
   bool registersItself = false;
+  bool wantsEs256 = false;
   bool isEnabled = true;
   /// Generated when absent. An identifier has 64 of the letters, digits and
   /// "-._~".
@@ -70,6 +74,7 @@ struct ApplicationChange {
   std::optional<std::vector<LogoutAddress>> logoutAddresses = {};
   std::optional<Scope> scope = {};
   std::optional<bool> needsPkce = {};
+  std::optional<bool> wantsEs256 = {};
 };
 
 /// Rows that went with an application, dead and spent ones and pushed requests

@@ -82,7 +82,8 @@ ApplicationRow applicationOf(const Json::Value& row) {
                     Scope(textIn(row, names::kScope)),
                     isPublic || !words.isPkceOptional,
                     words.registeredItself,
-                    decimalValue(row[names::kId])};
+                    decimalValue(row[names::kId]),
+                    words.wantsEs256};
   return {std::move(shown), secret, std::move(words)};
 }
 

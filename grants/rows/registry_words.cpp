@@ -10,6 +10,7 @@ namespace {
 constexpr std::string_view kNone = "(none)";
 constexpr std::string_view kPkceOptional = "(pkce-optional)";
 constexpr std::string_view kSelf = "(self)";
+constexpr std::string_view kEs256 = "(es256)";
 constexpr std::string_view kLogout = "(logout:";
 
 void append(std::string& text, std::string_view word) {
@@ -28,6 +29,8 @@ void take(std::string_view word, RegistryWords& words) {
     words.isPkceOptional = true;
   } else if (word == kSelf) {
     words.registeredItself = true;
+  } else if (word == kEs256) {
+    words.wantsEs256 = true;
   } else if (isLogout(word)) {
     words.logoutAddresses.emplace_back(
         word.substr(kLogout.size(), word.size() - kLogout.size() - 1));
@@ -46,6 +49,7 @@ std::string pack(const RegistryWords& words) {
   if (words.addresses.empty()) append(text, kNone);
   if (words.isPkceOptional) append(text, kPkceOptional);
   if (words.registeredItself) append(text, kSelf);
+  if (words.wantsEs256) append(text, kEs256);
   for (const std::string& address : words.logoutAddresses) {
     append(text, std::string(kLogout) + address + ")");
   }

@@ -6,6 +6,7 @@
 //   (pkce-optional)     codes may be asked for without a challenge
 //   (self)              registered itself
 //   (logout:ADDRESS)    where a user may be sent after logging out
+//   (es256)             wants that signature, and not RS256
 //
 // A word that is not known stays where it is.
 
@@ -24,6 +25,7 @@ struct RegistryWords {
   bool isPkceOptional;
   bool registeredItself;
   std::vector<std::string> others;
+  bool wantsEs256 = false;
 };
 
 std::string pack(const RegistryWords& words);

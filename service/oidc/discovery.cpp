@@ -22,7 +22,7 @@ void addOpenIdMembers(const Settings& settings, Json::Value& document) {
   document["userinfo_endpoint"] = settings.endpoint("/oauth/userinfo");
   document["end_session_endpoint"] = settings.endpoint("/oauth/logout");
   document["subject_types_supported"] = list({"public"});
-  document["id_token_signing_alg_values_supported"] = list({"RS256"});
+  document["id_token_signing_alg_values_supported"] = list({"RS256", "ES256"});
   document["claims_supported"] = list(
       {"iss", "sub", "aud", "exp", "iat", "auth_time", "nonce", "at_hash", "preferred_username"});
   document["prompt_values_supported"] = list({"none", "login", "consent", "select_account"});

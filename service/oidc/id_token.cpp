@@ -20,12 +20,12 @@ static_assert(kLifetime < signing::kAfter, "a key is published as long as what i
 constexpr std::size_t kMostSubject = 255;
 constexpr char kProfile[] = "profile";
 
-Json::Value claimsFor(const Settings& settings, const grants::ApplicationId& audience,
+Json::Value claimsFor(const Settings& settings, const grants::Application& audience,
                       const grants::Pair& pair, Occasion occasion) {
   Json::Value claims(Json::objectValue);
   claims["iss"] = settings.issuer;
   claims["sub"] = openIdSubject(*pair.user);
-  claims["aud"] = audience.text();
+  claims["aud"] = audience.identifier.text();
   claims["iat"] = static_cast<Json::Int64>(pair.issued);
   claims["exp"] = static_cast<Json::Int64>(pair.issued + kLifetime);
   claims["at_hash"] = signing::halfDigest(pair.access.text());
@@ -64,12 +64,14 @@ std::string openIdSubject(const grants::User& user) {
          signing::toBase64Url({reinterpret_cast<const char*>(digest.data()), digest.size()});
 }
 
-std::string idTokenFor(const Settings& settings, const grants::ApplicationId& audience,
+std::string idTokenFor(const Settings& settings, const grants::Application& audience,
                        const grants::Pair& pair, Occasion occasion) {
   if (!pair.user || !offersOpenId(settings) || !asksWhoItIs(pair.scope.text())) return {};
   const signing::KeySet keys = signing::KeyFile(settings.signingKeysFile).read();
+  const auto algorithm =
+      audience.wantsEs256 ? signing::Algorithm::kEs256 : signing::Algorithm::kRs256;
   return signing::signedToken(claimsFor(settings, audience, pair, occasion),
-                              keys.signingKey(signing::Algorithm::kRs256, pair.issued));
+                              keys.signingKey(algorithm, pair.issued));
 }
 
 }  // namespace keldoauth::service

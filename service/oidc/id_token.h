@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "grants/applications.h"
 #include "grants/tokens.h"
 #include "service/settings/settings.h"
 
@@ -33,7 +34,7 @@ enum class Occasion { kLogin, kRefresh };
 
 /// For the pair of a user with the scope `openid`, empty for any other. It lasts
 /// an hour; on a refresh it has no nonce. Throws signing::KeyFault.
-std::string idTokenFor(const Settings& settings, const grants::ApplicationId& audience,
+std::string idTokenFor(const Settings& settings, const grants::Application& audience,
                        const grants::Pair& pair, Occasion occasion);
 
 }  // namespace keldoauth::service

@@ -11,6 +11,8 @@
 namespace keldoauth::service {
 namespace {
 
+constexpr char kRs256[] = "RS256";
+constexpr char kEs256[] = "ES256";
 constexpr char kDefaultScope[] = "openid profile";
 
 [[noreturn]] void refuse(const std::string& why) {
@@ -108,6 +110,14 @@ std::string readMethod(const Json::Value& document, const std::string& otherwise
   return method;
 }
 
+bool wantsEs256(const Json::Value& document) {
+  const std::string algorithm = text(document, "id_token_signed_response_alg", kRs256);
+  if (algorithm != kRs256 && algorithm != kEs256) {
+    refuse("id_token_signed_response_alg is not supported");
+  }
+  return algorithm == kEs256;
+}
+
 /// Without a secret anybody could be it.
 void requireUse(const Json::Value& document, grants::ApplicationKind kind) {
   if (kind != grants::ApplicationKind::kPublic) return;
@@ -149,6 +159,7 @@ ClientMetadata readClientMetadata(const Settings& settings, const Json::Value& d
   read.name = readName(document);
   read.scope = readScope(settings.scopes, document);
   read.addresses = readRedirects(document, read.kind);
+  read.wantsEs256 = wantsEs256(document);
   read.logoutAddresses =
       readAddresses<grants::LogoutAddress>(document, "post_logout_redirect_uris", read.kind);
   return read;
@@ -178,7 +189,7 @@ Json::Value clientInformation(const Settings& settings, const grants::Applicatio
     for (const grants::LogoutAddress& address : application.logoutAddresses) {
       document["post_logout_redirect_uris"].append(address.text());
     }
-    document["id_token_signed_response_alg"] = "RS256";
+    document["id_token_signed_response_alg"] = application.wantsEs256 ? kEs256 : kRs256;
     document["response_types"].append("code");
     document["grant_types"].append("authorization_code");
     document["grant_types"].append("refresh_token");

@@ -23,6 +23,7 @@ struct ClientMetadata {
   grants::Scope scope;
   grants::ApplicationKind kind;
   std::string method;  // at the token endpoint
+  bool wantsEs256 = false;
 };
 
 /// The JSON object that the request brings. Throws Refusal.

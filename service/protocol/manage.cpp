@@ -76,6 +76,7 @@ Answer replace(Context& context, const Request& request, const Holder& holder) {
   change.name = metadata.name;
   change.addresses = metadata.addresses;
   change.logoutAddresses = metadata.logoutAddresses;
+  change.wantsEs256 = metadata.wantsEs256;
   change.scope = metadata.scope;
   const auto changed = context.store.open().applications.change(holder.application.identifier,
                                                                 change, grants::kItself);

@@ -24,6 +24,7 @@ grants::Registered add(grants::Grants& store, const ClientMetadata& metadata) {
   grants::NewApplication application{metadata.name, metadata.addresses, metadata.scope,
                                      metadata.kind};
   application.logoutAddresses = metadata.logoutAddresses;
+  application.wantsEs256 = metadata.wantsEs256;
   application.registersItself = true;
   const auto added = store.applications.add(application, grants::Actor(metadata.name.text()));
   if (!added) throw Refusal{refusalAnswer(added.refusal())};
@@ -45,6 +46,7 @@ Answer registerApplication(Context& context, const Request& request) {
   application.name = metadata.name;
   application.addresses = metadata.addresses;
   application.logoutAddresses = metadata.logoutAddresses;
+  application.wantsEs256 = metadata.wantsEs256;
   application.scope = metadata.scope;
   Json::Value answer = clientInformation(context.settings, application, registered.secret);
   answer["token_endpoint_auth_method"] = metadata.method;

@@ -331,6 +331,7 @@ TEST_F(ApplicationsTest, ARenewedSecretReplacesTheOldOne) {
 TEST_F(ApplicationsTest, OnlyWhatIsGivenChanges) {
   NewApplication application = photos();
   application.logoutAddresses = {LogoutAddress("https://photos.example.org/bye")};
+  application.wantsEs256 = true;
   const ApplicationId identifier = tryToAdd(application)->identifier;
   ApplicationChange change;
   change.addresses = {RedirectAddress("https://new.example/")};
@@ -341,6 +342,7 @@ TEST_F(ApplicationsTest, OnlyWhatIsGivenChanges) {
   EXPECT_EQ(changed->scope, application.scope);
   EXPECT_EQ(changed->logoutAddresses, application.logoutAddresses);
   EXPECT_TRUE(changed->needsPkce);
+  EXPECT_TRUE(changed->wantsEs256);
 }
 
 TEST_F(ApplicationsTest, AnotherProgramsAddressesStayAsTheyAre) {

@@ -12,10 +12,14 @@ using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
 TEST(RegistryWordsTest, EverythingComesBackAsItWas) {
-  const std::string text = pack(
-      {{"https://a.example/", "app:/x"}, {"https://a.example/(bye)"}, true, true, {"(later)"}});
+  const std::string text = pack({{"https://a.example/", "app:/x"},
+                                 {"https://a.example/(bye)"},
+                                 true,
+                                 true,
+                                 {"(later)"},
+                                 true});
   EXPECT_EQ(text,
-            "https://a.example/ app:/x (pkce-optional) (self) "
+            "https://a.example/ app:/x (pkce-optional) (self) (es256) "
             "(logout:https://a.example/(bye)) (later)");
   const RegistryWords words = unpackWords(text);
   EXPECT_THAT(words.addresses, ElementsAre("https://a.example/", "app:/x"));
@@ -23,6 +27,7 @@ TEST(RegistryWordsTest, EverythingComesBackAsItWas) {
   EXPECT_TRUE(words.isPkceOptional);
   EXPECT_TRUE(words.registeredItself);
   EXPECT_THAT(words.others, ElementsAre("(later)"));
+  EXPECT_TRUE(words.wantsEs256);
 }
 
 TEST(RegistryWordsTest, NoAddressIsAWordOfItsOwn) {

@@ -47,10 +47,11 @@ void OidcTest::TearDown() {
   World::TearDown();
 }
 
-grants::Registered OidcTest::application() {
+grants::Registered OidcTest::application(bool wantsEs256) {
   grants::NewApplication application{grants::ApplicationName("App"),
                                      {grants::RedirectAddress(kCallback)},
                                      grants::Scope("openid profile files.read")};
+  application.wantsEs256 = wantsEs256;
   application.logoutAddresses = {grants::LogoutAddress(kGoodbye)};
   const auto added = store.open().applications.add(application, grants::Actor("admin"));
   EXPECT_TRUE(added);

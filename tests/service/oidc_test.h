@@ -23,7 +23,7 @@ class OidcTest : public ServiceTest {
   void TearDown() override;
 
   /// An application that may ask for everything, with kGoodbye.
-  grants::Registered application();
+  grants::Registered application(bool wantsEs256 = false);
 
   /// From alice, who signed in this many seconds ago with a session.
   static Request fromAlice(Request request, long long secondsAgo = 0);

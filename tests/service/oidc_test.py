@@ -60,6 +60,19 @@ class ByHand(unittest.TestCase):
                                     "post_logout_redirect_uris": ["javascript:alert(1)"]})
         self.assertEqual(bad.status, 400)
 
+    def test_signature_is_the_one_that_was_registered(self):
+        for asked, got in ((None, "RS256"), ("RS256", "RS256"), ("ES256", "ES256")):
+            client = service.register(scope="openid", **(
+                {
+  "id_token_signed_response_alg" : asked} if asked else {}))
+            head = client.tokens(scope="openid")["id_token"].split(".")[0]
+            self.assertEqual(json.loads(base64.urlsafe_b64decode(head + "=="))["alg"], got)
+        for bad in ("none", "HS256", "es256", 1):
+            answer = service.register_raw({"redirect_uris": [CALLBACK],
+                                           "id_token_signed_response_alg": bad})
+            self.assertEqual((answer.status, answer.json["error"]),
+                             (400, "invalid_client_metadata"), bad)
+
     def test_key_set_is_readable_by_scripts_of_any_origin(self):
         answer = send("GET", "/oauth/jwks", headers={"Origin": "https://app.example"})
         self.assertEqual(answer.headers["Access-Control-Allow-Origin"], "*")
@@ -128,7 +141,7 @@ class Authlib(unittest.TestCase):
 
     def test_discovery_is_valid(self):
         metadata = OpenIDProviderMetadata(self.server)
-        # The library wants the TLS that the tests do without.
+#The library wants the TLS that the tests do without.
         for name in ("issuer", "authorization_endpoint", "token_endpoint", "jwks_uri",
                      "registration_endpoint"):
             if name in metadata:

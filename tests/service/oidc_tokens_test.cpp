@@ -49,6 +49,14 @@ TEST_F(OidcTokensTest, LoginSaysWhoTheUserIs) {
                                    "at_hash", "preferred_username"));
 }
 
+TEST_F(OidcTokensTest, ApplicationChoosesTheSignatureWhenItRegisters) {
+  for (const bool wantsEs256 : {false, true}) {
+    const std::string token = login(application(wantsEs256))["id_token"].asString();
+    const std::string head = signing::fromBase64Url(token.substr(0, token.find('.'))).value();
+    EXPECT_THAT(head, HasSubstr(wantsEs256 ? "\"ES256\"" : "\"RS256\""));
+  }
+}
+
 TEST_F(OidcTokensTest, TimeIsThatOfTheSignInNotOfTheLogin) {
   const grants::Registered app = application();
   const Answer page = call(authorize, fromAlice(authorization(app, ""), 500));
