@@ -21,6 +21,8 @@ constexpr char kEverything[] = "all";
 constexpr std::string_view kLoginStart = "login.";
 constexpr std::string_view kApplicationStart = "application.";
 
+constexpr std::size_t kMostLogins = 20;  // shown of one application
+
 std::string wordOf(const grants::AccessHandle& handle) {
   const char* table = handle.table == grants::AccessHandle::Table::kCodes ? "code" : "token";
   return std::string(kLoginStart) + table + "." + std::to_string(handle.row) + "." + handle.mark;
@@ -72,12 +74,18 @@ std::string logins(const Settings& settings, const Request& request, const Held&
   if (held.entries.size() == 1) {
     return badgeOf(held.state) + facts(held.entries.front());
   }
+  // Other programs bound nothing, and a page has to stay one.
+  const std::size_t count = held.entries.size();
   std::string items;
-  for (const AccessEntry& entry : held.entries) items += loginItem(settings, request, entry);
+  for (std::size_t i = count; i > 0 && i + kMostLogins > count; --i) {
+    items += loginItem(settings, request, held.entries[i - 1]);
+  }
   return badgeOf(held.state) +
          fill("<details class=\"logins\"><summary>{} sign-ins</summary>\n<ul>\n",
-              {std::to_string(held.entries.size())}) +
-         items + "</ul>\n</details>\n";
+              {std::to_string(count)}) +
+         items + "</ul>\n" +
+         (count <= kMostLogins ? "" : "<p class=\"hint\">These are the newest of them.</p>\n") +
+         "</details>\n";
 }
 
 std::string applicationItem(const Settings& settings, const Request& request, const Held& held) {

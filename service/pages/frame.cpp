@@ -124,12 +124,11 @@ std::string turns(const Settings& settings, const Turn& turn) {
   const long long first = (turn.page - 1LL) * kRowsOfPage + 1;
   const long long last = std::min<long long>(turn.total, first + kRowsOfPage - 1);
   const long long pages = (turn.total + kRowsOfPage - 1) / kRowsOfPage;
-  if (turn.total == 0) return {};
+  if (pages <= 1 && turn.page == 1) return {};
   std::string text =
       fill("<p class=\"hint\">{} of {} {}</p>\n",
            {first > last ? "None" : std::to_string(first) + " to " + std::to_string(last),
             std::to_string(turn.total), turn.what});
-  if (pages <= 1 && turn.page == 1) return text;
   text += fill("<nav class=\"actions\" aria-label=\"Pages of {}\">\n", {turn.what});
   if (turn.page > 2) text += turnLink(settings, turn, 1, "First");
   if (turn.page > 1) {

@@ -61,7 +61,8 @@ inline constexpr int kRowsOfPage = 50;
 
 /// Any text will do: no list is so long that it had more pages.
 int pageNumber(const std::string& text);
-/// "51 to 100 of 312 applications", and the ways to the others.
+/// "51 to 100 of 312 applications", and the ways to the others; nothing when all
+/// are on the page.
 std::string turns(const Settings& settings, const Turn& turn);
 
 /// A search form for such a list. `view` is the word in the query, empty for the

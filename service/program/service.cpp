@@ -7,6 +7,7 @@
 
 #include "grants/trouble.h"
 #include "service/http/web_address.h"
+#include "service/pages/html.h"
 #include "service/people/people.h"
 #include "service/people/slow_down.h"
 #include "service/protocol/cors.h"
@@ -30,6 +31,13 @@ constexpr Failure kBroken{500, "server_error", "Something is wrong with the box"
 constexpr Failure kInTheClear{403, "invalid_request", "Not without TLS",
                               "What is sent to this service must not be readable on the way: it "
                               "answers at its https address alone."};
+
+/// To people as a page, to programs in as few words as can be.
+Answer tellNoSuchPage(const Settings& settings, const Request& request) {
+  if (request.accept.find("text/html") == std::string::npos) return plainAnswer(404);
+  return messagePage(settings, 404, "There is no such page",
+                     "The address is not one of this service.", "/account");
+}
 
 Answer tellBusy(const Route& route, const Settings& settings) {
   return route.tell(settings, kBusy).with("Retry-After", kRetryAfterSeconds);
@@ -56,7 +64,7 @@ Service::Service(std::string settingsPath) : settings_(std::move(settingsPath)) 
 Answer Service::answer(const Request& request) try {
   const Settings& settings = settings_.current();
   const Route* const route = routeOf(request.path, settings.basePath);
-  if (route == nullptr) return plainAnswer(404);
+  if (route == nullptr) return tellNoSuchPage(settings, request);
   if (!request.isSecure && !isLoopbackPeer(request.peer)) return route->tell(settings, kInTheClear);
   if (route->openTo != nullptr && request.method == "OPTIONS") {
     return preflightAnswer(route->openTo);

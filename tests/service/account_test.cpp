@@ -112,6 +112,21 @@ TEST_F(AccountTest, ADoubledFieldIsRefused) {
   EXPECT_EQ(call(account, request).status, 403);
 }
 
+/// As another program may have stored them, which no bound holds for.
+TEST_F(AccountTest, OfVeryManySignInsTheNewestAreShown) {
+  logIn(addConfidential(kCallback));
+  sql("WITH RECURSIVE more(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM more WHERE n < 99) "
+      "INSERT INTO oauth_token(username, client_id, scope, refresh_token, access_token, "
+      "expired_time, flow_type, state, ip) SELECT username, client_id, scope, 'r' || n, "
+      "'a' || n, expired_time, flow_type, state, ip FROM oauth_token, more");
+  const Answer page = show(account, "alice");
+  EXPECT_TRUE(has(page, "100 sign-ins"));
+  EXPECT_TRUE(has(page, "These are the newest of them"));
+  EXPECT_EQ(formsOf(page).size(), 20U + 2U);
+  EXPECT_EQ(done("alice", formsOf(page).at(20)), "ended");
+  EXPECT_TRUE(has(show(account, "alice"), "No application has access"));
+}
+
 TEST_F(AccountTest, EverythingIsTakenBackAtOnce) {
   const Json::Value login = logIn(addConfidential(kCallback));
   EXPECT_EQ(done("alice", forms().back()), "ended");

@@ -72,6 +72,12 @@ class Page(unittest.TestCase):
             self.assertNotIn("<script", answer.text)
             self.assertEqual(answer.headers["Cache-Control"], "no-store")
 
+    def test_page_that_is_none_is_told_to_people_as_a_page(self):
+        answer = send("GET", "/accounts", headers={"Accept": "text/html,*/*"})
+        self.assertEqual(answer.status, 404)
+        self.assertIn('/account">Back</a>', answer.text)
+        self.assertEqual(send("GET", "/accounts").text, "404 Not Found\n")
+
     def test_style_is_served(self):
         for name in ("service", "lists"):
             sheet = send("GET", f"/style/{name}.css")

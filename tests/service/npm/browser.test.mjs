@@ -264,6 +264,10 @@ test('an unknown application gets a page, not a redirect', async () => {
     assert.ok(page.url().startsWith(service.issuer))
     assert.ok((await page.textContent('main')).includes('not known'))
     await inspect(page, 'refused')
+    await page.goto(service.issuer + '/accounts')
+    assert.ok((await page.textContent('main')).includes('no such page'))
+    await page.getByRole('link', { name: 'Back' }).click()
+    assert.equal(await page.textContent('h1'), 'My applications')
   })
 })
 
@@ -345,7 +349,7 @@ test('a user sees their applications, and takes one back', async () => {
   }
   await logIn('bob', made[0])
   await as('bob', async (page) => {
-    await page.goto(service.issuer + '/')
+    await page.goto(new URL('/', service.issuer).href)
     assert.equal(await page.textContent('h1'), 'My applications')
     const card = page.getByRole('listitem').filter({ hasText: 'Kitchen Radio' })
     assert.ok((await card.textContent()).includes('See your photo albums'))
