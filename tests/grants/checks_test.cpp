@@ -36,6 +36,15 @@ TEST(ChecksTest, AddressesAreAbsoluteAndPrintable) {
   }
 }
 
+TEST(ChecksTest, ASchemeBeginsWithALetterOfAscii) {
+  for (const char* text : {"a:x", "z:x", "A:x", "Z:x", "m0:x", "m9:x"}) {
+    EXPECT_TRUE(isAddress(text)) << text;
+  }
+  for (const char* text : {"`:x", "{:x", "@:x", "[:x", "0:x", "9:x", "m/:x", "m;:x"}) {
+    EXPECT_FALSE(isAddress(text)) << text;
+  }
+}
+
 TEST(ChecksTest, IdentifiersHave64Characters) {
   EXPECT_TRUE(isIdentifier(std::string(64, 'a')));
   EXPECT_TRUE(isIdentifier(std::string(60, 'Z') + "-._~"));
