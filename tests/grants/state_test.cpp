@@ -4,11 +4,15 @@
 
 #include <gtest/gtest.h>
 
+#include <limits>
 #include <string>
 
 namespace {
 
 using namespace KELDOAUTHSERVER::grants::rows;
+
+// The number with the longest text.
+constexpr long long kLowest = std::numeric_limits<long long>::min();
 
 const std::string kHostile("it's 1:2 \xff\xfe '' \n 3:abc");
 
@@ -139,6 +143,10 @@ TEST(StateTest, WhatFitsOnceFitsForEver) {
   constexpr long long kFar = 9999999999999;
   EXPECT_LE(pack(TokenState{kFar, kFar, kFar, mark, mark, mark, scope, state.text}).size(), 2048U);
   EXPECT_GT(scope.size(), 1000U);
+
+  // With numbers of all the digits that there are, the column is full.
+  EXPECT_EQ(pack(TokenState{kLowest, kLowest, kLowest, mark, mark, mark, scope, state.text}).size(),
+            2048U);
 }
 
 TEST(StateTest, TheAddressOfACodeThatIsSpentCounts) {
@@ -149,6 +157,9 @@ TEST(StateTest, TheAddressOfACodeThatIsSpentCounts) {
   state.spent = Spent{9999999999999, 9999999999999, std::string(64, 'm')};
   EXPECT_LE(pack(state).size(), 2048U);
   EXPECT_GT(state.redirect.size(), 1400U);
+
+  state.spent = Spent{kLowest, kLowest, std::string(64, 'm')};
+  EXPECT_EQ(pack(state).size(), 2048U);
 }
 
 }  // namespace
