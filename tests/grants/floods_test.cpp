@@ -259,6 +259,17 @@ TEST_F(SelfRegistrationTest, KeepToHalfOfTheRegistry) {
   expectOthersUnharmed();
 }
 
+TEST_F(SelfRegistrationTest, EachTakesTheOldestOnesPlaceAlone) {
+  const auto isThere = [this](int number) {
+    const ApplicationName name("Self " + std::to_string(number));
+    return !grants().applications.named(name).empty();
+  };
+  for (int i = 0; i < 12; ++i) {
+    addItself(i);
+    for (int other = 0; other <= i; ++other) EXPECT_EQ(isThere(other), other > i - 5) << i;
+  }
+}
+
 TEST_F(SelfRegistrationTest, OneThatIsUsedStays) {
   const ApplicationId used = addItself(0).identifier;
   const Pair pair = login(used);
