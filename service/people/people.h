@@ -26,8 +26,8 @@ Throttle throttleOf(const Settings& settings);
 
 /// Fills in user, authTime and session, or leaves them empty for nobody. Where
 /// the web server asks for passwords, it has said who the user is, and has asked
-/// with this very request; elsewhere its word does not count. Throws
-/// DirectoryTrouble.
+/// with this very request; elsewhere its word does not count. Where the issuer is
+/// https, the request counts as secure from here on. Throws DirectoryTrouble.
 void recognise(const Settings& settings, Request& request);
 
 }  // namespace keldoauth::service

@@ -10,6 +10,7 @@
 #include <cstring>
 #include <memory>
 
+#include "service/settings/descriptor.h"
 #include "service/settings/settings.h"
 
 namespace keldoauth::service {
@@ -24,22 +25,6 @@ constexpr int kDeepest = 20;
 [[noreturn]] void failByErrno(const std::string& path) {
   fail(path, std::strerror(errno));
 }
-
-class Descriptor {
- public:
-  explicit Descriptor(int value) : value_(value) {}
-  ~Descriptor() {
-    if (value_ >= 0) close(value_);
-  }
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-
-  [[nodiscard]] bool isOpen() const { return value_ >= 0; }
-  [[nodiscard]] int get() const { return value_; }
-
- private:
-  int value_;
-};
 
 bool writeAll(int file, std::string_view text) {
   while (!text.empty()) {
@@ -104,6 +89,7 @@ TextFile readTextFile(const std::string& path, std::size_t most) {
   struct stat status {};
   if (!file.isOpen() || fstat(file.get(), &status) != 0) failByErrno(path);
   if (!S_ISREG(status.st_mode)) fail(path, "is no regular file");
+  if ((status.st_mode & S_IWOTH) != 0) fail(path, "everybody can write to it");
   TextFile read{readAll(path, file.get(), most), (status.st_mode & S_IROTH) != 0};
   if (read.text.size() > most) fail(path, "is too long");
   return read;

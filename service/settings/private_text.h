@@ -15,7 +15,8 @@ struct TextFile {
   bool isOpenToAll = false;  // others than its owner and its group can read it
 };
 
-/// A regular file of at most `most` bytes. Throws SettingsFault (settings.h).
+/// A regular file of at most `most` bytes that not everybody can write to. Throws
+/// SettingsFault (settings.h).
 TextFile readTextFile(const std::string& path, std::size_t most);
 
 /// Makes a file with mode 0600 that is whole or not there, whatever happens on

@@ -100,7 +100,8 @@ TEST(SettingsTest, TakeTheUsersOfTheSystem) {
 }
 
 TEST(SettingsTest, CountFailuresUnlessToldNotTo) {
-  EXPECT_EQ(parsed(withIssuer(R"("sign_in": "system")")).countersFile, "/var/lib/keldoauth/counters");
+  EXPECT_EQ(parsed(withIssuer(R"("sign_in": "system")")).countersFile,
+            "/var/lib/keldoauth/counters");
   EXPECT_EQ(parsed(withIssuer(R"("counters_file": "")")).countersFile, "");
 }
 
@@ -292,6 +293,15 @@ TEST_F(SettingsFileTest, RefuseSecretsThatEverybodyCanRead) {
   EXPECT_EQ(faultOfFiles(), "none");
   write(kPath, withIssuer(R"("initial_access_token": "0123456789abcdef0123456789abcdef")"), 0644);
   EXPECT_THAT(faultOfFiles(), HasSubstr("everybody can read it, and with it initial_access_token"));
+}
+
+TEST_F(SettingsFileTest, RefuseWhatEverybodyCanWriteTo) {
+  makeKeys(kKeysPath);
+  chmod(kKeysPath, 0602);
+  EXPECT_EQ(faultOfFiles(), "/tmp/service.keys.json: everybody can write to it");
+  chmod(kKeysPath, 0600);
+  chmod(kPath, 0666);
+  EXPECT_THAT(faultOfFiles(), HasSubstr("everybody can write to it"));
 }
 
 TEST_F(SettingsFileTest, RefuseWhatIsNoFileOrTooLong) {

@@ -402,4 +402,15 @@ TEST_F(SignInPageTest, AnApplicationsFormBecomesALink) {
   EXPECT_EQ(send(authorize, post("/oauth/authorize", query + "&x=\r\ny")).status, 403);
 }
 
+TEST_F(SignInPageTest, CookiesAreForTlsAloneWhereAnotherProgramEndsIt) {
+  const Request request = get("/oauth/sign-in");
+  for (const auto& [issuer, name] : {std::pair{"http://127.0.0.1:8480", "keldoauth-form="},
+                                     {"https://box.example", "__Host-keldoauth-form="}}) {
+    settings.issuer = issuer;
+    Request known = request;
+    recognise(settings, known);
+    EXPECT_EQ(header(call(signInPage, known), "Set-Cookie").rfind(name, 0), 0U) << issuer;
+  }
+}
+
 }  // namespace

@@ -18,6 +18,7 @@
 
 #include "grants/grants.h"
 #include "service/program/commands/command.h"
+#include "service/settings/descriptor.h"
 #include "service/settings/keys.h"
 #include "service/settings/private_text.h"
 #include "service/settings/settings.h"
@@ -56,13 +57,23 @@ bool isThere(const std::string& path) {
 
 // Files -------------------------------------------------------------------------
 
-/// The folder's group is the service's: what it has to read, that group can.
+/// The folder's group is the service's: what it has to read, that group can. A
+/// link, or a second name, in the place of the file may be to anybody's.
 void shareWithFolder(const std::string& path) {
+  const Descriptor file(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
   struct stat folder {};
-  const bool shared = stat(folderOf(path).c_str(), &folder) == 0 &&
-                      lchown(path.c_str(), static_cast<uid_t>(-1), folder.st_gid) == 0 &&
-                      chmod(path.c_str(), S_IRUSR | S_IWUSR | S_IRGRP) == 0;
-  if (!shared) throw SettingsFault({path + ": " + std::strerror(errno)});
+  struct stat status {};
+  if (!file.isOpen() || fstat(file.get(), &status) != 0 ||
+      stat(folderOf(path).c_str(), &folder) != 0) {
+    throw SettingsFault({path + ": " + std::strerror(errno)});
+  }
+  if (!S_ISREG(status.st_mode) || status.st_nlink != 1) {
+    throw SettingsFault({path + " is no file of this folder alone"});
+  }
+  if (fchown(file.get(), static_cast<uid_t>(-1), folder.st_gid) != 0 ||
+      fchmod(file.get(), S_IRUSR | S_IWUSR | S_IRGRP) != 0) {
+    throw SettingsFault({path + ": " + std::strerror(errno)});
+  }
 }
 
 std::string quoted(const std::string& text) {
