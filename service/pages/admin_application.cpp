@@ -159,8 +159,8 @@ Answer applicationPage(Context& context, const Request& request, const Parameter
 std::string pathWithSecret(const Settings& settings, const Request& request,
                            const grants::ApplicationId& identifier,
                            const std::optional<grants::Secret>& secret, const std::string& done) {
-  const std::string path = settings.link("/admin?view=application&client=") +
-                           percentEncode(identifier.text()) + "&done=" + done;
+  std::string path = settings.link("/admin?view=application&client=") +
+                     percentEncode(identifier.text()) + "&done=" + done;
   if (!secret) return path;
   return path +
          "&secret_token=" + formToken(settings, request.user, secretSubject(identifier, *secret));

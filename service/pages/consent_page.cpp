@@ -35,7 +35,8 @@ std::string whoAsks(const Settings& settings, const Request& request) {
   const std::string change =
       settings.signIn == SignIn::kWebServer
           ? "Not you? Close all windows of the browser: it remembers the password.</p>\n"
-          : fill("<a href=\"{}\">Not you?</a></p>\n", {signInPath(settings, request)});
+          : fill("Not you? <a href=\"{}\">Sign in as somebody else</a></p>\n",
+                 {signInPath(settings, request)});
   return fill("<p class=\"eyebrow\">Signed in as <strong><bdi>{}</bdi></strong>. ",
               {request.user}) +
          change;

@@ -1,6 +1,7 @@
 #include "service/protocol/clients.h"
 
 #include <algorithm>
+#include <iterator>
 
 #include "service/http/encoding.h"
 #include "utils/oauth_bounds.h"
@@ -45,6 +46,17 @@ Credentials readBasic(const std::string& header) {
   return {grants::ApplicationId(*identifier), secretOf(*secret)};
 }
 
+/// Characters with which a name could show as another one, or not at all: those that
+/// override the direction of what follows, that break lines, that nobody sees.
+bool hidesOrTurns(const std::string& name) {
+  constexpr std::string_view kThese[] = {"\u202A", "\u202B", "\u202C", "\u202D", "\u202E",
+                                         "\u2066", "\u2067", "\u2068", "\u2069", "\u2028",
+                                         "\u2029", "\u200B", "\u2060", "\uFEFF"};
+  return std::any_of(std::begin(kThese), std::end(kThese), [&](std::string_view character) {
+    return name.find(character) != std::string::npos;
+  });
+}
+
 }  // namespace
 
 std::string faultOfName(const std::string& name) {
@@ -54,7 +66,7 @@ std::string faultOfName(const std::string& name) {
     return "The name is too long: " + std::to_string(kMost) + " bytes at most.";
   }
   if (name.find_first_not_of(' ') == std::string::npos) return "The application needs a name.";
-  if (!isUtf8(name) || std::any_of(name.begin(), name.end(), isControl)) {
+  if (!isUtf8(name) || hidesOrTurns(name) || std::any_of(name.begin(), name.end(), isControl)) {
     return "The name has characters that cannot be shown.";
   }
   return {};

@@ -93,6 +93,16 @@ TEST_F(AdminPageTest, ASchemeOfItsOwnIsForPublicOnes) {
   EXPECT_EQ(send(admin, "admin", newForm({{"redirect", "com.example.app:/x"}})).status, 400);
 }
 
+TEST_F(AdminPageTest, ANameDoesNotHideOrTurnAround) {
+  for (const char* name : {"\u202Eexe.txt", "a\u2066b", "\u200B", "a\u2028b", "\uFEFF"}) {
+    EXPECT_EQ(send(admin, "admin", newForm({{"name", name}})).status, 400) << name;
+  }
+  for (const char* name :
+       {"\u05D0\u05DC\u05D1\u05D5\u05DD", "\u0645\u06CC\u200C\u062E", "\u65E5"}) {
+    EXPECT_EQ(send(admin, "admin", newForm({{"name", name}})).status, 303) << name;
+  }
+}
+
 TEST_F(AdminPageTest, OneThatActsForItselfNeedsNoAddress) {
   const Answer made = send(admin, "admin", newForm({{"redirect", ""}}));
   EXPECT_EQ(made.status, 303);
