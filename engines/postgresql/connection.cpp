@@ -50,6 +50,12 @@ Verdict giveRows(PGresult* result, RowCallback callback, void* arg) {
   return {};
 }
 
+/// Whether what was seen of the tables a moment ago may be no longer so.
+bool changesTables(Kind kind) {
+  return kind == Kind::kWrite || kind == Kind::kCreate || kind == Kind::kBegin ||
+         kind == Kind::kBeginImmediate;
+}
+
 /// A literal of a text without quotes, which a ciphertext need not be.
 std::string literal(const std::string& text) {
   std::string quoted = "'";
@@ -69,7 +75,7 @@ Connection::~Connection() {
 
 bool Connection::open(std::string& reason) {
   if (!server_.connect(servers_, reason)) return false;
-  known_ = server_.tables();
+  known_ = server_.tables();  // the start-up of a store comes next
   return true;
 }
 
@@ -80,7 +86,7 @@ bool Connection::open(std::string& reason) {
 Verdict Connection::reach() {
   if (server_.isConnected()) return {};
   std::string reason;
-  return open(reason) ? requireKey() : verdict(kIoError, kNotReached);
+  return server_.connect(servers_, reason) ? requireKey() : verdict(kIoError, kNotReached);
 }
 
 Reply Connection::ask(const std::string& text) {
@@ -232,6 +238,7 @@ Verdict Connection::create(const Statement& statement) {
 }
 
 Verdict Connection::runOne(const Statement& statement, RowCallback callback, void* arg) {
+  if (changesTables(statement.kind)) known_.clear();
   switch (statement.kind) {
     case Kind::kBegin:
     case Kind::kBeginImmediate:

@@ -90,6 +90,22 @@ TEST_F(ServerTest, AResidentProcessTakesUpAnotherConnection) {
   EXPECT_TRUE(transaction.Begin());
 }
 
+TEST_F(ServerTest, ATableThatWasDroppedMeanwhileIsMadeAgain) {
+  OAUTHDBLog log(names::kLogTable);
+  ASSERT_TRUE(log.Add("before"));
+  hangUp();
+  ASSERT_NE(log.DBDrop(), 0);
+  ASSERT_NE(log.DBInit(), 0);
+  EXPECT_TRUE(log.Add("after")) << log.GetErrMsg();
+  EXPECT_EQ(logRows(), "1");
+
+  OAUTHDBBasic fresh;
+  fresh.SetTabName(names::kMetaTable);
+  ASSERT_NE(fresh.DBDrop(), 0);
+  ASSERT_NE(fresh.DBInit(), 0);
+  EXPECT_EQ(ask("SELECT count(*) FROM keldoauth.oauth_meta"), "3");
+}
+
 TEST_F(ServerTest, NeverWithinATransaction) {
   OAUTHDBLog log(names::kLogTable);
   Transaction transaction(log);
