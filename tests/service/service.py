@@ -12,6 +12,7 @@ import http.client
 import io
 import json
 import os
+import re
 import secrets
 import subprocess
 import urllib.parse
@@ -186,6 +187,12 @@ class Form(html.parser.HTMLParser):
 
     def handle_endtag(self, tag):
         self.done = self.done or tag == "form"
+
+
+def forms(page):
+    """The hidden fields of each form of a page that changes something."""
+    return [Form(part).fields
+            for part in re.findall(r'<form method="post".*?</form>', page.text, re.DOTALL)]
 
 
 class Client:

@@ -416,7 +416,8 @@ test('people sign in, become somebody else, and sign out by pages', async () => 
     await signIn(page, 'alice', 'of alice')
     assert.ok((await page.textContent('.eyebrow')).includes('alice'))
     await inspect(page, 'consent-session')
-    assert.deepEqual(await tabStops(page), ['Sign in as somebody else', 'decision', 'decision', 'My applications'])
+    assert.deepEqual(await tabStops(page),
+      ['Sign in as somebody else', 'decision', 'decision', 'My applications'])
     await page.getByRole('link', { name: 'Sign in as somebody else' }).click()
     await signIn(page, 'carol', 'of carol')
     assert.ok((await page.textContent('.eyebrow')).includes('carol'))
