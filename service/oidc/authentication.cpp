@@ -7,6 +7,7 @@
 #include "service/http/encoding.h"
 #include "service/oidc/id_token.h"
 #include "service/oidc/login_text.h"
+#include "service/pages/consent_page.h"
 #include "service/pages/sign_in.h"
 #include "service/signing/key_fault.h"
 #include "service/signing/key_file.h"
@@ -28,15 +29,19 @@ long long now() {
   return static_cast<long long>(std::time(nullptr));
 }
 
-std::string markOf(const Settings& settings, long long time) {
+/// For this request alone: who has a mark of another one cannot use it later on, in
+/// a browser that somebody has left.
+std::string markOf(const Settings& settings, const AuthorizationRequest& asked, long long time) {
   const std::string text = std::to_string(time);
-  return text + '.' + base64Url(hmacSha256(settings.formKey, "sign-in-again." + text));
+  const std::string about = "sign-in-again." + text + "." + formSubject(asked);
+  return text + '.' + base64Url(hmacSha256(settings.formKey, about));
 }
 
 /// When the user was sent to sign in again; nothing without a good mark.
-std::optional<long long> timeIn(const Settings& settings, const std::string& mark) {
+std::optional<long long> timeIn(const Settings& settings, const AuthorizationRequest& asked,
+                                const std::string& mark) {
   const std::string text = mark.substr(0, mark.find('.'));
-  if (!isNumber(text) || !equalSecrets(mark, markOf(settings, number(text)))) return {};
+  if (!isNumber(text) || !equalSecrets(mark, markOf(settings, asked, number(text)))) return {};
   const long long age = now() - number(text);
   return age >= 0 && age <= kMarkSeconds ? std::optional(number(text)) : std::nullopt;
 }
@@ -73,15 +78,17 @@ std::optional<RequestFault> faultOfKeys(const Settings& settings,
 bool mustSignInAgain(const Settings& settings, const Request& request, const Parameters& given,
                      const AuthorizationRequest& asked) {
   if (settings.signIn == SignIn::kWebServer) return false;
-  if (const auto since = timeIn(settings, given.value(kMark))) return request.authTime < *since;
+  if (const auto since = timeIn(settings, asked, given.value(kMark)))
+    return request.authTime < *since;
   return asked.prompt.login || (asked.maxAge && now() - request.authTime > *asked.maxAge);
 }
 
-Answer signInAgain(const Settings& settings, const Request& request) {
+Answer signInAgain(const Settings& settings, const Request& request,
+                   const AuthorizationRequest& asked) {
   Request again = request;
   // Not behind an older one of its kind, which would be read first.
   again.query = again.query.substr(0, again.query.find(std::string("&") + kMark + "="));
-  again.query += std::string("&") + kMark + "=" + markOf(settings, now());
+  again.query += std::string("&") + kMark + "=" + markOf(settings, asked, now());
   return redirectAnswer(request, signInPath(settings, again));
 }
 

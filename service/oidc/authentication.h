@@ -27,9 +27,10 @@ bool mustSignInAgain(const Settings& settings, const Request& request, const Par
                      const AuthorizationRequest& asked);
 
 /// To the sign-in page and back here. The way back carries a mark of this moment
-/// under a key of the service: whoever comes with it and has signed in since is
-/// not asked another time.
-Answer signInAgain(const Settings& settings, const Request& request);
+/// and this request under a key of the service: whoever comes with it and has
+/// signed in since is not asked another time.
+Answer signInAgain(const Settings& settings, const Request& request,
+                   const AuthorizationRequest& asked);
 
 }  // namespace keldoauth::service
 

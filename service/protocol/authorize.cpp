@@ -135,7 +135,7 @@ void requireFresh(const Context& context, const Request& request, const Paramete
   if (asked.prompt.none) {
     refuse(context, request, asked, "login_required", "The user has to sign in again");
   }
-  throw Refusal{request.isRead() ? signInAgain(context.settings, request)
+  throw Refusal{request.isRead() ? signInAgain(context.settings, request, asked)
                                  : askWho(context.settings, request, given)};
 }
 

@@ -51,6 +51,15 @@ TEST_F(OidcSignInTest, MarkOfSomebodyElseIsNone) {
   EXPECT_EQ(ask("&prompt=login" + mark).status, 302);
 }
 
+TEST_F(OidcSignInTest, MarkOfAnotherRequestIsNone) {
+  const std::string query = next(ask("&prompt=login")).query;
+  const std::string mark = query.substr(query.rfind('&'));
+  ASSERT_THAT(mark, StartsWith("&signed_in_since="));
+  support::Clock::advance(30);
+  EXPECT_EQ(ask("&prompt=login" + mark, -30).status, 200);
+  EXPECT_EQ(ask("&prompt=login&nonce=another" + mark, -30).status, 302);
+}
+
 TEST_F(OidcSignInTest, MarkIsGoodForAQuarterOfAnHour) {
   const Request back = next(ask("&prompt=login"));
   support::Clock::advance(900);
