@@ -1,7 +1,6 @@
 #include "service/protocol/clients.h"
 
 #include <algorithm>
-#include <iterator>
 
 #include "service/http/encoding.h"
 #include "utils/oauth_bounds.h"
@@ -46,15 +45,27 @@ Credentials readBasic(const std::string& header) {
   return {grants::ApplicationId(*identifier), secretOf(*secret)};
 }
 
+/// Of a character of three bytes, as all of those below are; 0 for any other.
+unsigned codePoint(std::string_view character) {
+  if (character.size() != 3) return 0;
+  unsigned point = 0;
+  for (const char byte : character) point = point << 6U | (static_cast<unsigned char>(byte) & 63U);
+  return point & 0xFFFFU;
+}
+
 /// Characters with which a name could show as another one, or not at all: those that
 /// override the direction of what follows, that break lines, that nobody sees.
-bool hidesOrTurns(const std::string& name) {
-  constexpr std::string_view kThese[] = {"\u202A", "\u202B", "\u202C", "\u202D", "\u202E",
-                                         "\u2066", "\u2067", "\u2068", "\u2069", "\u2028",
-                                         "\u2029", "\u200B", "\u2060", "\uFEFF"};
-  return std::any_of(std::begin(kThese), std::end(kThese), [&](std::string_view character) {
-    return name.find(character) != std::string::npos;
-  });
+bool hidesOrTurns(std::string_view name) {
+  while (!name.empty()) {
+    const std::size_t length = std::max<std::size_t>(1, characterLength(name));
+    const unsigned point = codePoint(name.substr(0, length));
+    if ((point >= 0x2028 && point <= 0x202E) || (point >= 0x2066 && point <= 0x2069) ||
+        point == 0x200B || point == 0x2060 || point == 0xFEFF) {
+      return true;
+    }
+    name.remove_prefix(length);
+  }
+  return false;
 }
 
 }  // namespace
