@@ -1,6 +1,7 @@
 """Apache's modules from the Debian archive, unchanged: one lets people in to a web
 site, the other looks after a resource that takes tokens."""
 
+import json
 import pathlib
 import secrets
 import shutil
@@ -52,8 +53,9 @@ OIDCRedirectURI {home}/private/back
 OIDCCryptoPassphrase 0123456789abcdef
 OIDCRemoteUserClaim preferred_username
 OIDCPassClaimsAs environment
+OIDCPassUserInfoAs claims json
 OIDCCacheShmMax 16
-Header set X-Claim "expr=%{{reqenv:OIDC_CLAIM_sub}}"
+Header set X-Userinfo "expr=%{{reqenv:OIDC_userinfo_json}}"
 <Location /private>
   AuthType openid-connect
   Require valid-user
@@ -136,7 +138,7 @@ class RelyingParty(unittest.TestCase):
         self.assertEqual((answer.status_code, answer.text), (200, "the page"),
                          (address, answer.text, apache.log()))
         self.assertEqual(answer.headers["X-User"], "alice")
-        self.assertEqual(answer.headers["X-Claim"], "alice")
+        self.assertEqual(json.loads(answer.headers["X-Userinfo"])["sub"], "alice")
 
     def test_login(self):
         apache, person = self.site(), Person()

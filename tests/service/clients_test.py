@@ -118,6 +118,7 @@ class WithoutASecret(unittest.TestCase):
                                   code_verifier=verifier)
         session.refresh_token(self.server["token_endpoint"], refresh_token=old["refresh_token"])
         self.assertEqual(session.get(ISSUER + "/api/whoami").json()["sub"], "alice")
+        record(Authlib.NAME, "public, any port")
 
     def test_requests_oauthlib(self):
         session = RequestsSession(self.client.id, redirect_uri=self.REDIRECT, scope=["profile"])
@@ -128,6 +129,7 @@ class WithoutASecret(unittest.TestCase):
         session.fetch_token(self.server["token_endpoint"], code_verifier=verifier,
                             authorization_response=consent(address), include_client_id=True)
         self.assertEqual(session.get(ISSUER + "/api/whoami").json()["sub"], "alice")
+        record(RequestsOauthlib.NAME, "public, any port")
 
 
 class RequestsOauthlib(unittest.TestCase):

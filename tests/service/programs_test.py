@@ -49,12 +49,13 @@ class GitCredentialOauth(Program):
 
     def token_for(self, client):
         settings = {"oauthClientId": client.id, "oauthClientSecret": client.secret,
-                    "oauthScopes": "profile", "oauthAuthURL": "/oauth/authorize",
-                    "oauthTokenURL": "/oauth/token"}
+                    "oauthScopes": "profile", "oauthAuthURL": service.BASE + "/oauth/authorize",
+                    "oauthTokenURL": service.BASE + "/oauth/token"}
+        where = urllib.parse.urlsplit(ISSUER)
+        host = f"{where.scheme}://{where.netloc}"
         for name, value in settings.items():
             if value:
-                self.run_program("git", "config", "--global", f"credential.{ISSUER}.{name}", value)
-        where = urllib.parse.urlsplit(ISSUER)
+                self.run_program("git", "config", "--global", f"credential.{host}.{name}", value)
         said = self.run_program("git-credential-oauth", "get",
                                 said=f"protocol={where.scheme}\nhost={where.netloc}\n\n")
         return dict(line.split("=", 1) for line in said.splitlines())["password"]

@@ -9,18 +9,21 @@ import * as service from '../service.mjs'
 
 const name = service.versioned('simple-oauth2')
 const record = (feature, how) => service.record(name, feature, how)
+const base = new URL(service.issuer).pathname.replace(/\/$/, '')
 let config
 
 before(async () => {
   const made = await service.register({ client_name: 'simple-oauth2' })
   config = {
     client: { id: made.client_id, secret: made.client_secret },
-    auth: { tokenHost: service.issuer, tokenPath: '/oauth/token', revokePath: '/oauth/revoke' },
+    auth: { tokenHost: service.issuer, tokenPath: base + '/oauth/token',
+      revokePath: base + '/oauth/revoke' },
   }
 })
 
 async function logIn(options = {}) {
-  const client = new simple.AuthorizationCode({ ...config, options })
+  const client = new simple.AuthorizationCode({ ...config, options,
+    auth: { ...config.auth, authorizePath: base + '/oauth/authorize' } })
   const verifier = randomBytes(32).toString('base64url')
   const address = client.authorizeURL({
     redirect_uri: service.callback, scope: 'profile', state: 'a state',
