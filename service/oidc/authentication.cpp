@@ -50,9 +50,10 @@ std::optional<long long> timeIn(const Settings& settings, const AuthorizationReq
 
 std::optional<RequestFault> readAuthentication(const Parameters& given,
                                                AuthorizationRequest& asked) {
-  if (given.isAnyDoubled({"nonce", "max_age"})) {
+  if (given.isAnyDoubled({"nonce", "max_age", kHint})) {
     return RequestFault{"invalid_request", "A parameter occurs more than once"};
   }
+  asked.hint = given.value(kHint);
   asked.nonce = given.value("nonce");
   if (asked.nonce.size() > kMaxNonce || !isUtf8(asked.nonce)) {
     return RequestFault{"invalid_request", "nonce has more than 256 bytes, or is no UTF-8"};
@@ -75,12 +76,20 @@ std::optional<RequestFault> faultOfKeys(const Settings& settings,
   return RequestFault{"server_error", "This box cannot say who its users are just now"};
 }
 
+bool isForAnother(const Settings& settings, const Request& request,
+                  const AuthorizationRequest& asked) {
+  if (asked.hint.empty() || !offersOpenId(settings)) return false;
+  const std::string subject = readHint(settings, asked.hint).subject;
+  return subject.empty() ? asked.prompt.none : subject != openIdSubject(grants::User(request.user));
+}
+
 bool mustSignInAgain(const Settings& settings, const Request& request, const Parameters& given,
                      const AuthorizationRequest& asked) {
   if (settings.signIn == SignIn::kWebServer) return false;
   if (const auto since = timeIn(settings, asked, given.value(kMark)))
     return request.authTime < *since;
-  return asked.prompt.login || (asked.maxAge && now() - request.authTime > *asked.maxAge);
+  return asked.prompt.login || (asked.maxAge && now() - request.authTime > *asked.maxAge) ||
+         isForAnother(settings, request, asked);
 }
 
 Answer signInAgain(const Settings& settings, const Request& request,

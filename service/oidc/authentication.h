@@ -11,7 +11,7 @@
 
 namespace keldoauth::service {
 
-/// Reads `nonce` and `max_age` into `asked`.
+/// Reads `nonce`, `max_age` and `id_token_hint` into `asked`.
 std::optional<RequestFault> readAuthentication(const Parameters& given,
                                                AuthorizationRequest& asked);
 
@@ -20,9 +20,16 @@ std::optional<RequestFault> readAuthentication(const Parameters& given,
 std::optional<RequestFault> faultOfKeys(const Settings& settings,
                                         const AuthorizationRequest& asked);
 
+/// Whether the application has shown for whom it asks, and that is somebody else
+/// than who is signed in. When its token cannot be checked, nobody can say: then
+/// only a request without a page counts as one for another.
+bool isForAnother(const Settings& settings, const Request& request,
+                  const AuthorizationRequest& asked);
+
 /// Whether the user who is signed in has to show the password once more: for
-/// prompt=login, or because it was shown more than max_age ago. Never where the
-/// web server asks, which does it with every request.
+/// prompt=login, because it was shown more than max_age ago, or to become whom the
+/// application means. Never where the web server asks, which does it with every
+/// request.
 bool mustSignInAgain(const Settings& settings, const Request& request, const Parameters& given,
                      const AuthorizationRequest& asked);
 

@@ -8,6 +8,7 @@
 #include "service/settings/scopes.h"
 #include "service/signing/base64url.h"
 #include "service/signing/jws.h"
+#include "service/signing/key_fault.h"
 #include "service/signing/key_file.h"
 #include "service/signing/sha256.h"
 
@@ -39,6 +40,10 @@ Json::Value claimsFor(const Settings& settings, const grants::Application& audie
   return claims;
 }
 
+std::string textIn(const Json::Value& claims, const char* name) {
+  return claims[name].isString() ? claims[name].asString() : "";
+}
+
 }  // namespace
 
 bool offersOpenId(const Settings& settings) {
@@ -62,6 +67,15 @@ std::string openIdSubject(const grants::User& user) {
   const signing::Digest digest = signing::sha256(name);
   return "sha256:" +
          signing::toBase64Url({reinterpret_cast<const char*>(digest.data()), digest.size()});
+}
+
+Hint readHint(const Settings& settings, const std::string& token) try {
+  if (token.empty()) return {};
+  const auto claims = signing::claimsOf(token, signing::KeyFile(settings.signingKeysFile).read());
+  if (!claims || textIn(*claims, "iss") != settings.issuer) return {};
+  return {textIn(*claims, "sub"), textIn(*claims, "aud")};
+} catch (const signing::KeyFault&) {
+  return {};
 }
 
 std::string idTokenFor(const Settings& settings, const grants::Application& audience,

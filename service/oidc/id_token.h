@@ -30,6 +30,19 @@ bool sharesName(const std::string& scope);
 /// ASCII has a digest of it instead, which begins as no name does.
 std::string openIdSubject(const grants::User& user);
 
+/// The parameter with which an application shows a token that it has.
+inline constexpr char kHint[] = "id_token_hint";
+
+/// Who was signed in, and where, by a token of ours. Both are empty when it is
+/// none, or one that cannot be checked any more.
+struct Hint {
+  std::string subject;
+  std::string client;
+};
+
+/// It may have expired: who comes back late was signed in all the same.
+Hint readHint(const Settings& settings, const std::string& token);
+
 enum class Occasion { kLogin, kRefresh };
 
 /// For the pair of a user with the scope `openid`, empty for any other. It lasts

@@ -9,9 +9,6 @@
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
 #include "service/people/people.h"
-#include "service/signing/jws.h"
-#include "service/signing/key_fault.h"
-#include "service/signing/key_file.h"
 
 namespace keldoauth::service {
 namespace {
@@ -20,27 +17,6 @@ constexpr char kPath[] = "/oauth/logout";
 
 [[noreturn]] void refuse(const Settings& settings, const std::string& why) {
   throw Refusal{messagePage(settings, 400, "This request cannot be answered", why)};
-}
-
-/// Who was signed in, and where, by a token of ours that the application shows.
-struct Hint {
-  std::string subject;
-  std::string client;
-};
-
-std::string textIn(const Json::Value& claims, const char* name) {
-  return claims[name].isString() ? claims[name].asString() : "";
-}
-
-/// It may have expired: who signs out late was signed in all the same. A token
-/// that cannot be checked says nothing, and the user is asked.
-Hint readHint(const Settings& settings, const std::string& token) try {
-  if (token.empty()) return {};
-  const auto claims = signing::claimsOf(token, signing::KeyFile(settings.signingKeysFile).read());
-  if (!claims || textIn(*claims, "iss") != settings.issuer) return {};
-  return {textIn(*claims, "sub"), textIn(*claims, "aud")};
-} catch (const signing::KeyFault&) {
-  return {};
 }
 
 struct Asked {
@@ -59,11 +35,10 @@ bool isRegistered(Context& context, const Asked& asked) {
 
 Asked read(Context& context, const Request& request, const Parameters& given) {
   const Settings& settings = context.settings;
-  if (given.isAnyDoubled(
-          {"id_token_hint", "client_id", "post_logout_redirect_uri", "state", "form_token"})) {
+  if (given.isAnyDoubled({kHint, "client_id", "post_logout_redirect_uri", "state", "form_token"})) {
     refuse(settings, "A parameter occurs more than once.");
   }
-  const Hint hint = readHint(settings, given.value("id_token_hint"));
+  const Hint hint = readHint(settings, given.value(kHint));
   if (!hint.client.empty() && given.has("client_id") && given.value("client_id") != hint.client) {
     refuse(settings, "The application shows the token of another one.");
   }

@@ -37,6 +37,7 @@ struct AuthorizationRequest {
   std::optional<grants::RequestReference> pushed = {};  // none: it came with the browser
   std::string nonce = {};
   std::optional<long long> maxAge = {};  // seconds
+  std::string hint = {};                 // a token that says for whom
 };
 
 /// How a reference to a pushed request begins (RFC 9126, 2.2).

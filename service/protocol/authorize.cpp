@@ -128,6 +128,9 @@ void requireFresh(const Context& context, const Request& request, const Paramete
                   AuthorizationRequest& asked) {
   if (isDecision(request, given)) return;
   if (!mustSignInAgain(context.settings, request, given, asked)) {
+    if (isForAnother(context.settings, request, asked)) {
+      refuse(context, request, asked, "login_required", "Somebody else is signed in");
+    }
     // With a session it has been done, and the page has nothing to add.
     if (!request.session.empty()) asked.prompt.login = false;
     return;

@@ -106,12 +106,42 @@ TEST_F(OidcSignInTest, WebServerAsksWithEveryRequest) {
   EXPECT_EQ(call(authorize, request).status, 200);
 }
 
+TEST_F(OidcSignInTest, NobodyElseIsAnsweredForThanWhomTheApplicationShows) {
+  const std::string hint = "&id_token_hint=" + login(app_)["id_token"].asString();
+  EXPECT_TRUE(returned(ask(hint + "&prompt=none")).count("code"));
+  Request bob = fromAlice(authorization(app_, hint + "&prompt=none"));
+  bob.user = "bob";
+  EXPECT_EQ(returned(call(authorize, bob))["error"], "login_required");
+  bob = fromAlice(authorization(app_, hint));
+  bob.user = "bob";
+  Request back = fromAlice(next(call(authorize, bob)), -30);
+  support::Clock::advance(30);
+  EXPECT_TRUE(returned(call(authorize, back)).count("code")) << "alice it was to be";
+  back.user = "bob";
+  EXPECT_EQ(returned(call(authorize, back))["error"], "login_required");
+}
+
+TEST_F(OidcSignInTest, NorWhereTheWebServerAsks) {
+  const std::string hint = "&id_token_hint=" + login(app_)["id_token"].asString();
+  settings.signIn = SignIn::kWebServer;
+  Request bob = fromAlice(authorization(app_, hint));
+  bob.user = "bob";
+  bob.session.clear();
+  EXPECT_EQ(returned(call(authorize, bob))["error"], "login_required");
+}
+
+TEST_F(OidcSignInTest, TokenThatIsNotOursSaysNothingButWithoutAPage) {
+  login(app_);
+  EXPECT_TRUE(returned(ask("&id_token_hint=a.b.c")).count("code"));
+  EXPECT_EQ(returned(ask("&id_token_hint=a.b.c&prompt=none"))["error"], "login_required");
+}
+
 TEST_F(OidcSignInTest, BadValuesAreRefused) {
   const std::string long_ = std::string(257, 'n');
   for (const std::string& more :
        {std::string("&max_age=-1"), std::string("&max_age=x"), std::string("&max_age=12345678901"),
-        std::string("&max_age=1&max_age=1"), std::string("&nonce=a&nonce=a"),
-        std::string("&nonce=%FF"), "&nonce=" + long_}) {
+        std::string("&max_age=1&max_age=1"), std::string("&id_token_hint=a&id_token_hint=a"),
+        std::string("&nonce=a&nonce=a"), std::string("&nonce=%FF"), "&nonce=" + long_}) {
     EXPECT_EQ(returned(ask(more))["error"], "invalid_request") << more;
   }
 }
