@@ -15,9 +15,9 @@ import urllib.parse
 import requests
 
 import service
+from machine import free_port, version_of
 from person import Person
 from service import ISSUER, record
-from versions import version_of
 
 CONF = """
 ServerRoot {folder}
@@ -76,11 +76,6 @@ RESOURCE = """
   Require oauth2_claim scope:photos.read
 </Location>
 """
-
-
-def free_port():
-    with socket.create_server(("127.0.0.1", 0)) as taken:
-        return taken.getsockname()[1]
 
 
 class Apache:

@@ -6,23 +6,17 @@ import json
 import os
 import pathlib
 import re
-import socket
 import subprocess
 import tempfile
 import unittest
 import urllib.parse
 
 import service
+from machine import free_port, version_of
 from service import ISSUER, record
-from versions import version_of
 
 HERE = pathlib.Path(__file__).resolve().parent
 BROWSER = str(HERE / "clients" / "browser")
-
-
-def free_port():
-    with socket.create_server(("127.0.0.1", 0)) as taken:
-        return taken.getsockname()[1]
 
 
 class Program(unittest.TestCase):

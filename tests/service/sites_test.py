@@ -12,9 +12,9 @@ from social_core.storage import AssociationMixin, BaseStorage
 from social_core.strategy import BaseStrategy
 
 import service
+from machine import version_of
 from person import Person, register_without_pkce
 from service import ISSUER, record
-from versions import version_of
 
 HERE = pathlib.Path(__file__).resolve().parent
 HOME = "http://127.0.0.1:9"  # where nobody listens

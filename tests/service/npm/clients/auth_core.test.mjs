@@ -37,7 +37,7 @@ class Application {
     assert.equal(start.status, 302, this.fault)
     const callback = await service.consent(new URL(start.headers.get('location')))
     await this.visit(callback)
-    assert.equal(this.fault, undefined, this.fault?.cause?.err ?? this.fault)
+    if (this.fault) throw this.fault.cause?.err ?? this.fault
     return (await (await this.visit('/auth/session')).json()).user
   }
 }
@@ -74,6 +74,16 @@ test('oauth with the secret in the body', async () => {
   })).logIn()
   assert.equal(user.name, 'alice')
   service.record(`${name}, oauth`, 'secret in the body')
+})
+
+test('oauth has to know the issuer, which the answer names', async () => {
+  const application = new Application(await provider('oauth', {
+    authorization: { url: service.issuer + '/oauth/authorize', params: { scope: 'profile' } },
+    token: service.issuer + '/oauth/token',
+    userinfo: service.issuer + '/api/whoami',
+    issuer: undefined,
+  }))
+  await assert.rejects(application.logIn(), /"iss" \(issuer\) response parameter/)
 })
 
 test('oidc, with nothing set but the issuer', async () => {

@@ -1,6 +1,7 @@
-"""The versions of clients that are packages of Debian."""
+"""What this machine has: versions of Debian's packages, ports that nobody uses."""
 
 import re
+import socket
 import subprocess
 
 
@@ -9,3 +10,8 @@ def version_of(package):
     said = subprocess.run(["dpkg-query", "-W", "-f", "${Version}", package], check=True,
                           capture_output=True, text=True).stdout
     return re.match(r"(?:\d+:)?([^-+]+)", said)[1]
+
+
+def free_port():
+    with socket.create_server(("127.0.0.1", 0)) as taken:
+        return taken.getsockname()[1]
