@@ -16,13 +16,12 @@ Answer refuse(int status, const std::string& error, const std::string& why,
 
 /// In the header, or in a form (RFC 6750, 2.2); nothing when there is none.
 std::optional<std::string> tokenIn(const Request& request) {
-  if (!request.authorization.empty() || request.method != "POST" || !request.isForm()) {
-    return bearerToken(request.authorization);
-  }
+  if (request.method != "POST" || !request.isForm()) return bearerToken(request.authorization);
   const std::optional<Parameters> form = Parameters::parse(request.body);
-  if (!form || !form->has("access_token")) return {};
+  if (!form || !form->has("access_token")) return bearerToken(request.authorization);
   // Which of two is meant nobody can say.
-  return form->isDoubled("access_token") ? "" : form->value("access_token");
+  const bool isOne = request.authorization.empty() && !form->isDoubled("access_token");
+  return isOne ? form->value("access_token") : "";
 }
 
 }  // namespace
@@ -36,7 +35,8 @@ Answer userInfo(Context& context, const Request& request) {
     return plainAnswer(401).with("WWW-Authenticate",
                                  std::string(kRealm) + ", scope=\"" + kOpenId + "\"");
   }
-  if (text->empty()) return refuse(400, "invalid_request", "The token is missing");
+  if (text->empty())
+    return refuse(400, "invalid_request", "The token is missing, or there are two");
 
   const auto bearer = context.store.open().tokens.verify(grants::AccessToken(*text));
   if (!bearer) {

@@ -154,6 +154,8 @@ TEST_F(OidcTokensTest, UserInfoTakesTheTokenInAForm) {
   const std::string text = login(app)["access_token"].asString();
   EXPECT_EQ(json(call(userInfo, post("/oauth/userinfo", "access_token=" + text)))["sub"], "alice");
   EXPECT_EQ(json(call(userInfo, withBearer(text, post("/oauth/userinfo", ""))))["sub"], "alice");
+  const Request twice = withBearer(text, post("/oauth/userinfo", "access_token=" + text));
+  EXPECT_EQ(error(call(userInfo, twice)), "400 invalid_request");
   EXPECT_EQ(error(call(userInfo,
                        post("/oauth/userinfo", "access_token=" + text + "&access_token=" + text))),
             "400 invalid_request");
