@@ -3,6 +3,7 @@ in a crash, a name that grows, everybody logged out by one, a thief who is never
 found out. SERVICE_LIMIT says how many rows the tables have while they are flooded."""
 
 import ctypes
+import json
 import os
 import sqlite3
 import struct
@@ -31,6 +32,15 @@ def submit(action, **fields):
     page = send("GET", "/admin?view=register", headers=as_user("admin"))
     form = {"action": action, "form_token": Form(page.text).fields["form_token"], **fields}
     return send("POST", "/admin", encode(form), {**FORM, **as_user("admin")})
+
+
+def setUpModule():
+    """Floods that nothing slows down: what keeps others safe holds on its own."""
+    path = service.RUN + "/settings.json"
+    with open(path, encoding="utf-8") as file:
+        settings = json.load(file)
+    with open(path, "w", encoding="utf-8") as file:
+        json.dump({**settings, "counters_file": ""}, file)
 
 
 class Crashes(unittest.TestCase):
@@ -246,7 +256,7 @@ class Floods(unittest.TestCase):
             self.assertEqual(self.client.refresh(self.idle["refresh_token"]).status, 200)
             answer = submit("register", name="By hand", redirect=service.CALLBACK,
                             **{"scope.profile": "1"})
-            self.assertEqual(answer.status, 200)
+            self.assertEqual(answer.status, 303)
 
 
 class Thieves(unittest.TestCase):
