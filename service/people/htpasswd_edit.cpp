@@ -17,6 +17,7 @@
 #include "service/people/htpasswd.h"
 #include "service/people/names.h"
 #include "service/people/password_hash.h"
+#include "service/settings/descriptor.h"
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {
@@ -27,22 +28,6 @@ constexpr mode_t kNewMode = 0640;
 [[noreturn]] void fail(const std::string& what) {
   throw DirectoryTrouble("cannot " + what + ": " + std::strerror(errno));
 }
-
-class Descriptor {
- public:
-  explicit Descriptor(int descriptor) : descriptor_(descriptor) {}
-  ~Descriptor() {
-    if (descriptor_ >= 0) close(descriptor_);
-  }
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-
-  [[nodiscard]] int get() const { return descriptor_; }
-  [[nodiscard]] bool isOpen() const { return descriptor_ >= 0; }
-
- private:
-  int descriptor_;
-};
 
 /// Where links lead; the path itself for a file that is to be made.
 std::string placeOf(const std::string& path) {
