@@ -9,36 +9,33 @@
 #include <cerrno>
 #include <cstddef>
 
+#include "utils/descriptor.h"
+
 namespace KELDOAUTHSERVER {
 
 /// An open file that closes itself.
 class File {
  public:
   File(const char* path, int flags) : descriptor_(open(path, flags | O_CLOEXEC)) {}
-  ~File() {
-    if (isOpen()) close(descriptor_);
-  }
-  File(const File&) = delete;
-  File& operator=(const File&) = delete;
 
-  [[nodiscard]] bool isOpen() const { return descriptor_ >= 0; }
+  [[nodiscard]] bool isOpen() const { return descriptor_.isOpen(); }
 
   [[nodiscard]] bool isRegular() const {
     struct stat file {};
-    return fstat(descriptor_, &file) == 0 && S_ISREG(file.st_mode);
+    return fstat(descriptor_.get(), &file) == 0 && S_ISREG(file.st_mode);
   }
 
   /// One read, taken up again when a signal interrupts it.
   ssize_t readSome(char* buffer, std::size_t size) const {
     ssize_t got = 0;
     do {
-      got = read(descriptor_, buffer, size);
+      got = read(descriptor_.get(), buffer, size);
     } while (got < 0 && errno == EINTR);
     return got;
   }
 
  private:
-  int descriptor_;
+  Descriptor descriptor_;
 };
 
 }  // namespace KELDOAUTHSERVER

@@ -11,6 +11,7 @@
 #include <cstring>
 #include <thread>
 
+#include "utils/descriptor.h"
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {
@@ -28,19 +29,14 @@ constexpr std::size_t kFileBytes = sizeof(Header) + CounterFile::kBuckets * size
 class OpenFile {
  public:
   explicit OpenFile(int descriptor) : descriptor_(descriptor) {}
-  ~OpenFile() {
-    if (descriptor_ >= 0) close(descriptor_);
-  }
-  OpenFile(const OpenFile&) = delete;
-  OpenFile& operator=(const OpenFile&) = delete;
 
-  [[nodiscard]] bool isOpen() const { return descriptor_ >= 0; }
+  [[nodiscard]] bool isOpen() const { return descriptor_.isOpen(); }
 
   [[nodiscard]] bool isOurs() const {
     struct stat file {};
     Header header{};
-    return fstat(descriptor_, &file) == 0 && S_ISREG(file.st_mode) && file.st_uid == geteuid() &&
-           (file.st_mode & 07777U) == 0600 && file.st_nlink == 1 &&
+    return fstat(descriptor_.get(), &file) == 0 && S_ISREG(file.st_mode) &&
+           file.st_uid == geteuid() && (file.st_mode & 07777U) == 0600 && file.st_nlink == 1 &&
            file.st_size == off_t{kFileBytes} && readAt(0, &header, sizeof header) &&
            header.text == kHeader.text;
   }
@@ -49,7 +45,7 @@ class OpenFile {
   [[nodiscard]] bool lock() const {
     constexpr int kMostTries = 1000;
     for (int i = 0; i < kMostTries; ++i) {
-      if (flock(descriptor_, LOCK_EX | LOCK_NB) == 0) return true;
+      if (flock(descriptor_.get(), LOCK_EX | LOCK_NB) == 0) return true;
       if (errno != EWOULDBLOCK && errno != EINTR) return false;
       std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
@@ -57,14 +53,14 @@ class OpenFile {
   }
 
   bool readAt(std::size_t offset, void* into, std::size_t size) const {
-    return pread(descriptor_, into, size, off_t(offset)) == ssize_t(size);
+    return pread(descriptor_.get(), into, size, off_t(offset)) == ssize_t(size);
   }
   [[nodiscard]] bool writeAt(std::size_t offset, const void* from, std::size_t size) const {
-    return pwrite(descriptor_, from, size, off_t(offset)) == ssize_t(size);
+    return pwrite(descriptor_.get(), from, size, off_t(offset)) == ssize_t(size);
   }
 
  private:
-  int descriptor_;
+  KELDOAUTHSERVER::Descriptor descriptor_;
 };
 
 int openAt(const std::string& path) {

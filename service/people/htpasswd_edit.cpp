@@ -17,11 +17,13 @@
 #include "service/people/htpasswd.h"
 #include "service/people/names.h"
 #include "service/people/password_hash.h"
-#include "service/settings/descriptor.h"
+#include "utils/descriptor.h"
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {
 namespace {
+
+using KELDOAUTHSERVER::Descriptor;
 
 constexpr mode_t kNewMode = 0640;
 
@@ -66,15 +68,6 @@ class FolderLock {
   Descriptor folder_;
 };
 
-void writeAll(int descriptor, std::string_view text) {
-  while (!text.empty()) {
-    const ssize_t written = write(descriptor, text.data(), text.size());
-    if (written < 0 && errno == EINTR) continue;
-    if (written < 0) fail("write the new file");
-    text.remove_prefix(static_cast<std::size_t>(written));
-  }
-}
-
 /// The file that takes the place of another, and goes away unless it did.
 class Replacement {
  public:
@@ -88,7 +81,9 @@ class Replacement {
   Replacement(const Replacement&) = delete;
   Replacement& operator=(const Replacement&) = delete;
 
-  void write(std::string_view text) const { writeAll(file_.get(), text); }
+  void write(std::string_view text) const {
+    if (!KELDOAUTHSERVER::writeAll(file_.get(), text)) fail("write the new file");
+  }
 
   void belongTo(uid_t user, gid_t group, mode_t mode) const {
     struct stat now {};

@@ -10,11 +10,13 @@
 #include <cstring>
 #include <memory>
 
-#include "service/settings/descriptor.h"
 #include "service/settings/settings.h"
+#include "utils/descriptor.h"
 
 namespace keldoauth::service {
 namespace {
+
+using KELDOAUTHSERVER::Descriptor;
 
 constexpr int kDeepest = 20;
 
@@ -24,16 +26,6 @@ constexpr int kDeepest = 20;
 
 [[noreturn]] void failByErrno(const std::string& path) {
   fail(path, std::strerror(errno));
-}
-
-bool writeAll(int file, std::string_view text) {
-  while (!text.empty()) {
-    const ssize_t put = write(file, text.data(), text.size());
-    if (put < 0 && errno == EINTR) continue;
-    if (put < 0) return false;
-    text.remove_prefix(static_cast<std::size_t>(put));
-  }
-  return true;
 }
 
 /// Up to the first piece beyond what may be there.
@@ -64,8 +56,9 @@ class Draft {
 
   /// On the disk before it gets its name. The mode owes nothing to the umask.
   [[nodiscard]] bool publish(const std::string& path, const std::string& text) const {
-    return fchmod(file_.get(), S_IRUSR | S_IWUSR) == 0 && writeAll(file_.get(), text) &&
-           fsync(file_.get()) == 0 && link(name_.c_str(), path.c_str()) == 0;
+    return fchmod(file_.get(), S_IRUSR | S_IWUSR) == 0 &&
+           KELDOAUTHSERVER::writeAll(file_.get(), text) && fsync(file_.get()) == 0 &&
+           link(name_.c_str(), path.c_str()) == 0;
   }
 
  private:

@@ -33,21 +33,7 @@ void syncFolderOf(const std::string& path) {
   if (!open.isOpen() || fsync(open.get()) != 0) failByErrno(folder);
 }
 
-bool writeAll(int file, std::string_view text) {
-  while (!text.empty()) {
-    const ssize_t put = write(file, text.data(), text.size());
-    if (put < 0 && errno == EINTR) continue;
-    if (put < 0) return false;
-    text.remove_prefix(static_cast<std::size_t>(put));
-  }
-  return true;
-}
-
 }  // namespace
-
-Descriptor::~Descriptor() {
-  if (isOpen()) close(value_);
-}
 
 void fail(const std::string& path, const std::string& reason) {
   throw KeyFault("key file " + path + ": " + reason);
@@ -95,7 +81,7 @@ Draft::~Draft() {
 
 void Draft::write(std::string_view text, const Access& access) const {
   if (fchown(file_.get(), access.owner, access.group) != 0 ||
-      fchmod(file_.get(), access.mode) != 0 || !writeAll(file_.get(), text) ||
+      fchmod(file_.get(), access.mode) != 0 || !KELDOAUTHSERVER::writeAll(file_.get(), text) ||
       fsync(file_.get()) != 0) {
     failByErrno(name_);
   }

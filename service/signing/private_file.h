@@ -9,22 +9,11 @@
 #include <string_view>
 
 #include "service/signing/key_file.h"
+#include "utils/descriptor.h"
 
 namespace keldoauth::service::signing {
 
-class Descriptor {
- public:
-  explicit Descriptor(int value) : value_(value) {}
-  ~Descriptor();
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-
-  [[nodiscard]] bool isOpen() const { return value_ >= 0; }
-  [[nodiscard]] int get() const { return value_; }
-
- private:
-  int value_;
-};
+using KELDOAUTHSERVER::Descriptor;
 
 [[noreturn]] void fail(const std::string& path, const std::string& reason);
 /// With the text of errno.

@@ -18,12 +18,12 @@
 
 #include "grants/grants.h"
 #include "service/program/commands/command.h"
-#include "service/settings/descriptor.h"
 #include "service/settings/keys.h"
 #include "service/settings/private_text.h"
 #include "service/settings/settings.h"
 #include "service/signing/key_file.h"
 #include "service/signing/key_set.h"
+#include "utils/descriptor.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -60,7 +60,8 @@ bool isThere(const std::string& path) {
 /// The folder's group is the service's: what it has to read, that group can. A
 /// link, or a second name, in the place of the file may be to anybody's.
 void shareWithFolder(const std::string& path) {
-  const Descriptor file(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+  const KELDOAUTHSERVER::Descriptor file(
+      open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
   struct stat folder {};
   struct stat status {};
   if (!file.isOpen() || fstat(file.get(), &status) != 0 ||

@@ -61,10 +61,6 @@ void syncFolderOf(const std::string& path) {
   throw systemFailure(fs::absolute(path).parent_path());
 }
 
-Descriptor::~Descriptor() {
-  if (isOpen()) close(value_);
-}
-
 // Drafts ----------------------------------------------------------------------------
 
 Draft::Draft(const std::string& path)

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "tools/keldoauth/console/failure.h"
+#include "utils/descriptor.h"
 
 namespace tool {
 
@@ -22,20 +23,7 @@ bool isSameFile(const std::string& one, const std::string& other);
 /// cut. Throws Failure.
 void syncFolderOf(const std::string& path);
 
-/// Closes with the scope.
-class Descriptor {
- public:
-  explicit Descriptor(int value) : value_(value) {}
-  ~Descriptor();
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-
-  [[nodiscard]] bool isOpen() const { return value_ >= 0; }
-  [[nodiscard]] int get() const { return value_; }
-
- private:
-  int value_;
-};
+using KELDOAUTHSERVER::Descriptor;
 
 /// A file that is to be `path` once it is whole: the owner's alone, empty at
 /// first, and gone with the scope unless it was published. It is written through

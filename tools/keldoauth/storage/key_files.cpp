@@ -29,18 +29,11 @@ struct Key {
   ~Key() { explicit_bzero(bytes.data(), bytes.size()); }
   Key(const Key&) = delete;
   Key& operator=(const Key&) = delete;
-};
 
-bool writeAll(int descriptor, const Key& key) {
-  std::size_t written = 0;
-  while (written < key.bytes.size()) {
-    const ssize_t put = write(descriptor, key.bytes.data() + written, key.bytes.size() - written);
-    if (put < 0 && errno == EINTR) continue;
-    if (put < 0) return false;
-    written += static_cast<std::size_t>(put);
+  [[nodiscard]] std::string_view text() const {
+    return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
   }
-  return true;
-}
+};
 
 /// "<name of the key>.draft-a1B2c3", as the stand-in calls it on a medium where
 /// it needs a name.
@@ -86,7 +79,7 @@ void drawKey(const std::string& path) {
   if (!file.isOpen()) throw systemFailure(path);
   const bool isWhole = fchmod(file.get(), S_IRUSR | S_IWUSR) == 0 &&
                        getentropy(key.bytes.data(), key.bytes.size()) == 0 &&
-                       writeAll(file.get(), key) && fsync(file.get()) == 0;
+                       KELDOAUTHSERVER::writeAll(file.get(), key.text()) && fsync(file.get()) == 0;
   if (isWhole) return;
   const int error = errno;
   unlink(path.c_str());
