@@ -157,12 +157,12 @@ Conditions conditionsOf(const AccessFilter& filter, const Policy& policy, long l
   if (!filter.contains.empty()) {
     const std::string isTheUsers = rows::contains(names::kUsername, filter.contains);
     const auto isIts = [&filter](const char* table) {
-      return rows::contains(nameIn(std::string(table) + "." + names::kClientId), filter.contains);
+      const std::string name = nameIn(std::string(table) + "." + names::kClientId);
+      return rows::contains("IFNULL(" + name + ",'')", filter.contains);
     };
-    conditions.codes +=
-        " AND (" + isTheUsers + " OR IFNULL(" + isIts(names::kGrantCodeTable) + ",0))";
-    conditions.tokens += " AND (NOT " + rows::isOwnToken() + " AND " + isTheUsers + " OR IFNULL(" +
-                         isIts(names::kTokenTable) + ",0))";
+    conditions.codes += " AND (" + isTheUsers + " OR " + isIts(names::kGrantCodeTable) + ")";
+    conditions.tokens += " AND (NOT " + rows::isOwnToken() + " AND " + isTheUsers + " OR " +
+                         isIts(names::kTokenTable) + ")";
   }
   return conditions;
 }

@@ -18,7 +18,7 @@ namespace {
 std::string countOf(const char* table, std::initializer_list<std::string> conditions = {}) {
   std::string select = "(SELECT COUNT(*)";
   for (const std::string& condition : conditions) select += ",IFNULL(SUM(" + condition + "),0)";
-  return select + " FROM " + table + ")";
+  return select + " FROM " + table + ") AS of_" + table;
 }
 
 /// All of them at one moment.

@@ -11,10 +11,10 @@ namespace {
 using Kind = Token::Kind;
 
 constexpr std::string_view kKeywords[] = {
-    "ALL",      "AND",  "AS",     "ASC",    "BETWEEN", "BY",     "CASE",   "DELETE", "DESC",
-    "DISTINCT", "ELSE", "END",    "EXISTS", "FROM",    "GROUP",  "HAVING", "IN",     "INSERT",
-    "INTO",     "IS",   "LIMIT",  "NOT",    "NULL",    "OFFSET", "OR",     "ORDER",  "SELECT",
-    "SET",      "THEN", "UPDATE", "VALUES", "WHEN",    "WHERE"};
+    "ALL",  "AND",  "AS",     "ASC",    "BETWEEN", "BY",     "CASE", "DELETE", "DESC",  "DISTINCT",
+    "ELSE", "END",  "EXISTS", "FROM",   "GROUP",   "HAVING", "IN",   "INSERT", "INTO",  "IS",
+    "JOIN", "LEFT", "LIMIT",  "NOT",    "NULL",    "OFFSET", "ON",   "OR",     "ORDER", "SELECT",
+    "SET",  "THEN", "UNION",  "UPDATE", "VALUES",  "WHEN",   "WHERE"};
 
 /// SQLite's functions, and the server's in their place.
 struct Function {
@@ -32,6 +32,7 @@ constexpr Function kFunctions[] = {{"COUNT", "count", false},
                                    {"SUBSTR", "sqlite_substr", true},
                                    {"INSTR", "sqlite_instr", true},
                                    {"LENGTH", "sqlite_length", true},
+                                   {"LOWER", "lower", false},
                                    {"STRFTIME", "sqlite_strftime", true}};
 
 /// The columns of the stores that hold numbers.
@@ -92,7 +93,7 @@ class Rewriter {
   /// statement says otherwise; where it leaves a tie, too.
   void noteSubject() {
     isWholeRows_ = token().isWord("SELECT") && token(1).isSign("*") && token(2).isWord("FROM") &&
-                   !isOneOf(token(3), kTablesWithoutId);
+                   !token(3).isSign("(") && !isOneOf(token(3), kTablesWithoutId);
   }
 
   void completeOrder() {
@@ -169,11 +170,11 @@ class Rewriter {
     skip();
   }
 
+  /// What is no end of a CAST gives a name to what stands before it.
   void rewriteAs() {
-    if (!token(1).isWord("INTEGER") || !token(2).isSign(")")) {
-      throw Refusal{syntaxError(token().text)};
-    }
-    skip(2);
+    if (token(1).isWord("INTEGER") && token(2).isSign(")")) return skip(2);
+    write("AS");
+    skip();
   }
 
   void rewriteLike(std::string_view sign, std::size_t words) {
@@ -210,7 +211,7 @@ class Rewriter {
 
   /// A number that stands for a condition.
   void rewriteNumber() {
-    constexpr std::string_view kBefore[] = {"WHERE", "NOT", "OR", "AND"};
+    constexpr std::string_view kBefore[] = {"WHERE", "ON", "NOT", "OR", "AND"};
     constexpr std::string_view kBehind[] = {"OR", "AND", "ORDER", "LIMIT"};
     const bool goesOn = isOneOf(token(1), kBehind);
     const bool isFirst = isOneOf(before(), kBefore) || (before().isSign("(") && goesOn);

@@ -114,7 +114,7 @@ class Lexer {
 
   Token takeSign() {
     constexpr std::string_view kSigns[] = {"||", "<=", ">=", "<>", "!=", "==", "=", "<", ">",
-                                           "(",  ")",  ",",  "*",  "+",  "-",  "/", "%"};
+                                           "(",  ")",  ",",  ".",  "*",  "+",  "-", "/", "%"};
     for (const std::string_view sign : kSigns) {
       if (left_.substr(0, sign.size()) == sign) return take(Token::Kind::kSign, sign.size());
     }

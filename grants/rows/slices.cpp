@@ -28,8 +28,8 @@ Json::Value opened(Json::Value row) {
 Part read(Store& store, const List& list, int most, int skipped) {
   const Json::Value found =
       store.rowsOf("SELECT " + std::string(kLength) + ",part.*" + list.details + " FROM (SELECT " +
-                   list.length + " AS " + kLength + ") LEFT JOIN (" + list.rows + " ORDER BY " +
-                   list.order + " LIMIT " + std::to_string(most) + " OFFSET " +
+                   list.length + " AS " + kLength + ") AS whole LEFT JOIN (" + list.rows +
+                   " ORDER BY " + list.order + " LIMIT " + std::to_string(most) + " OFFSET " +
                    std::to_string(skipped) + ") AS part ON 1 ORDER BY " + list.order);
   Part part{Json::Value(Json::arrayValue), decimalValue(found[0U][kLength])};
   for (const Json::Value& row : found) {

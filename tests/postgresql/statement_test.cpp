@@ -74,6 +74,16 @@ TEST(StatementTest, NumbersMayStandForConditions) {
             "DELETE FROM keldoauth.\"t\" WHERE \"id\" BETWEEN 3 AND 5");
 }
 
+TEST(StatementTest, PartsOfAStatementHaveNames) {
+  EXPECT_EQ(rewritten("SELECT n,part.* FROM (SELECT COUNT(*) AS n FROM t) AS whole LEFT JOIN "
+                      "(SELECT id FROM t AS u LIMIT -1 OFFSET 0) AS part ON 1 ORDER BY id"),
+            "SELECT \"n\" , \"part\" . * FROM ( SELECT count ( * ) AS \"n\" FROM "
+            "keldoauth.\"t\" ) AS \"whole\" LEFT JOIN ( SELECT \"id\" FROM keldoauth.\"t\" AS "
+            "\"u\" LIMIT ALL OFFSET 0 ) AS \"part\" ON (1<>0) ORDER BY \"id\"");
+  EXPECT_EQ(rewritten("SELECT * FROM (SELECT COUNT(*) FROM t) AS a"),
+            "SELECT * FROM ( SELECT count ( * ) FROM keldoauth.\"t\" ) AS \"a\"");
+}
+
 TEST(StatementTest, FunctionsAreThoseOfTheSchema) {
   EXPECT_EQ(rewritten("SELECT IFNULL(SUM(CAST(a AS INTEGER)<3),0) FROM t"),
             "SELECT coalesce ( keldoauth.sqlite_sum ( keldoauth.sqlite_integer ( \"a\" ) < 3 ) , 0 "
