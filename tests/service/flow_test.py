@@ -1,7 +1,6 @@
 """The service does what its standards say when everybody behaves."""
 
 import json
-import sqlite3
 import time
 import unittest
 
@@ -150,9 +149,8 @@ class Registration(unittest.TestCase):
 
     def test_row_holds_the_address_with_its_scheme(self):
         register(redirect_uris=["https://with-scheme.example/cb"])
-        with sqlite3.connect(service.DATABASE) as file:
-            rows = file.execute("SELECT redirect_uri FROM oauth_clientInfo").fetchall()
-        self.assertIn("https://with-scheme.example/cb", [row.split()[0] for row, in rows])
+        rows = service.stored("SELECT redirect_uri FROM oauth_clientInfo")
+        self.assertIn("https://with-scheme.example/cb", [row.split()[0] for row in rows if row])
 
     def test_several_addresses_serve_each(self):
         addresses = ["https://one.example/cb", "https://two.example/cb"]
@@ -265,10 +263,10 @@ class OlderAddresses(unittest.TestCase):
 
     def without_scheme(self, address, stored):
         client = register(redirect_uris=[address])
-        with sqlite3.connect(service.DATABASE) as file:
-            changed = file.execute("UPDATE oauth_clientInfo SET redirect_uri=? WHERE redirect_uri"
-                                   " LIKE ?", (stored, address + "%")).rowcount
-        self.assertEqual(changed, 1)
+        where = f"WHERE redirect_uri LIKE '{address}%'"
+        rows = service.stored(f"SELECT redirect_uri FROM oauth_clientInfo {where}")
+        self.assertEqual(len(rows), 1)
+        service.stored(f"UPDATE oauth_clientInfo SET redirect_uri='{stored}' {where}")
         return client
 
     def returns_to(self, client, address):

@@ -14,7 +14,7 @@ import socket
 import subprocess
 import sys
 
-CALLERS = (1, 2, 4, 8)
+CALLERS = tuple(map(int, os.environ.get("SERVICE_CALLERS", "1,2,4,8").split(",")))
 SECONDS = os.environ.get("SERVICE_SECONDS", "3")
 PEER = pathlib.Path(__file__).parent / "peer" / "provider.mjs"
 

@@ -14,6 +14,7 @@ import json
 import os
 import re
 import secrets
+import sqlite3
 import subprocess
 import urllib.parse
 
@@ -30,6 +31,19 @@ SETTINGS = "/var/packages/Corvane/target/etc/oauth.cfg"
 SEEN_SECRETS = {INITIAL_TOKEN, *USERS.values()}
 
 FORM = {"Content-Type": "application/x-www-form-urlencoded"}
+
+
+def stored(statement):
+    """One statement on the store, past the service: the first column's texts."""
+    server = os.environ.get("KELDOAUTH_TEST_SERVER")
+    if server is None:
+        with sqlite3.connect(DATABASE) as file:
+            return [row[0] for row in file.execute(statement)]
+    done = subprocess.run(
+        ["psql", "-X", "-q", "-A", "-t", "-v", "ON_ERROR_STOP=1", "-d", server, "-c", statement],
+        env={**os.environ, "PGOPTIONS": "-c search_path=keldoauth"},
+        check=True, capture_output=True, text=True)
+    return done.stdout.splitlines()
 
 
 class Answer:
