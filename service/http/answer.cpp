@@ -53,6 +53,12 @@ Answer plainAnswer(int status) {
                 std::to_string(status) + " " + reason(status) + "\n"};
 }
 
+Json::Value jsonList(std::initializer_list<const char*> texts) {
+  Json::Value array(Json::arrayValue);
+  for (const char* text : texts) array.append(text);
+  return array;
+}
+
 Answer jsonAnswer(int status, const Json::Value& document) {
   Json::StreamWriterBuilder writer;
   writer["indentation"] = "";

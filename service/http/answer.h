@@ -6,6 +6,7 @@
 
 #include <json/value.h>
 
+#include <initializer_list>
 #include <string>
 #include <utility>
 #include <vector>
@@ -38,6 +39,7 @@ struct Failure {
 };
 
 Answer plainAnswer(int status);
+Json::Value jsonList(std::initializer_list<const char*> texts);
 Answer jsonAnswer(int status, const Json::Value& document);
 
 /// RFC 6749, 5.2. `description` is a fixed text of ours, never the client's.

@@ -8,7 +8,7 @@
 #include <exception>
 #include <system_error>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

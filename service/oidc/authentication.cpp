@@ -4,13 +4,13 @@
 #include <ctime>
 #include <iostream>
 
-#include "service/http/encoding.h"
 #include "service/oidc/id_token.h"
 #include "service/oidc/login_text.h"
 #include "service/pages/consent_page.h"
 #include "service/pages/sign_in.h"
 #include "service/signing/key_fault.h"
 #include "service/signing/key_file.h"
+#include "service/text/encoding.h"
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {

@@ -7,25 +7,15 @@
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {
-namespace {
-
-Json::Value list(std::initializer_list<const char*> texts) {
-  Json::Value array(Json::arrayValue);
-  for (const char* text : texts) array.append(text);
-  return array;
-}
-
-}  // namespace
-
 void addOpenIdMembers(const Settings& settings, Json::Value& document) {
   document["jwks_uri"] = settings.endpoint("/oauth/jwks");
   document["userinfo_endpoint"] = settings.endpoint("/oauth/userinfo");
   document["end_session_endpoint"] = settings.endpoint("/oauth/logout");
-  document["subject_types_supported"] = list({"public"});
-  document["id_token_signing_alg_values_supported"] = list({"RS256", "ES256"});
-  document["claims_supported"] = list(
+  document["subject_types_supported"] = jsonList({"public"});
+  document["id_token_signing_alg_values_supported"] = jsonList({"RS256", "ES256"});
+  document["claims_supported"] = jsonList(
       {"iss", "sub", "aud", "exp", "iat", "auth_time", "nonce", "at_hash", "preferred_username"});
-  document["prompt_values_supported"] = list({"none", "login", "consent", "select_account"});
+  document["prompt_values_supported"] = jsonList({"none", "login", "consent", "select_account"});
   document["claims_parameter_supported"] = false;
   document["request_parameter_supported"] = false;
   // Absent, it would be true.

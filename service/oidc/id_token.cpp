@@ -11,6 +11,7 @@
 #include "service/signing/key_fault.h"
 #include "service/signing/key_file.h"
 #include "service/signing/sha256.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {
@@ -65,8 +66,7 @@ std::string openIdSubject(const grants::User& user) {
       std::all_of(name.begin(), name.end(), [](char c) { return c >= ' ' && c <= '~'; });
   if (isPlain) return name;
   const signing::Digest digest = signing::sha256(name);
-  return "sha256:" +
-         signing::toBase64Url({reinterpret_cast<const char*>(digest.data()), digest.size()});
+  return "sha256:" + base64Url({reinterpret_cast<const char*>(digest.data()), digest.size()});
 }
 
 Hint readHint(const Settings& settings, const std::string& token) try {

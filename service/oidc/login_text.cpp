@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -2,13 +2,13 @@
 
 #include "grants/grants.h"
 #include "service/http/cookies.h"
-#include "service/http/encoding.h"
 #include "service/oidc/endpoints.h"
 #include "service/oidc/id_token.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
 #include "service/people/people.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -3,12 +3,12 @@
 #include <algorithm>
 #include <string_view>
 
-#include "service/http/encoding.h"
 #include "service/pages/form_token.h"
 #include "service/pages/frame.h"
 #include "service/pages/held.h"
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -3,10 +3,10 @@
 #include <string_view>
 #include <vector>
 
-#include "service/http/encoding.h"
 #include "service/pages/admin_pages.h"
 #include "service/pages/html.h"
 #include "service/protocol/clients.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -1,9 +1,9 @@
-#include "service/http/encoding.h"
 #include "service/pages/admin_pages.h"
 #include "service/pages/form_token.h"
 #include "service/pages/frame.h"
 #include "service/pages/html.h"
 #include "service/settings/scopes.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

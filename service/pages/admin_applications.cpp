@@ -1,7 +1,7 @@
-#include "service/http/encoding.h"
 #include "service/pages/admin_pages.h"
 #include "service/pages/frame.h"
 #include "service/pages/html.h"
+#include "service/text/encoding.h"
 #include "utils/oauth_utils.h"
 
 namespace keldoauth::service {

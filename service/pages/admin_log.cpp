@@ -1,8 +1,8 @@
 #include "service/pages/admin_pages.h"
 
-#include "service/http/encoding.h"
 #include "service/pages/frame.h"
 #include "service/pages/html.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

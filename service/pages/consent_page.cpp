@@ -1,11 +1,11 @@
 #include "service/pages/consent_page.h"
 
-#include "service/http/encoding.h"
 #include "service/pages/form_token.h"
 #include "service/pages/frame.h"
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
 #include "service/protocol/redirect.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

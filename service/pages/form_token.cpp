@@ -2,7 +2,7 @@
 
 #include <ctime>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

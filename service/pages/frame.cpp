@@ -1,16 +1,15 @@
 #include "service/pages/frame.h"
 
 #include <algorithm>
-#include <array>
-#include <ctime>
 #include <map>
 #include <vector>
 
-#include "service/http/encoding.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
 #include "service/pages/sign_in.h"
 #include "service/settings/scopes.h"
+#include "service/text/encoding.h"
+#include "service/text/utc.h"
 
 namespace keldoauth::service {
 namespace {
@@ -87,14 +86,8 @@ std::string whoLine(const Settings& settings, const Request& request) {
 }
 
 std::string timeText(long long seconds) {
-  const auto when = static_cast<std::time_t>(seconds);
-  std::tm parts{};
-  std::array<char, 32> text{};
-  if (gmtime_r(&when, &parts) == nullptr ||
-      std::strftime(text.data(), text.size(), "%Y-%m-%d %H:%M:%S", &parts) == 0) {
-    return "?";
-  }
-  return fill("<time datetime=\"{}Z\">{} UTC</time>", {text.data(), text.data()});
+  const std::optional<std::string> text = utcText(seconds);
+  return text ? fill("<time datetime=\"{}Z\">{} UTC</time>", {*text, *text}) : "?";
 }
 
 std::string timeRow(const char* term, long long seconds) {

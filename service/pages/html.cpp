@@ -2,7 +2,7 @@
 
 #include <cstddef>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

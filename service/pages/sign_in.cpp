@@ -4,11 +4,11 @@
 #include <string_view>
 
 #include "service/http/cookies.h"
-#include "service/http/encoding.h"
 #include "service/pages/form_token.h"
 #include "service/pages/html.h"
 #include "service/people/people.h"
 #include "service/people/sign_in.h"
+#include "service/text/encoding.h"
 #include "utils/oauth_utils.h"
 
 namespace keldoauth::service {

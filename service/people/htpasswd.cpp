@@ -8,9 +8,9 @@
 #include <cstring>
 #include <set>
 
-#include "service/http/encoding.h"
 #include "service/people/names.h"
 #include "service/people/password_hash.h"
+#include "service/text/encoding.h"
 #include "utils/file.h"
 #include "utils/wide_time.h"
 

@@ -18,6 +18,7 @@
 #include "service/people/names.h"
 #include "service/people/password_hash.h"
 #include "utils/descriptor.h"
+#include "utils/folder.h"
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {
@@ -37,12 +38,6 @@ std::string placeOf(const std::string& path) {
   if (place) return place.get();
   if (errno != ENOENT) fail("find " + path);
   return path;
-}
-
-std::string folderOf(const std::string& path) {
-  const std::size_t slash = path.rfind('/');
-  if (slash == std::string::npos) return ".";
-  return slash == 0 ? "/" : path.substr(0, slash);
 }
 
 /// Waits for whoever changes a file in the folder, and keeps others waiting. The
@@ -112,7 +107,7 @@ using Change = std::function<std::optional<std::string>(const std::string& text)
 
 void change(const std::string& path, bool mayBeMissing, const Change& changed) {
   const std::string place = placeOf(path);
-  const FolderLock folder(folderOf(place));
+  const FolderLock folder(KELDOAUTHSERVER::folderOf(place));
   struct stat old {};
   const bool isThere = lstat(place.c_str(), &old) == 0;
   if (!isThere && (errno != ENOENT || !mayBeMissing)) fail("read " + path);

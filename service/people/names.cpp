@@ -2,17 +2,13 @@
 
 #include <algorithm>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 #include "utils/oauth_bounds.h"
 
 namespace keldoauth::service {
 namespace {
 
 constexpr KELDOAUTHSERVER::Bounds kName = KELDOAUTHSERVER::bounds::kUsername;
-
-bool isControl(char c) {
-  return static_cast<unsigned char>(c) < 0x20 || c == '\x7f';
-}
 
 /// U+0080 to U+009F, which UTF-8 writes with this byte in front.
 bool hasLateControl(std::string_view text) {

@@ -20,12 +20,6 @@ void trustWebServer(Request& request) {
   }
 }
 
-/// Another program of this machine may end TLS, and hand requests on without it:
-/// the browser is at the https address all the same.
-bool isHttps(const Settings& settings) {
-  return settings.issuer.rfind("https:", 0) == 0;
-}
-
 }  // namespace
 
 std::unique_ptr<Directory> directoryOf(const Settings& settings) {
@@ -49,7 +43,9 @@ Throttle throttleOf(const Settings& settings) {
 }
 
 void recognise(const Settings& settings, Request& request) {
-  request.isSecure = request.isSecure || isHttps(settings);
+  // Another program of this machine may end TLS, and hand requests on without it:
+  // the browser is at the https address all the same.
+  request.isSecure = request.isSecure || settings.isHttps();
   const std::unique_ptr<Directory> directory = directoryOf(settings);
   if (!directory) {
     trustWebServer(request);

@@ -3,8 +3,8 @@
 #include <ctime>
 #include <vector>
 
-#include "service/http/encoding.h"
 #include "service/http/request.h"
+#include "service/text/encoding.h"
 #include "utils/oauth_utils.h"
 #include "utils/wide_time.h"
 

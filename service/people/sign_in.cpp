@@ -2,10 +2,10 @@
 
 #include <algorithm>
 
-#include "service/http/encoding.h"
 #include "service/people/address.h"
 #include "service/people/auth_log.h"
 #include "service/people/turnstile.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

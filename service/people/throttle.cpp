@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <ctime>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 #include "utils/wide_time.h"
 
 namespace keldoauth::service {

@@ -1,10 +1,10 @@
 #include "service/protocol/authorization_request.h"
 
-#include "service/http/encoding.h"
 #include "service/oidc/authentication.h"
 #include "service/oidc/id_token.h"
 #include "service/protocol/redirect.h"
 #include "service/settings/scopes.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

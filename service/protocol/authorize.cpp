@@ -1,6 +1,5 @@
 #include "service/protocol/endpoints.h"
 
-#include "service/http/encoding.h"
 #include "service/oidc/authentication.h"
 #include "service/oidc/id_token.h"
 #include "service/oidc/login_text.h"
@@ -11,6 +10,7 @@
 #include "service/protocol/authorization_request.h"
 #include "service/protocol/clients.h"
 #include "service/protocol/redirect.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -5,8 +5,8 @@
 #include <initializer_list>
 #include <sstream>
 
-#include "service/http/encoding.h"
 #include "service/settings/scopes.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

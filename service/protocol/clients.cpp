@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 #include "utils/oauth_bounds.h"
 
 namespace keldoauth::service {
@@ -71,7 +71,6 @@ bool hidesOrTurns(std::string_view name) {
 }  // namespace
 
 std::string faultOfName(const std::string& name) {
-  const auto isControl = [](unsigned char byte) { return byte < ' ' || byte == 0x7f; };
   constexpr std::size_t kMost = bounds::kDisplayName.max;
   if (name.size() > kMost) {
     return "The name is too long: " + std::to_string(kMost) + " bytes at most.";

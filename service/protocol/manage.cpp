@@ -1,9 +1,9 @@
 #include <initializer_list>
 #include <string_view>
 
-#include "service/http/encoding.h"
 #include "service/protocol/client_metadata.h"
 #include "service/protocol/endpoints.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -5,16 +5,6 @@
 #include "service/settings/scopes.h"
 
 namespace keldoauth::service {
-namespace {
-
-Json::Value list(std::initializer_list<const char*> texts) {
-  Json::Value array(Json::arrayValue);
-  for (const char* text : texts) array.append(text);
-  return array;
-}
-
-}  // namespace
-
 Answer metadata(Context& context, const Request& request) {
   if (!request.isRead()) return methodNotAllowed("GET, HEAD");
   const Settings& own = context.settings;
@@ -27,14 +17,14 @@ Answer metadata(Context& context, const Request& request) {
   document["pushed_authorization_request_endpoint"] = own.endpoint("/oauth/par");
   document["require_pushed_authorization_requests"] = false;
   document["revocation_endpoint"] = own.endpoint("/oauth/revoke");
-  document["response_types_supported"] = list({"code"});
-  document["response_modes_supported"] = list({"query"});
+  document["response_types_supported"] = jsonList({"code"});
+  document["response_modes_supported"] = jsonList({"query"});
   document["grant_types_supported"] =
-      list({"authorization_code", "refresh_token", "client_credentials"});
-  document["code_challenge_methods_supported"] = list({"S256"});
+      jsonList({"authorization_code", "refresh_token", "client_credentials"});
+  document["code_challenge_methods_supported"] = jsonList({"S256"});
   for (const char* endpoint : {"token", "introspection", "revocation"}) {
     document[std::string(endpoint) + "_endpoint_auth_methods_supported"] =
-        list({"client_secret_basic", "client_secret_post"});
+        jsonList({"client_secret_basic", "client_secret_post"});
   }
   // A public application says who it is, where its tokens or codes say the rest.
   for (const char* endpoint : {"token", "revocation"}) {

@@ -1,9 +1,9 @@
 #include <ctime>
 
-#include "service/http/encoding.h"
 #include "service/people/slow_down.h"
 #include "service/protocol/client_metadata.h"
 #include "service/protocol/endpoints.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

@@ -12,6 +12,7 @@
 
 #include "service/settings/settings.h"
 #include "utils/descriptor.h"
+#include "utils/folder.h"
 
 namespace keldoauth::service {
 namespace {
@@ -66,14 +67,6 @@ class Draft {
   Descriptor file_;
 };
 
-/// A new name survives a power cut only when its folder is synced, too.
-bool syncFolderOf(const std::string& path) {
-  const std::size_t slash = path.rfind('/');
-  const std::string folder = slash == std::string::npos ? "." : path.substr(0, slash + 1);
-  const Descriptor open(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  return open.isOpen() && fsync(open.get()) == 0;
-}
-
 }  // namespace
 
 TextFile readTextFile(const std::string& path, std::size_t most) {
@@ -90,7 +83,7 @@ TextFile readTextFile(const std::string& path, std::size_t most) {
 
 void makePrivateFile(const std::string& path, const std::string& text) {
   const Draft draft(path);
-  if (!draft.publish(path, text) || !syncFolderOf(path)) failByErrno(path);
+  if (!draft.publish(path, text) || !KELDOAUTHSERVER::syncFolderOf(path)) failByErrno(path);
 }
 
 Json::Value parseJsonObject(const std::string& text, const std::string& path) {

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service {
 namespace {

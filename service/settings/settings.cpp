@@ -9,10 +9,10 @@
 #include <string_view>
 #include <utility>
 
-#include "service/http/encoding.h"
 #include "service/http/web_address.h"
 #include "service/settings/keys.h"
 #include "service/settings/private_text.h"
+#include "service/text/encoding.h"
 #include "utils/oauth_bounds.h"
 
 namespace keldoauth::service {
@@ -37,7 +37,6 @@ constexpr char kSigningKeysName[] = "signing.keys.json";
 
 /// For people: UTF-8 without control characters, and not blank.
 bool isShowable(const std::string& text) {
-  const auto isControl = [](unsigned char byte) { return byte < ' ' || byte == 0x7f; };
   return text.find_first_not_of(' ') != std::string::npos && isUtf8(text) &&
          std::none_of(text.begin(), text.end(), isControl);
 }

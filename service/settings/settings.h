@@ -46,6 +46,8 @@ struct Settings {
   std::string formKey;          // signs the tokens in forms
   std::string sessionKey;       // signs sessions
 
+  [[nodiscard]] bool isHttps() const { return issuer.rfind("https:", 0) == 0; }
+
   /// The whole address of `path`, for other programs.
   [[nodiscard]] std::string endpoint(const std::string& path) const { return issuer + path; }
 

@@ -1,4 +1,4 @@
-// The alphabet of RFC 4648 5, without padding, as RFC 7515 2 wants it.
+// What the keys need of base64url (text/encoding.h) beside its writing.
 
 #ifndef KELDOAUTH_SERVICE_SIGNING_BASE64URL_H
 #define KELDOAUTH_SERVICE_SIGNING_BASE64URL_H
@@ -8,8 +8,6 @@
 #include <string_view>
 
 namespace keldoauth::service::signing {
-
-std::string toBase64Url(std::string_view bytes);
 
 /// Nothing unless `text` is the one spelling of its bytes: no padding, no blank,
 /// no bit set that says nothing.

@@ -5,11 +5,11 @@
 #include <nettle/ecc.h>
 #include <nettle/ecdsa.h>
 
-#include "service/signing/base64url.h"
 #include "service/signing/key_fault.h"
 #include "service/signing/key_pair.h"
 #include "service/signing/number.h"
 #include "service/signing/random.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service::signing {
 namespace {
@@ -80,15 +80,15 @@ class EcPair : public KeyPair {
     Json::Value jwk(Json::objectValue);
     jwk["kty"] = "EC";
     jwk["crv"] = "P-256";
-    jwk["x"] = toBase64Url(bytesOfNumber(x.get(), kSize));
-    jwk["y"] = toBase64Url(bytesOfNumber(y.get(), kSize));
+    jwk["x"] = base64Url(bytesOfNumber(x.get(), kSize));
+    jwk["y"] = base64Url(bytesOfNumber(y.get(), kSize));
     return jwk;
   }
 
   void addPrivateMembers(Json::Value& jwk) const override {
     Number d;
     ecc_scalar_get(&secret_, d.get());
-    jwk["d"] = toBase64Url(bytesOfNumber(d.get(), kSize));
+    jwk["d"] = base64Url(bytesOfNumber(d.get(), kSize));
   }
 
   [[nodiscard]] std::string sign(const Digest& digest) const override {

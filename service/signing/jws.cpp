@@ -2,6 +2,7 @@
 
 #include "service/signing/base64url.h"
 #include "service/signing/strict_json.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service::signing {
 namespace {
@@ -35,8 +36,8 @@ const Key* keyOf(const Json::Value& header, const KeySet& keys) {
 }  // namespace
 
 std::string signedToken(const Json::Value& claims, const Key& key) {
-  const std::string text = toBase64Url(header(key)) + '.' + toBase64Url(compactText(claims));
-  return text + '.' + toBase64Url(key.sign(text));
+  const std::string text = base64Url(header(key)) + '.' + base64Url(compactText(claims));
+  return text + '.' + base64Url(key.sign(text));
 }
 
 std::optional<Json::Value> claimsOf(std::string_view token, const KeySet& keys) {

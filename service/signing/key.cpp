@@ -5,6 +5,7 @@
 #include "service/signing/base64url.h"
 #include "service/signing/key_fault.h"
 #include "service/signing/key_pair.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service::signing {
 
@@ -45,7 +46,7 @@ std::string thumbprintOf(const Json::Value& jwk) {
                                  : '{' + member("crv") + ',' + member("kty") + ',' + member("x") +
                                        ',' + member("y") + '}';
   const Digest digest = sha256(text);
-  return toBase64Url({reinterpret_cast<const char*>(digest.data()), digest.size()});
+  return base64Url({reinterpret_cast<const char*>(digest.data()), digest.size()});
 }
 
 Key::Key(std::shared_ptr<const KeyPair> pair)

@@ -9,10 +9,10 @@
 #include <cstdint>
 #include <optional>
 
-#include "service/signing/base64url.h"
 #include "service/signing/key_fault.h"
 #include "service/signing/private_file.h"
 #include "service/signing/random.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service::signing {
 namespace {
@@ -22,8 +22,7 @@ std::string freshName(const std::string& path) {
   Random random;
   std::array<std::uint8_t, 9> bytes{};
   Random::fill(&random, bytes.size(), bytes.data());
-  return path + ".draft-" +
-         toBase64Url({reinterpret_cast<const char*>(bytes.data()), bytes.size()});
+  return path + ".draft-" + base64Url({reinterpret_cast<const char*>(bytes.data()), bytes.size()});
 }
 
 KeySet readKeys(const std::string& path, const Descriptor& file) {

@@ -4,8 +4,8 @@
 
 #include <cstdint>
 
-#include "service/signing/base64url.h"
 #include "service/signing/sha256.h"
+#include "service/text/encoding.h"
 
 namespace keldoauth::service::signing {
 
@@ -16,7 +16,7 @@ std::string bytesOfNumber(mpz_srcptr number, std::size_t size) {
 }
 
 std::string textOfNumber(mpz_srcptr number) {
-  return toBase64Url(bytesOfNumber(number, (bitsOf(number) + 7) / 8));
+  return base64Url(bytesOfNumber(number, (bitsOf(number) + 7) / 8));
 }
 
 void setToBytes(mpz_ptr number, std::string_view bytes) {

@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "service/signing/key_fault.h"
+#include "utils/folder.h"
 
 namespace keldoauth::service::signing {
 namespace {
@@ -25,12 +26,8 @@ const char* faultOf(const struct stat& status) {
   return nullptr;
 }
 
-/// A new name survives a power cut only when its folder is synced, too.
-void syncFolderOf(const std::string& path) {
-  const std::size_t slash = path.rfind('/');
-  const std::string folder = slash == std::string::npos ? "." : path.substr(0, slash + 1);
-  const Descriptor open(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (!open.isOpen() || fsync(open.get()) != 0) failByErrno(folder);
+void syncFolder(const std::string& path) {
+  if (!KELDOAUTHSERVER::syncFolderOf(path)) failByErrno(KELDOAUTHSERVER::folderOf(path));
 }
 
 }  // namespace
@@ -89,13 +86,13 @@ void Draft::write(std::string_view text, const Access& access) const {
 
 void Draft::publishAsNew(const std::string& path) const {
   if (link(name_.c_str(), path.c_str()) != 0) failByErrno(path);
-  syncFolderOf(path);
+  syncFolder(path);
 }
 
 void Draft::publishInPlaceOf(const std::string& path) {
   if (rename(name_.c_str(), path.c_str()) != 0) failByErrno(path);
   name_.clear();
-  syncFolderOf(path);
+  syncFolder(path);
 }
 
 }  // namespace keldoauth::service::signing

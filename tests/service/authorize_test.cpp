@@ -1,5 +1,5 @@
-#include "service/http/encoding.h"
 #include "service/protocol/endpoints.h"
+#include "service/text/encoding.h"
 #include "tests/service/login_test.h"
 
 namespace {

@@ -9,10 +9,10 @@
 #include <string>
 
 #include "service/http/answer.h"
-#include "service/http/encoding.h"
 #include "service/http/gateway.h"
 #include "service/pages/html.h"
 #include "service/protocol/redirect.h"
+#include "service/text/encoding.h"
 #include "tests/fuzz/expect.h"
 
 namespace {

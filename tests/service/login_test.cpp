@@ -2,8 +2,8 @@
 
 #include <regex>
 
-#include "service/http/encoding.h"
 #include "service/protocol/endpoints.h"
+#include "service/text/encoding.h"
 
 namespace service_test {
 namespace {

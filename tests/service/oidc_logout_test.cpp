@@ -3,7 +3,7 @@
 #include <filesystem>
 #include <regex>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 #include "tests/service/oidc_test.h"
 
 namespace {

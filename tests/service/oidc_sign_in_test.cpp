@@ -1,7 +1,7 @@
 // What an application asks for about the sign-in itself.
 
-#include "service/http/encoding.h"
 #include "service/protocol/endpoints.h"
+#include "service/text/encoding.h"
 #include "tests/service/oidc_test.h"
 
 namespace {

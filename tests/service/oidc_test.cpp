@@ -4,10 +4,10 @@
 #include <fstream>
 #include <regex>
 
-#include "service/http/encoding.h"
 #include "service/protocol/endpoints.h"
 #include "service/signing/jws.h"
 #include "service/signing/key_file.h"
+#include "service/text/encoding.h"
 
 namespace service_test {
 namespace {

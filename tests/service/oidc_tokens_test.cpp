@@ -2,13 +2,13 @@
 
 #include <filesystem>
 
-#include "service/http/encoding.h"
 #include "service/oidc/id_token.h"
 #include "service/oidc/login_text.h"
 #include "service/program/routes.h"
 #include "service/protocol/endpoints.h"
 #include "service/signing/base64url.h"
 #include "service/signing/key_file.h"
+#include "service/text/encoding.h"
 #include "tests/service/oidc_test.h"
 
 namespace {

@@ -5,7 +5,7 @@
 
 #include <sstream>
 
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 namespace service_test {
 

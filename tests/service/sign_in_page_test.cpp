@@ -8,11 +8,11 @@
 #include <string>
 #include <utility>
 
-#include "service/http/encoding.h"
 #include "service/pages/admin_pages.h"
 #include "service/people/htpasswd_edit.h"
 #include "service/people/people.h"
 #include "service/protocol/endpoints.h"
+#include "service/text/encoding.h"
 #include "tests/service/service_test.h"
 
 namespace {

@@ -1,4 +1,5 @@
 #include "service/signing/base64url.h"
+#include "service/text/encoding.h"
 
 #include <gtest/gtest.h>
 
@@ -8,9 +9,9 @@
 
 namespace {
 
+using keldoauth::service::base64Url;
 using keldoauth::service::signing::fromBase64Url;
 using keldoauth::service::signing::halfDigest;
-using keldoauth::service::signing::toBase64Url;
 
 struct Spelling {
   std::string bytes;
@@ -29,7 +30,7 @@ const Spelling kSpellings[] = {{"", ""},
                                {std::string("\0", 1), "AA"}};
 
 TEST(Base64UrlTest, WritesWithoutPadding) {
-  for (const auto& [bytes, text] : kSpellings) EXPECT_EQ(toBase64Url(bytes), text);
+  for (const auto& [bytes, text] : kSpellings) EXPECT_EQ(base64Url(bytes), text);
 }
 
 TEST(Base64UrlTest, ReadsWhatItWrites) {

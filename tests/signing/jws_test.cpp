@@ -1,6 +1,7 @@
 #include "service/signing/jws.h"
 
 #include "service/signing/base64url.h"
+#include "service/text/encoding.h"
 #include "tests/signing/signing_test.h"
 
 namespace signing_test {
@@ -23,8 +24,9 @@ class JwsTest : public SigningTest {
 
   /// A token with a good signature over any header and payload.
   static std::string forged(const std::string& header, const std::string& payload) {
-    const std::string text = toBase64Url(header) + '.' + toBase64Url(payload);
-    return text + '.' + toBase64Url(key(Algorithm::kEs256).sign(text));
+    const std::string text =
+        keldoauth::service::base64Url(header) + '.' + keldoauth::service::base64Url(payload);
+    return text + '.' + keldoauth::service::base64Url(key(Algorithm::kEs256).sign(text));
   }
   static std::string header(const std::string& more = "") {
     return R"({"alg":"ES256","kid":")" + key(Algorithm::kEs256).identifier() + '"' + more + '}';

@@ -4,6 +4,7 @@
 #include <fstream>
 
 #include "service/signing/base64url.h"
+#include "service/text/encoding.h"
 #include "tests/signing/calls.h"
 #include "tests/signing/signing_test.h"
 #include "tests/signing/vectors.h"
@@ -23,7 +24,7 @@ class KeyTest : public SigningTest {
 
 TEST_F(KeyTest, SignsWithRsaAsTheStandardsExample) {
   const Key key = Key::read(vector("rfc7515-a2.jwk"));
-  EXPECT_EQ(toBase64Url(key.sign(vectors::kRsaSigned)), vectors::kRsaSignature);
+  EXPECT_EQ(keldoauth::service::base64Url(key.sign(vectors::kRsaSigned)), vectors::kRsaSignature);
   EXPECT_TRUE(key.hasSigned(vectors::kRsaSigned, bytes(vectors::kRsaSignature)));
 }
 
@@ -192,7 +193,7 @@ TEST_F(KeyTest, EvenFactorsAreRefused) {
   Json::Value jwk = vector(kRsa);
   std::string even = bytes(jwk["p"].asString());
   even.back() = static_cast<char>(even.back() & ~1);
-  jwk["p"] = toBase64Url(even);
+  jwk["p"] = keldoauth::service::base64Url(even);
   EXPECT_EQ(failureOf([&] { Key::read(jwk); }), "p and q are no primes");
 }
 

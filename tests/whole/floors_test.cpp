@@ -39,6 +39,7 @@ const std::vector<Floor>& floors() {
                                       {"stores", 3},
                                       {"grants", 4},
                                       {"examples", 5},
+                                      {"service/text", 4},
                                       {"service/http", 5},
                                       {"service/settings", 6},
                                       {"service/store", 7},

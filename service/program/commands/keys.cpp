@@ -1,6 +1,5 @@
 #include <sys/stat.h>
 
-#include <array>
 #include <ctime>
 #include <iostream>
 #include <memory>
@@ -9,6 +8,7 @@
 #include "service/settings/settings.h"
 #include "service/signing/key_file.h"
 #include "service/signing/key_set.h"
+#include "service/text/utc.h"
 
 namespace keldoauth::service {
 namespace {
@@ -20,14 +20,7 @@ constexpr signing::Time kDay = 86400;
 constexpr int kMostDays = 36500;
 
 std::string dateOf(signing::Time time) {
-  const auto when = static_cast<std::time_t>(time);
-  std::tm parts{};
-  std::array<char, 32> text{};
-  if (gmtime_r(&when, &parts) == nullptr ||
-      std::strftime(text.data(), text.size(), "%Y-%m-%d %H:%M:%S", &parts) == 0) {
-    return "?";
-  }
-  return text.data();
+  return utcText(time).value_or("?");
 }
 
 void print(const KeySet& keys) {

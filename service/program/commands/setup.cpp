@@ -24,6 +24,7 @@
 #include "service/signing/key_file.h"
 #include "service/signing/key_set.h"
 #include "utils/descriptor.h"
+#include "utils/folder.h"
 #include "utils/oauth_names.h"
 #include "utils/oauth_utils.h"
 
@@ -31,6 +32,8 @@ namespace keldoauth::service {
 namespace {
 
 namespace grants = KELDOAUTHSERVER::grants;
+
+using KELDOAUTHSERVER::folderOf;
 
 constexpr char kSwitchOn[] = "/usr/sbin/lighttpd-enable-mod";
 constexpr char kServices[] = "/usr/sbin/service";
@@ -44,11 +47,6 @@ struct Wishes {
   std::string htpasswdFile;
   std::string webServer = "lighttpd";
 };
-
-std::string folderOf(const std::string& path) {
-  const std::size_t slash = path.rfind('/');
-  return slash == std::string::npos ? "." : path.substr(0, slash);
-}
 
 bool isThere(const std::string& path) {
   struct stat status {};
@@ -102,18 +100,19 @@ std::string settingsText(const Wishes& wishes) {
 
 // Checks ------------------------------------------------------------------------
 
-/// Throws SettingsFault. Nothing has been made yet.
-void checkWishes(const Wishes& wishes, const std::string& text, const std::string& path) {
-  parseSettings(text, path);
+/// What `text` settles. Throws SettingsFault; nothing has been made yet.
+Settings checkedSettings(const Wishes& wishes, const std::string& text, const std::string& path) {
+  Settings settings = parseSettings(text, path);
   if (isThere(path)) {
     throw SettingsFault({path + " is there already: edit it, and ask keldoauth-service check"});
   }
-  if (wishes.signIn != "system") return;
+  if (wishes.signIn != "system") return settings;
   for (const std::string& name : wishes.administrators) {
     if (getpwnam(name.c_str()) == nullptr) {
       throw SettingsFault({name + " is no user of this box; --sign-in htpasswd knows others"});
     }
   }
+  return settings;
 }
 
 // The store ---------------------------------------------------------------------
@@ -200,8 +199,7 @@ void switchOnLighttpd(const std::string& basePath, const std::string& folder) {
 
 int setUp(const Wishes& wishes, const std::string& path) try {
   const std::string text = settingsText(wishes);
-  checkWishes(wishes, text, path);
-  const Settings settings = parseSettings(text, path);
+  const Settings settings = checkedSettings(wishes, text, path);
   makeStore();
   if (!isThere(settings.keysFile)) makeKeys(settings.keysFile);
   shareWithFolder(settings.keysFile);
@@ -217,7 +215,7 @@ int setUp(const Wishes& wishes, const std::string& path) try {
   if (wishes.webServer == "lighttpd") switchOnLighttpd(settings.basePath, folderOf(path));
   std::cout << "The service is " << settings.issuer << "\n"
             << "Administration: " << settings.endpoint("/admin") << "\n";
-  if (settings.issuer.rfind("https:", 0) == 0) {
+  if (settings.isHttps()) {
     std::cout << "It answers by TLS alone: a web server without a certificate needs one now "
                  "(lighttpd-enable-mod ssl; /etc/lighttpd/server.pem).\n";
   }

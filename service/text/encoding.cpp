@@ -1,4 +1,4 @@
-#include "service/http/encoding.h"
+#include "service/text/encoding.h"
 
 #include <nettle/base64.h>
 #include <nettle/hmac.h>
@@ -98,6 +98,10 @@ bool isUtf8(std::string_view text) {
     text.remove_prefix(length);
   }
   return true;
+}
+
+bool isControl(char c) {
+  return static_cast<unsigned char>(c) < ' ' || c == '\x7f';
 }
 
 char lowerCase(char c) {

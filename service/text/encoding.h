@@ -1,7 +1,7 @@
 // Encodings and digests, from Nettle.
 
-#ifndef KELDOAUTH_SERVICE_HTTP_ENCODING_H
-#define KELDOAUTH_SERVICE_HTTP_ENCODING_H
+#ifndef KELDOAUTH_SERVICE_TEXT_ENCODING_H
+#define KELDOAUTH_SERVICE_TEXT_ENCODING_H
 
 #include <cstddef>
 #include <optional>
@@ -11,7 +11,7 @@
 
 namespace keldoauth::service {
 
-/// Without padding, as RFC 7636 wants it.
+/// RFC 4648, 5, without padding, as RFC 7515 and 7636 want it.
 std::string base64Url(std::string_view bytes);
 
 /// The plain alphabet, as the Basic scheme uses it.
@@ -28,6 +28,9 @@ std::string percentEncode(std::string_view text);
 std::size_t characterLength(std::string_view text);
 bool isUtf8(std::string_view text);
 
+/// One of ASCII: a byte below the blank, or the one beyond the tilde.
+bool isControl(char c);
+
 /// A letter of ASCII as a small one, and any other character as it is.
 char lowerCase(char c);
 
@@ -41,4 +44,4 @@ std::vector<std::string> split(std::string_view text, char separator);
 
 }  // namespace keldoauth::service
 
-#endif  // KELDOAUTH_SERVICE_HTTP_ENCODING_H
+#endif  // KELDOAUTH_SERVICE_TEXT_ENCODING_H
