@@ -17,7 +17,7 @@ namespace {
 /// condition.
 std::string countOf(const char* table, std::initializer_list<std::string> conditions = {}) {
   std::string select = "(SELECT COUNT(*)";
-  for (const std::string& condition : conditions) select += ",IFNULL(SUM(" + condition + "),0)";
+  for (const std::string& condition : conditions) select += "," + rows::countIf(condition);
   return select + " FROM " + table + ") AS of_" + table;
 }
 

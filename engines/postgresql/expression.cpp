@@ -211,8 +211,8 @@ class Rewriter {
 
   /// A number that stands for a condition.
   void rewriteNumber() {
-    constexpr std::string_view kBefore[] = {"WHERE", "ON", "NOT", "OR", "AND"};
-    constexpr std::string_view kBehind[] = {"OR", "AND", "ORDER", "LIMIT"};
+    constexpr std::string_view kBefore[] = {"WHERE", "WHEN", "ON", "NOT", "OR", "AND"};
+    constexpr std::string_view kBehind[] = {"OR", "AND", "THEN", "ORDER", "LIMIT"};
     const bool goesOn = isOneOf(token(1), kBehind);
     const bool isFirst = isOneOf(before(), kBefore) || (before().isSign("(") && goesOn);
     const bool isLast = token(1).kind == Kind::kEnd || token(1).isSign(")") || goesOn;

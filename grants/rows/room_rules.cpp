@@ -58,22 +58,25 @@ struct Crowd {
   long long ofPair;
   long long ofUser;
   long long ofApplication;
-  long long nextId;
 };
 
 /// Only a row of the user or of the application is looked at closely, so that
 /// the others, nearly all in a full table, cost a comparison or two each.
 Crowd count(Store& store, const Claim& claim) {
   const std::string from = std::string(" FROM ") + claim.table;
-  const auto sumOf = [](const std::string& condition) {
-    return ",IFNULL(SUM(" + condition + "),0)";
-  };
-  const std::vector<long long> sums = store.numbers(
-      "SELECT (SELECT COUNT(*)" + from + ")" + sumOf(claim.isOfPair) + sumOf(claim.isOfUser) +
-      sumOf(claim.isOfApplication) + ",(SELECT IFNULL(MAX(id),0)+1" + from + " WHERE id<" +
-      kOrdinaryId + ")" + from + " WHERE (" + claim.isOfUser + " OR " + claim.isOfApplication +
-      ") AND NOT " + claim.isDead);
-  return {sums[0], sums[1], sums[2], sums[3], sums[4]};
+  const std::vector<long long> counts = store.numbers(
+      "SELECT (SELECT COUNT(*)" + from + ")," + countIf(claim.isOfPair) + "," +
+      countIf(claim.isOfUser) + "," + countIf(claim.isOfApplication) + from + " WHERE (" +
+      claim.isOfUser + " OR " + claim.isOfApplication + ") AND NOT " + claim.isDead);
+  return {counts[0], counts[1], counts[2], counts[3]};
+}
+
+/// The id that the next row gets.
+long long nextId(Store& store, const Claim& claim) {
+  return store
+      .numbers(std::string("SELECT IFNULL(MAX(id),0)+1 FROM ") + claim.table + " WHERE id<" +
+               kOrdinaryId)
+      .front();
 }
 
 /// Removes the first `most` of the rows that meet `condition`; how many went.
@@ -234,6 +237,11 @@ std::string isOwnToken() {
   return isOneOf(names::kFlowType, {kOwnFlow});
 }
 
+/// A sum of conditions would add up the rows that do not meet them, too.
+std::string countIf(const std::string& condition) {
+  return "COUNT(CASE WHEN " + condition + " THEN 1 END)";
+}
+
 bool makeRoomForCode(Store& store, const std::string& user, const std::string& application,
                      Evicts evicts, long long now) {
   const std::string isOfUser = isOneOf(names::kUsername, spellings(user));
@@ -252,8 +260,9 @@ bool makeRoomForCode(Store& store, const std::string& user, const std::string& a
 std::optional<long long> makeRoomForLogin(Store& store, const std::string& user,
                                           const std::string& application, Evicts evicts,
                                           long long now) {
-  const auto crowd = makeRoom(store, loginClaim(store, user, application, evicts, now));
-  return crowd ? std::optional<long long>(crowd->nextId) : std::nullopt;
+  const Claim claim = loginClaim(store, user, application, evicts, now);
+  if (!makeRoom(store, claim)) return {};
+  return nextId(store, claim);
 }
 
 long long makeRoomForOwnToken(Store& store, const std::string& application, bool registeredItself,
@@ -265,7 +274,8 @@ long long makeRoomForOwnToken(Store& store, const std::string& application, bool
                        : "0";
   claim.isOfPair = "(" + isOwnToken() + " AND " + claim.isOfApplication + ")";
   claim.pairBound = store.policy.tokensOfItself;
-  return makeRoom(store, claim)->nextId;
+  makeRoom(store, claim);
+  return nextId(store, claim);
 }
 
 /// All of them together have a part of the table, in which nobody loses any but
@@ -282,8 +292,8 @@ void makeRoomForPushed(Store& store, const std::string& application, long long n
 
 void makeRoomForApplication(Store& store, bool registersItself, long long now) {
   const long long limit = getTableRowMax(names::kClientInfoMax);
-  const std::vector<long long> found = store.numbers(
-      "SELECT COUNT(*),IFNULL(SUM(" + selfCondition() + "),0) FROM " + names::kClientInfoTable);
+  const std::vector<long long> found = store.numbers("SELECT COUNT(*)," + countIf(selfCondition()) +
+                                                     " FROM " + names::kClientInfoTable);
   const long long part = std::max(limit / std::max(store.policy.selfRegisteredPart, 1), 1LL);
   const bool isBeyond = registersItself && found[1] >= part;
   if (!isBeyond && found[0] < limit) return;

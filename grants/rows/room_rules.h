@@ -30,6 +30,9 @@ std::string isOverLogin(const Policy& policy, long long now);
 /// Of an application that acts for itself.
 std::string isOwnToken();
 
+/// A column: how many of the selected rows meet the condition.
+std::string countIf(const std::string& condition);
+
 // Within the transaction of an operation that will insert a row: make the room
 // that its owner is due. Throws Trouble (kFull), with one line in the system
 // log, when there is none.

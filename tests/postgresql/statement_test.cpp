@@ -72,6 +72,8 @@ TEST(StatementTest, NumbersMayStandForConditions) {
             "DELETE FROM keldoauth.\"t\" WHERE (1<>0) AND \"a\" = 'x' AND NOT (0<>0)");
   EXPECT_EQ(rewritten("DELETE FROM t WHERE id BETWEEN 3 AND 5"),
             "DELETE FROM keldoauth.\"t\" WHERE \"id\" BETWEEN 3 AND 5");
+  EXPECT_EQ(rewritten("DELETE FROM t WHERE a<CASE WHEN 0 THEN 1 ELSE 2 END"),
+            "DELETE FROM keldoauth.\"t\" WHERE \"a\" < CASE WHEN (0<>0) THEN 1 ELSE 2 END");
 }
 
 TEST(StatementTest, PartsOfAStatementHaveNames) {
