@@ -37,8 +37,8 @@ void logThrottled(const std::string& what, const std::string& peer) {
 }
 
 void logFailedSecret(const std::string& peer, const std::string& path) {
-  syslog(LOG_AUTH | LOG_NOTICE, "failed secret from %s at %s",
-         loggedAddress(peer).c_str(), quoted(path).c_str());
+  syslog(LOG_AUTH | LOG_NOTICE, "failed secret from %s at %s", loggedAddress(peer).c_str(),
+         quoted(path).c_str());
 }
 
 void logCannotCheck(const std::string& why) {

@@ -63,8 +63,7 @@ grants::Outcome<grants::Pair> actForItself(grants::Grants& store, const Asking& 
 /// lost for want of a key.
 std::string idTokenOrNone(const Settings& settings, const grants::Application& client,
                           const grants::Pair& pair, bool isRefresh) try {
-  return idTokenFor(settings, client, pair,
-                    isRefresh ? Occasion::kRefresh : Occasion::kLogin);
+  return idTokenFor(settings, client, pair, isRefresh ? Occasion::kRefresh : Occasion::kLogin);
 } catch (const signing::KeyFault&) {
   if (isRefresh) return {};
   throw;

@@ -1,1 +1,3 @@
-int ofItsOwn() { return 0; }
+int ofItsOwn() {
+  return 0;
+}
