@@ -178,7 +178,7 @@ Verdict Connection::take(const Reply& reply, std::size_t at, RowCallback callbac
   PGresult* const result = reply.results[at].get();
   if (PQresultStatus(result) != PGRES_TUPLES_OK) {
     const std::string changed = PQcmdTuples(result);
-    if (!changed.empty()) changes_ = std::atoi(changed.c_str());
+    if (!changed.empty()) changes_ = static_cast<int>(std::strtol(changed.c_str(), nullptr, 10));
     return {};
   }
   return callback != nullptr ? giveRows(result, callback, arg) : Verdict{};
@@ -217,7 +217,7 @@ Verdict Connection::runWithin(const Statement& statement, RowCallback callback, 
   const Reply reply = ask(text + statement.text + ";RELEASE s");
   if (reply.isCutOff) return verdict(kIoError, kLostText);
   if (const PGresult* const failure = reply.failure(); failure != nullptr) {
-    const Verdict failed = verdictOn(failure, statement.table);
+    Verdict failed = verdictOn(failure, statement.table);
     if (ask("ROLLBACK TO s;RELEASE s").failure() != nullptr) state_ = State::kLost;
     return failed;
   }

@@ -55,7 +55,7 @@ class Connection {
 
   /// The statement that takes the lock for changes and compares the keys; empty
   /// with the verdict set when this box has no key that works.
-  std::string lock(Verdict& verdict) const;
+  std::string lock(Verdict& refused) const;
   Verdict requireKey() const;
 
   /// Takes up another connection where the one there was has ended.

@@ -61,9 +61,10 @@ class Lexer {
     if (c == ';') return take(Token::Kind::kEnd, 1);
     if (c == '\'') return takeText();
     if (c == '"' || c == '`' || c == '[') return takeName(c == '[' ? ']' : c);
-    if (isLetter(c))
+    if (isLetter(c)) {
       return takeWhile(Token::Kind::kWord,
                        [](char d) { return isLetter(d) || isDigit(d) || d == '$'; });
+    }
     if (isDigit(c)) return takeNumber();
     return takeSign();
   }

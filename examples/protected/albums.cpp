@@ -45,11 +45,11 @@ int main() try {
 
   const Grants grants;
   const auto bearer = grants.tokens.verify(AccessToken(token));
-  if (!bearer) return refuse("401 Unauthorized", ", error=\"invalid_token\"");
+  if (!bearer) return refuse("401 Unauthorized", R"(, error="invalid_token")");
   // A token without a user is an application's own: it has no albums.
   if (!bearer->user || !covers(bearer->scope)) {
     return refuse("403 Forbidden",
-                  std::string(", error=\"insufficient_scope\", scope=\"") + kScope + "\"");
+                  std::string(R"(, error="insufficient_scope", scope=")") + kScope + "\"");
   }
   return answer("200 OK", "Content-Type: text/plain; charset=utf-8\r\n",
                 "The albums of " + bearer->user->text() + "\n");
