@@ -1,3 +1,4 @@
+#include "core/tables.h"
 #include "tests/core/rows_test.h"
 
 namespace {
@@ -37,6 +38,23 @@ TEST_F(GetTest, ColumnThatNoStoreHasComesUnderItsName) {
   expected["zebra"] = "striped";
   expected["identity"] = "short of none";
   EXPECT_EQ(rows[0], expected);
+}
+
+TEST_F(GetTest, RowsOfAListingShareTheNamesOfEveryColumn) {
+  std::string row;
+  for (const auto* table : KELDOAUTHSERVER::schema::kTables) {
+    for (const char* column : table->columns)
+      row += (row.empty() ? "SELECT 1 AS " : ", 1 AS ") + std::string(column);
+  }
+  rows = kEmptyArray;
+  ASSERT_TRUE(clients->DBCmd(row + " UNION ALL " + row, Table::TabGetCallback, &rows));
+  ASSERT_THAT(rows, SizeIs(2));
+  auto again = rows[1].begin();
+  for (auto member = rows[0].begin(); member != rows[0].end(); ++member, ++again) {
+    const char* end = nullptr;
+    EXPECT_EQ(static_cast<const void*>(member.memberName(&end)), again.memberName(&end))
+        << member.name();
+  }
 }
 
 TEST_F(GetTest, EveryMemberOfTheConditionMustHold) {

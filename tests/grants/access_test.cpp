@@ -153,6 +153,35 @@ TEST_F(AccessTest, OtherProgramsRowsAreListed) {
   EXPECT_EQ(entries[0].ends, kNow + 600 + 30 * kDay);
 }
 
+TEST_F(AccessTest, ACodeTellsWhatItIsFor) {
+  CodeRequest asked = request(frame_);
+  asked.text = CallerText("device: 'phone'");
+  ASSERT_TRUE(grants().codes.issue(asked));
+  const std::vector<AccessEntry> entries = of(kAlice);
+  ASSERT_THAT(entries, SizeIs(1));
+  EXPECT_EQ(entries[0].kind, Kind::kCode);
+  EXPECT_EQ(entries[0].application, frame_);
+  EXPECT_EQ(entries[0].applicationName, ApplicationName("Photo Frame"));
+  EXPECT_EQ(entries[0].scope, kScope);
+  EXPECT_EQ(entries[0].text, asked.text);
+  EXPECT_EQ(entries[0].since, kNow);
+  EXPECT_EQ(entries[0].renewed, kNow);
+  EXPECT_FALSE(entries[0].isDead);
+  EXPECT_FALSE(entries[0].isForeign);
+}
+
+TEST_F(AccessTest, OtherProgramsCodesAreListed) {
+  Json::Value out;
+  KELDOAUTHSERVER::OAUTHDBGrantCode(names::kGrantCodeTable)
+      .Add("O'Brien", frame_.text(), "profile", "their state", "192.0.2.1", out);
+  const std::vector<AccessEntry> entries = of(User("O'Brien"));
+  ASSERT_THAT(entries, SizeIs(1));
+  EXPECT_EQ(entries[0].kind, Kind::kCode);
+  EXPECT_TRUE(entries[0].isForeign);
+  EXPECT_EQ(entries[0].text, CallerText("their state"));
+  EXPECT_EQ(entries[0].since, 0);
+}
+
 TEST_F(AccessTest, ACodeOrTokenIsFoundByItsText) {
   const Code code = issue(frame_);
   const Pair pair = login(frame_, kBob);

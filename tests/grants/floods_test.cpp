@@ -259,6 +259,19 @@ TEST_F(SelfRegistrationTest, KeepToHalfOfTheRegistry) {
   expectOthersUnharmed();
 }
 
+TEST_F(SelfRegistrationTest, KeepToThePartThatThePolicySays) {
+  // Two of the ten are the owner's. A part below 1 counts as 1.
+  const std::pair<int, std::size_t> rooms[] = {{1, 8}, {0, 8}, {-1, 8}, {3, 3}, {10, 1}, {11, 1}};
+  for (const auto& [part, room] : rooms) {
+    Policy policy;
+    policy.selfRegisteredPart = part;
+    open(policy);
+    for (int i = 0; i < 8; ++i) addItself(i);
+    EXPECT_EQ(grants().applications.all().size(), 2 + room) << part;
+    sql("DELETE FROM oauth_clientInfo WHERE display_name LIKE 'Self %'");
+  }
+}
+
 TEST_F(SelfRegistrationTest, EachTakesTheOldestOnesPlaceAlone) {
   const auto isThere = [this](int number) {
     const ApplicationName name("Self " + std::to_string(number));

@@ -40,13 +40,32 @@ TEST(HarmlessTest, WhatCouldForgeOrTurnAnEntryIsWrittenOut) {
   for (const Shown& row : table) EXPECT_EQ(harmless(row.text), row.shown);
 }
 
+TEST(HarmlessTest, FirstAndLastCharactersOfEachLengthAreOnes) {
+  const Shown table[] = {
+      {"\xc2\x80", "\\u{80}"},
+      {"\xdf\xbf", "\xdf\xbf"},
+      {"\xe0\xa0\x80", "\xe0\xa0\x80"},
+      {"\xed\x9f\xbf", "\xed\x9f\xbf"},
+      {"\xee\x80\x80", "\\u{e000}"},
+      {"\xef\xbf\xbf", "\\u{ffff}"},
+      {"\xf0\x90\x80\x80", "\xf0\x90\x80\x80"},
+      {"\xf4\x8f\xbf\xbf", "\\u{10ffff}"},
+  };
+  for (const Shown& row : table) EXPECT_EQ(harmless(row.text), row.shown);
+}
+
 TEST(HarmlessTest, BytesThatAreNotUtf8AreWrittenOut) {
   const Shown table[] = {
       {"\xff", "\\xff"},
       {"\xc0\xaf", "\\xc0\\xaf"},
+      {"\xc1\xbf", "\\xc1\\xbf"},
+      {"\xe0\x9f\xbf", "\\xe0\\x9f\\xbf"},
+      {"\xf0\x8f\xbf\xbf", "\\xf0\\x8f\\xbf\\xbf"},
       {"\xed\xa0\x80", "\\xed\\xa0\\x80"},
+      {"\xed\xbf\xbf", "\\xed\\xbf\\xbf"},
       {"\xe2\x80", "\\xe2\\x80"},
       {"\xf4\x90\x80\x80", "\\xf4\\x90\\x80\\x80"},
+      {"\xf5\x80\x80\x80", "\\xf5\\x80\\x80\\x80"},
       {"\x80"
        "a",
        "\\x80a"},
