@@ -24,9 +24,8 @@ std::string counted(long long times) {
 /// another's.
 long long timesIn(std::string_view rest) {
   if (rest.empty()) return 1;
-  const std::size_t frame = kCountStart.size() + kCountEnd.size();
-  if (rest.size() <= frame || rest.substr(0, kCountStart.size()) != kCountStart) return 0;
-  const std::string_view digits = rest.substr(kCountStart.size(), rest.size() - frame);
+  if (rest.substr(0, kCountStart.size()) != kCountStart) return 0;
+  const std::string_view digits = rest.substr(kCountStart.size());
   std::uint32_t times = 0;
   std::from_chars(digits.data(), digits.data() + digits.size(), times);
   return counted(times) == rest ? times : 0;
