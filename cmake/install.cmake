@@ -66,7 +66,8 @@ if(TARGET keldoauth_static)
     DESTINATION ${CMAKE_INSTALL_LIBDIR} RENAME libkeldoauth_jsoncpp.a COMPONENT dev)
   install(EXPORT KeldOAuthStaticTargets NAMESPACE KeldOAuth::
     DESTINATION ${package_dir} COMPONENT dev)
-  list(JOIN JSONCPP_CFLAGS " " KELDOAUTH_PC_JSONCPP_CFLAGS)
+  # Where it is on the machine that the copy is for.
+  string(REPLACE "${CMAKE_SYSROOT}/" "/" KELDOAUTH_PC_JSONCPP ${KELDOAUTH_JSONCPP_INCLUDE_DIR})
   configure_file(cmake/keldoauth-static.pc.in keldoauth-static.pc @ONLY)
   install(FILES ${CMAKE_CURRENT_BINARY_DIR}/keldoauth-static.pc
     DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)

@@ -7,5 +7,25 @@ if(NOT DEFINED CMAKE_CXX_EXTENSIONS)
   set(CMAKE_CXX_EXTENSIONS OFF)
 endif()
 
-# Each source has log numbers of its own under one name: it is a unit by itself.
-set(CMAKE_UNITY_BUILD OFF)
+# What flags of the caller's may have taken away is said here, not by each source.
+include(CheckCXXSourceCompiles)
+check_cxx_source_compiles("
+  #include <charconv>
+  #include <optional>
+  #include <stdexcept>
+  #include <string_view>
+  int main() {
+    try {
+      const std::string_view text = \"17\";
+      std::optional<int> number = 0;
+      std::from_chars(text.data(), text.data() + text.size(), *number);
+      throw std::out_of_range(std::to_string(*number));
+    } catch (const std::exception&) {
+      return 0;
+    }
+  }" KELDOAUTH_LANGUAGE_IS_THERE)
+if(NOT KELDOAUTH_LANGUAGE_IS_THERE)
+  unset(KELDOAUTH_LANGUAGE_IS_THERE CACHE)
+  message(FATAL_ERROR "keldoauth: ${CMAKE_CXX_COMPILER} with the flags \"${CMAKE_CXX_FLAGS}\" "
+    "compiles and links no program with C++17's library and exceptions; it takes both")
+endif()

@@ -3,10 +3,31 @@
 # The first that knows synchronous=EXTRA: an older one takes it for NORMAL.
 find_package(SQLite3 3.12 QUIET)
 find_package(PkgConfig QUIET)
-if(PKG_CONFIG_FOUND)
-  pkg_check_modules(JSONCPP QUIET IMPORTED_TARGET jsoncpp)
-  pkg_check_modules(NETTLE QUIET IMPORTED_TARGET GLOBAL nettle)
-endif()
+
+# keldoauth_find(NAME MODULE HEADER): the variables KELDOAUTH_NAME_INCLUDE_DIR and
+# _LIBRARY, and _FOUND when both are there. What pkg-config says is a hint and no
+# more: unless a toolchain file thinks of it, it speaks of the host's.
+macro(keldoauth_find name module header)
+  if(PKG_CONFIG_FOUND)
+    pkg_check_modules(KELDOAUTH_HINT_${name} QUIET ${module})
+  endif()
+  find_path(KELDOAUTH_${name}_INCLUDE_DIR ${header}
+    HINTS ${KELDOAUTH_HINT_${name}_INCLUDE_DIRS} ${KELDOAUTH_HINT_${name}_INCLUDEDIR}
+    PATH_SUFFIXES ${module})
+  find_library(KELDOAUTH_${name}_LIBRARY ${module}
+    HINTS ${KELDOAUTH_HINT_${name}_LIBRARY_DIRS} ${KELDOAUTH_HINT_${name}_LIBDIR})
+  mark_as_advanced(KELDOAUTH_${name}_INCLUDE_DIR KELDOAUTH_${name}_LIBRARY)
+  set(KELDOAUTH_${name}_FOUND OFF)
+  if(KELDOAUTH_${name}_INCLUDE_DIR AND KELDOAUTH_${name}_LIBRARY)
+    set(KELDOAUTH_${name}_FOUND ON)
+  endif()
+endmacro()
+
+keldoauth_find(JSONCPP jsoncpp json/value.h)
+keldoauth_find(NETTLE nettle nettle/siv-cmac.h)
+keldoauth_find(HOGWEED hogweed nettle/rsa.h)
+find_path(KELDOAUTH_GMP_INCLUDE_DIR gmp.h HINTS ${KELDOAUTH_HINT_HOGWEED_INCLUDE_DIRS})
+mark_as_advanced(KELDOAUTH_GMP_INCLUDE_DIR)
 
 set(KELDOAUTH_MISSING "")
 
@@ -19,28 +40,20 @@ function(keldoauth_need found thing package)
   endif()
 endfunction()
 
-keldoauth_need(PKG_CONFIG_FOUND pkg-config pkg-config)
 keldoauth_need(SQLite3_FOUND "SQLite 3.12" libsqlite3-dev)
-if(PKG_CONFIG_FOUND)
-  keldoauth_need(JSONCPP_FOUND JsonCpp libjsoncpp-dev)
-  foreach(part TOOLS SERVICE)
-    if(KELDOAUTH_${part})
-      keldoauth_need(NETTLE_FOUND nettle nettle-dev
-        "for KELDOAUTH_${part}; -DKELDOAUTH_${part}=OFF does without")
-    endif()
-  endforeach()
-endif()
-if(KELDOAUTH_SERVICE)
-  if(PKG_CONFIG_FOUND)
-    pkg_check_modules(HOGWEED QUIET IMPORTED_TARGET GLOBAL hogweed)
-    find_path(GMP_INCLUDE_DIR gmp.h HINTS ${HOGWEED_INCLUDE_DIRS})
-    mark_as_advanced(GMP_INCLUDE_DIR)
-    if(HOGWEED_FOUND AND GMP_INCLUDE_DIR)
-      set(KELDOAUTH_HOGWEED_FOUND ON)
-    endif()
-    keldoauth_need(KELDOAUTH_HOGWEED_FOUND "nettle's hogweed with GMP" "nettle-dev libgmp-dev"
-      "for KELDOAUTH_SERVICE; -DKELDOAUTH_SERVICE=OFF does without")
+keldoauth_need(KELDOAUTH_JSONCPP_FOUND JsonCpp libjsoncpp-dev)
+foreach(part TOOLS SERVICE)
+  if(KELDOAUTH_${part})
+    keldoauth_need(KELDOAUTH_NETTLE_FOUND nettle nettle-dev
+      "for KELDOAUTH_${part}; -DKELDOAUTH_${part}=OFF does without")
   endif()
+endforeach()
+if(KELDOAUTH_SERVICE)
+  if(NOT KELDOAUTH_GMP_INCLUDE_DIR)
+    set(KELDOAUTH_HOGWEED_FOUND OFF)
+  endif()
+  keldoauth_need(KELDOAUTH_HOGWEED_FOUND "nettle's hogweed with GMP" "nettle-dev libgmp-dev"
+    "for KELDOAUTH_SERVICE; -DKELDOAUTH_SERVICE=OFF does without")
   find_path(KELDOAUTH_FCGI_INCLUDE_DIR fcgiapp.h)
   find_library(KELDOAUTH_FCGI_LIBRARY NAMES libfcgi.a fcgi)
   mark_as_advanced(KELDOAUTH_FCGI_INCLUDE_DIR KELDOAUTH_FCGI_LIBRARY)

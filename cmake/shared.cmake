@@ -8,4 +8,5 @@ target_link_options(keldoauth PRIVATE
 target_link_options(keldoauth PRIVATE LINKER:-z,nodelete)
 
 # A consumer's linker finds the platform libraries beside it.
-target_link_options(keldoauth INTERFACE $<BUILD_INTERFACE:LINKER:-rpath-link,${PROJECT_BINARY_DIR}>)
+target_link_options(keldoauth INTERFACE
+  $<BUILD_INTERFACE:LINKER:-rpath-link,$<TARGET_FILE_DIR:keldoauth>>)

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # What the options of a build do. Runs in private mounts, where what is to be
 # missing can be hidden.
-# Usage: options.sh missing|switched|language|archive
+# Usage: options.sh missing|switched|language|archive|sysroot|configurations|documented
 set -euo pipefail
 
 subject=$1
@@ -25,13 +25,7 @@ parts_off=(-DKELDOAUTH_TOOLS=OFF -DKELDOAUTH_SERVICE=OFF -DKELDOAUTH_EXAMPLES=OF
 
 hide_cli11() { mount -n -t tmpfs tmpfs /usr/include/CLI; }
 
-# hide_nettle: pkg-config sees nothing but these two.
-hide_nettle() {
-  mkdir pc
-  cp "$(pkg-config --variable=pcfiledir jsoncpp)/jsoncpp.pc" \
-    "$(pkg-config --variable=pcfiledir sqlite3)/sqlite3.pc" pc
-  export PKG_CONFIG_LIBDIR=$work/pc
-}
+hide_nettle() { mount -n -t tmpfs tmpfs /usr/include/nettle; }
 
 # The parts of a tree: what each builds that the others do not.
 declare -A targets=([TOOLS]=keldoauth_cli [SERVICE]=keldoauth_service [EXAMPLES]=first_token)
@@ -46,6 +40,12 @@ case $subject in
     for word in CLI11 libcli11-dev nettle-dev KELDOAUTH_TOOLS=OFF KELDOAUTH_SERVICE=OFF; do
       grep -q -- "$word" all.log || fail "not a word of $word: $(<all.log)"
     done
+    # The same of what flags take away; and the folder is good for another try.
+    if configured flags -DCMAKE_CXX_FLAGS=-fno-exceptions "${parts_off[@]}" \
+      -DKELDOAUTH_PLATFORM=auto; then fail "configured without exceptions"; fi
+    grep -q -- "-fno-exceptions.*" flags.log || fail "not a word of the flag: $(<flags.log)"
+    umount /usr/include/nettle
+    configured flags -DCMAKE_CXX_FLAGS= "${parts_off[@]}" || fail "$(<flags.log)"
     ;;
   switched)
     for part in "${!targets[@]}"; do
@@ -87,7 +87,7 @@ case $subject in
     cmake --install tree >/dev/null
     [[ -z $(find "$work" -name 'libkeldoauth.so*') ]] || fail "a shared library was built"
 
-    cmake -S "$here/find_package" -B found -G Ninja -DKeldOAuth_DIR="$lib/cmake/KeldOAuth" >/dev/null
+    cmake -S "$here/find_package" -B found -G Ninja -DCMAKE_PREFIX_PATH="$work/a" >/dev/null
     cmake --build found >/dev/null
     export PKG_CONFIG_PATH=$lib/pkgconfig
     read -ra flags <<<"$(pkg-config --cflags --libs keldoauth)"
@@ -98,6 +98,55 @@ case $subject in
       LD_LIBRARY_PATH=$lib "./$program"
       rm -f /var/packages/Corvane/target/etc/*
     done
+    ;;
+  sysroot)
+    # A toolchain file that says as little as they do: compiler and root. What
+    # pkg-config says is of another machine then.
+    mkdir root pc
+    ln -s /usr /lib root
+    [[ ! -e /lib64 ]] || ln -s /lib64 root
+    printf 'Name: jsoncpp\nDescription: x\nVersion: 0\nCflags: -I/nowhere\nLibs: -L/nowhere -ljsoncpp\n' \
+      >pc/jsoncpp.pc
+    cat >toolchain.cmake <<END
+set(CMAKE_SYSTEM_NAME Linux)
+set(CMAKE_C_COMPILER gcc)
+set(CMAKE_CXX_COMPILER g++)
+set(CMAKE_SYSROOT $work/root)
+set(CMAKE_FIND_ROOT_PATH $work/root)
+foreach(kind LIBRARY INCLUDE PACKAGE)
+  set(CMAKE_FIND_ROOT_PATH_MODE_\${kind} ONLY)
+endforeach()
+END
+    touch libjsoncpp.a
+    PKG_CONFIG_LIBDIR=$work/pc configured tree "${parts_off[@]}" \
+      -DCMAKE_TOOLCHAIN_FILE="$work/toolchain.cmake" -DKELDOAUTH_STATIC_JSONCPP="$work/libjsoncpp.a" ||
+      fail "$(<tree.log)"
+    cmake --build tree --target keldoauth >tree.log || fail "$(<tree.log)"
+    # No folder of the building machine's is in what is installed.
+    ! grep -F "$work" tree/*.pc tree/KeldOAuthConfig.cmake || fail "the root of the build is named"
+    ;;
+  configurations)
+    # A generator of several, whose files lie in a folder for each, with names that
+    # are none of a caller's business.
+    cmake -S "$project" -B tree -G "Ninja Multi-Config" -DKELDOAUTH_PLATFORM=standin \
+      "${parts_off[@]}" -DKELDOAUTH_EXAMPLES=ON -DCMAKE_DEBUG_POSTFIX=d >tree.log
+    cmake --build tree --config Debug --target first_token >tree.log || fail "$(<tree.log)"
+    LD_LIBRARY_PATH=tree/Debug tree/Debug/first_token
+    ;;
+  documented)
+    # docs/packaging.md has the options that there are, with their defaults.
+    configured tree
+    {
+      cmake -N -L tree | sed -nE 's/^(KELD[A-Z0-9_]+):[A-Z]+=(.*)/\1 \2/p'
+      echo BUILD_SHARED_LIBS ON
+    } | grep -v _STATIC_JSONCPP | sort >real
+    awk -F ' *[|] *' '/^\| `(KELD|BUILD_)/ {
+      names = split($2, name, ", *")
+      gsub(/`/, "", $3)
+      for (i = 1; i <= names; i++) { gsub(/`/, "", name[i]); print name[i], $3 }
+    }' "$project/docs/packaging.md" | grep -v _STATIC_JSONCPP | sort >said
+    sed -i -e 's/^KELDOAUTH_PLATFORM standin/KELDOAUTH_PLATFORM auto/' real
+    diff said real || fail "docs/packaging.md (<) and CMake (>) differ"
     ;;
   *) fail "no such subject: $subject" ;;
 esac
