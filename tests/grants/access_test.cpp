@@ -192,6 +192,16 @@ TEST_F(AccessTest, ACodeOrTokenIsFoundByItsText) {
   EXPECT_FALSE(access().find(AnyToken("x")));
 }
 
+TEST_F(AccessTest, ARowThatCannotBeDecryptedIsTrouble) {
+  const Code code = issue(frame_);
+  const Pair pair = login(frame_);
+  support::Platform::failDecryptFrom(1);
+  EXPECT_THROW(access().find(code), Trouble);
+  EXPECT_THROW(access().find(AnyToken(pair.access.text())), Trouble);
+  support::Platform::release();
+  EXPECT_TRUE(access().find(code));
+}
+
 // Ending one ------------------------------------------------------------------------
 
 TEST_F(AccessTest, AHandleEndsWhatItNamed) {

@@ -52,6 +52,13 @@ TEST_F(AuditTest, NoTextCanForgeAnEntry) {
   EXPECT_THAT(entries(), ElementsAre("x by [bob) (9 times)\\x0aKey changed by (root]"));
 }
 
+TEST_F(AuditTest, SixtyFourBytesOfAWordAreKept) {
+  audit().record(std::string(64, 'x'), kAdmin);
+  audit().record(std::string(65, 'y'), kAdmin);
+  EXPECT_THAT(entries(), ElementsAre(std::string(64, 'x') + " by [admin]",
+                                     std::string(64, 'y') + " by [admin]"));
+}
+
 TEST_F(AuditTest, ARepeatedEntryWithQuotesIsCounted) {
   audit().record("It's", Actor("O''Brien"));
   audit().record("It's", Actor("O''Brien"));

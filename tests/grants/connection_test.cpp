@@ -59,6 +59,26 @@ TEST_F(ConnectionTest, ATransactionThatIsLostHalfwayChangesNothing) {
   EXPECT_TRUE(grants().codes.redeem(redemption(frame, code)));
 }
 
+TEST_F(ConnectionTest, ATroubleIsToldByItsOwnReasonAndNotByTheLastOnes) {
+  const ApplicationId frame = add().identifier;
+  const Code code = issue(frame);
+  const auto reasonWhen = [&](const std::string& happens) {
+    sql("CREATE TRIGGER refuse BEFORE UPDATE ON oauth_grantCode BEGIN SELECT RAISE(" + happens +
+        "); END;");
+    std::string reason;
+    try {
+      grants().codes.redeem(redemption(frame, code));
+    } catch (const Trouble& trouble) {
+      reason = std::to_string(trouble.code()) + " " + trouble.what();
+    }
+    sql("DROP TRIGGER refuse");
+    return reason;
+  };
+  EXPECT_EQ(reasonWhen("ABORT, 'no'"), "19 no");
+  EXPECT_EQ(reasonWhen("IGNORE"), "1 a row is not as it was read a moment ago");
+  EXPECT_TRUE(grants().codes.redeem(redemption(frame, code)));
+}
+
 TEST_F(ConnectionTest, ManyOperationsShareIt) {
   const ApplicationId frame = add().identifier;
   Pair pair = login(frame);

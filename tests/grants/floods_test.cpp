@@ -296,6 +296,18 @@ TEST_F(SelfRegistrationTest, WhenAllAreUsedTheRegistryIsFull) {
   EXPECT_EQ(grants().applications.all().size(), 7U);
 }
 
+TEST_F(SelfRegistrationTest, AFullRegistryOfALowerLimitKeepsThemAll) {
+  for (int i = 0; i < 5; ++i) addItself(i);
+  for (int i = 0; i < 3; ++i) add("The owner's " + std::to_string(i));
+  for (const int limit : {8, 7, 6}) {  // two of the five would go for the first
+    writeSettings(R"({"client_info_max": )" + std::to_string(limit) + "}");
+    EXPECT_THROW(addItself(5), Trouble) << limit;
+    EXPECT_EQ(grants().applications.all().size(), 10U) << limit;
+  }
+  writeSettings(R"({"client_info_max": 9})");
+  EXPECT_NO_THROW(addItself(5));
+}
+
 TEST_F(SelfRegistrationTest, AreCountedInOneEntry) {
   for (int i = 0; i < 20; ++i) addItself(i);
   const auto self = entries().back();
