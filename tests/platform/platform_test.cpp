@@ -22,7 +22,7 @@ std::string base64Url(const std::string& bytes) {
   unsigned bits = 0;
   int count = 0;
   for (const char byte : bytes) {
-    bits = (bits << 8) | static_cast<unsigned char>(byte);
+    bits = ((bits & 0x3f) << 8) | static_cast<unsigned char>(byte);
     for (count += 8; count >= 6; count -= 6) text += alphabet[(bits >> (count - 6)) & 63];
   }
   if (count > 0) text += alphabet[(bits << (6 - count)) & 63];

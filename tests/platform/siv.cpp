@@ -60,7 +60,8 @@ std::string exclusiveOr(std::string left, const std::string& right) {
 std::string doubled(const std::string& block) {
   std::string result(kBlock, '\0');
   unsigned carry = 0;
-  for (std::size_t i = kBlock; i-- > 0;) {
+  for (std::size_t end = kBlock; end > 0; --end) {
+    const std::size_t i = end - 1;
     const unsigned shifted = (static_cast<unsigned char>(block[i]) << 1U) | carry;
     result[i] = static_cast<char>(shifted & 0xff);
     carry = shifted >> 8;

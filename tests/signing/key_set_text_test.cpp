@@ -30,8 +30,8 @@ TEST_F(KeySetTextTest, OrderOfTheKeysIsFree) {
   set.rotate(kStart);
   document_ = parsed(set.text());
   Json::Value reversed(Json::arrayValue);
-  for (Json::ArrayIndex i = document_["keys"].size(); i-- > 0;) {
-    reversed.append(document_["keys"][i]);
+  for (Json::ArrayIndex left = document_["keys"].size(); left > 0; --left) {
+    reversed.append(document_["keys"][left - 1]);
   }
   document_["keys"] = reversed;
   EXPECT_EQ(KeySet::read(written(document_)).text(), set.text());

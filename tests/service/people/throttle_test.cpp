@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 
 #include <fstream>
+#include <random>
 
 #include "tests/service/people/scene.h"
 
@@ -140,11 +141,8 @@ TEST_F(ThrottleTest, ADamagedFileLocksNobodyOut) {
   take();
   std::fstream file(at("counters"), std::ios::in | std::ios::out | std::ios::binary);
   file.seekp(128);
-  unsigned int noise = 1;
-  for (std::size_t i = 0; i < 1280 * 128; ++i) {
-    noise = noise * 1103515245U + 12345U;
-    file.put(static_cast<char>(noise >> 16U));
-  }
+  std::minstd_rand noise(1);
+  for (std::size_t i = 0; i < 1280 * 128; ++i) file.put(static_cast<char>(noise() >> 16U));
   file.close();
   for (int i = 0; i < 2000; ++i) EXPECT_EQ(take("user" + std::to_string(i)), 0);
 }
