@@ -10,7 +10,7 @@
 set(KELDOAUTH_STATIC_JSONCPP "" CACHE FILEPATH
     "libjsoncpp.a for the static flavour, from scripts/static-jsoncpp")
 option(KELDOAUTH_STATIC_PROGRAMS
-       "Link the command line and the example service with the static flavour" OFF)
+       "Link the command line and the service with the static flavour" OFF)
 find_library(SQLITE3_ARCHIVE libsqlite3.a)
 mark_as_advanced(SQLITE3_ARCHIVE)
 

@@ -96,3 +96,6 @@ if(KELDOAUTH_TESTS AND NOT (BUILD_SHARED_LIBS AND KELDOAUTH_TOOLS AND KELDOAUTH_
     "examples and the installed copy: BUILD_SHARED_LIBS, KELDOAUTH_TOOLS, KELDOAUTH_EXAMPLES and "
     "KELDOAUTH_INSTALL must be on")
 endif()
+if(KELDOAUTH_TESTS AND CMAKE_CONFIGURATION_TYPES)
+  message(FATAL_ERROR "KELDOAUTH_TESTS take a generator of one configuration, as Ninja is")
+endif()
