@@ -45,8 +45,9 @@ class Descriptor {
 void requirePrivate(int descriptor) {
   struct stat status {};
   if (fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) refuse("is no regular file");
-  if ((status.st_mode & (S_IRWXG | S_IRWXO)) != 0)
+  if ((status.st_mode & (S_IRWXG | S_IRWXO)) != 0) {
     refuse("is open to others: its mode must be 0600");
+  }
 }
 
 std::string readText(const char* path) {

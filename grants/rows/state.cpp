@@ -96,7 +96,8 @@ constexpr long long kLongest = std::numeric_limits<long long>::min();
 
 /// A mark of the length of them all.
 std::string anyMark() {
-  return std::string(kIdentifierLength, '0');
+  std::string zeros(kIdentifierLength, '0');
+  return zeros;
 }
 
 }  // namespace

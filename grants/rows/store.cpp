@@ -69,10 +69,10 @@ Store::Store(const Policy& given)
 
 /// A step of the start-up may fail and still leave every table there.
 void Store::requireReady() {
-  const Trouble trouble = troubleOf(applications);
+  Trouble trouble = troubleOf(applications);
   for (OAUTHDBBasic* table : std::initializer_list<OAUTHDBBasic*>{
            &applications, &codes, &tokens, static_cast<OAUTHDBBasic*>(&log)}) {
-    if (table->DBCmd("", nullptr, nullptr) == 0) throw trouble;
+    if (table->DBCmd("", nullptr, nullptr) == 0) throw std::move(trouble);
   }
 }
 
@@ -167,11 +167,11 @@ std::string Store::sealed(const std::string& identifier) {
 /// now.
 Whole::Whole(Store& store) : store_(store) {
   if (begin()) return;
-  const Trouble trouble = troubleOf(store_.applications);
+  Trouble trouble = troubleOf(store_.applications);
   const bool isWithinAnother = trouble.kind() == Trouble::Kind::kOther;
   if (!isWithinAnother || store_.applications.DBCmd("ROLLBACK", nullptr, nullptr) == 0 ||
       !begin()) {
-    throw trouble;
+    throw std::move(trouble);
   }
 }
 

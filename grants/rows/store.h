@@ -25,7 +25,7 @@ namespace KELDOAUTHSERVER::grants {
 class Store {
  public:
   /// Throws Trouble when the store is not ready.
-  explicit Store(const Policy& policy);
+  explicit Store(const Policy& given);
 
   const Policy policy;             // its seconds within their bounds
   OAUTHDBClientInfo applications;  // whose connection it is

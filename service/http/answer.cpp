@@ -89,7 +89,9 @@ Answer failureAsJson(const Failure& failure) {
 std::string textOf(const Answer& answer) {
   std::string text =
       "Status: " + std::to_string(answer.status) + " " + reason(answer.status) + "\r\n";
-  for (const auto& [name, value] : answer.headers) text += name + ": " + value + "\r\n";
+  for (const auto& [name, value] : answer.headers) {
+    text.append(name).append(": ").append(value).append("\r\n");
+  }
   return text +
          "Cache-Control: no-store\r\n"
          "X-Content-Type-Options: nosniff\r\n"

@@ -35,8 +35,9 @@ Answer userInfo(Context& context, const Request& request) {
     return plainAnswer(401).with("WWW-Authenticate",
                                  std::string(kRealm) + ", scope=\"" + kOpenId + "\"");
   }
-  if (text->empty())
+  if (text->empty()) {
     return refuse(400, "invalid_request", "The token is missing, or there are two");
+  }
 
   const auto bearer = context.store.open().tokens.verify(grants::AccessToken(*text));
   if (!bearer) {

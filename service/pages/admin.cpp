@@ -37,8 +37,9 @@ Answer admin(Context& context, const Request& request) {
     return messagePage(context.settings, 400, "This is not a form", "Nothing was changed.");
   }
   const std::optional<Parameters> given = Parameters::parse(isForm ? request.body : request.query);
-  if (!given)
+  if (!given) {
     return messagePage(context.settings, 400, "The request cannot be read", "Nothing was changed.");
+  }
   if (isForm && !isFromHere(context.settings, request, *given)) {
     return messagePage(context.settings, 403, "This form is too old",
                        "Or it does not come from this box. Nothing was changed; go back and "
