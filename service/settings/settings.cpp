@@ -166,7 +166,8 @@ void readKeysFile(const Json::Value& value, Settings& settings, Faults& faults) 
 }
 
 void readCountersFile(const Json::Value& value, Settings& settings, Faults& faults) {
-  settings.countersFile = value == "" ? "" : readPath("counters_file", value, faults);
+  const bool isNone = value.isString() && value.asString().empty();
+  settings.countersFile = isNone ? "" : readPath("counters_file", value, faults);
 }
 
 void readSigningKeysFile(const Json::Value& value, Settings& settings, Faults& faults) {
