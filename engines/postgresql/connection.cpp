@@ -38,6 +38,7 @@ Verdict giveNumber(int number, const char* column, RowCallback callback, void* a
 Verdict giveRows(PGresult* result, RowCallback callback, void* arg) {
   const int columns = PQnfields(result);
   std::vector<char*> names;
+  names.reserve(static_cast<std::size_t>(columns));
   for (int i = 0; i < columns; ++i) names.push_back(PQfname(result, i));
   std::vector<char*> values(names.size());
   for (int row = 0; row < PQntuples(result); ++row) {
