@@ -102,7 +102,7 @@ Json::Value inspectServer(Problems& problems) try {
   return isOnServer() ? inspectOpened(problems) : Json::Value();
 } catch (const Failure& failure) {
   problems.add(kSubject, failure.text(), failure.hint);
-  return Json::Value();
+  return {};
 }
 
 }  // namespace tool
