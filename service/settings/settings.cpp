@@ -21,7 +21,7 @@ namespace {
 using Faults = std::vector<std::string>;
 namespace bounds = KELDOAUTHSERVER::bounds;
 
-constexpr std::size_t kMaxFile = 256 * 1024;
+constexpr std::size_t kMaxFile = std::size_t{256} * 1024;
 constexpr std::size_t kMaxIssuer = 1024;
 constexpr std::size_t kMaxScopes = 100;
 constexpr std::size_t kMaxScopeName = 64;

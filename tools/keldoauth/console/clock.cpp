@@ -96,7 +96,7 @@ long long secondsOf(char unit) {
 
 /// The sum of "1h", "30m" and so on, blanks between them allowed.
 std::optional<long long> durationIn(const std::string& text) {
-  constexpr long long kLongest = 100 * 366 * kDay;
+  constexpr long long kLongest = kDay * 366 * 100;
   long long sum = 0;
   const char* at = text.data();
   const char* const end = at + text.size();
