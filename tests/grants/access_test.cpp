@@ -202,6 +202,13 @@ TEST_F(AccessTest, ARowThatCannotBeDecryptedIsTrouble) {
   EXPECT_TRUE(access().find(code));
 }
 
+TEST_F(AccessTest, WhatEndsOfARemovedApplicationIsNotedWithoutAName) {
+  login(frame_);
+  sql("DELETE FROM oauth_clientInfo");
+  EXPECT_EQ(access().endUserWith(kAlice, frame_, kAdmin).tokens, 1);
+  EXPECT_EQ(entries().back(), "Access ended[removed " + brief() + "] for [alice] by [admin]");
+}
+
 // Ending one ------------------------------------------------------------------------
 
 TEST_F(AccessTest, AHandleEndsWhatItNamed) {

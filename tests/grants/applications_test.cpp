@@ -175,6 +175,23 @@ TEST_F(ApplicationsTest, ChangedAddressesTogetherFitTheirColumn) {
   EXPECT_EQ(whyOf(refused), Why::kTooMuch);
 }
 
+TEST_F(ApplicationsTest, ChangedNameAndScopeKeepTheirBounds) {
+  const ApplicationId id = add().identifier;
+  const Application before = found(id);
+  const auto whyWith = [&](const std::string& name, const std::string& scope) {
+    ApplicationChange change;
+    change.name = ApplicationName(name);
+    change.scope = Scope(scope);
+    return whyOf(grants().applications.change(id, change, kAdmin));
+  };
+  EXPECT_EQ(whyWith("Album", ""), Why::kOutOfBounds);
+  EXPECT_EQ(whyWith("Album", std::string(2049, 's')), Why::kOutOfBounds);
+  EXPECT_EQ(whyWith("", "read"), Why::kOutOfBounds);
+  EXPECT_EQ(whyWith(support::id64('a'), ""), Why::kNameIsIdentifier);
+  EXPECT_EQ(found(id).name, before.name);
+  EXPECT_EQ(found(id).scope, before.scope);
+}
+
 TEST_F(ApplicationsTest, ASecretCannotMakeAnApplicationPublic) {
   NewApplication application = photos();
   application.secret = Secret("public:" + std::string(57, 'x'));
