@@ -18,6 +18,9 @@ else()
   file(RELATIVE_PATH to_prefix ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig ${CMAKE_INSTALL_PREFIX})
   set(KELDOAUTH_PC_PREFIX "\${pcfiledir}/${to_prefix}")
 endif()
+foreach(name PREFIX LIBDIR INCLUDEDIR)
+  string(REPLACE " " "\\ " KELDOAUTH_PC_${name} "${KELDOAUTH_PC_${name}}")
+endforeach()
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/KeldOAuth)
 
 # Inside another project the usual folder of documents is that project's.
