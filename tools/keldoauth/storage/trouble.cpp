@@ -1,5 +1,7 @@
 #include "tools/keldoauth/storage/trouble.h"
 
+#include <utility>
+
 #include "core/oauth_errors.h"
 #include "tools/keldoauth/storage/key_files.h"
 #include "utils/oauth_names.h"
@@ -77,9 +79,9 @@ void requireReady(OAUTHDBBasic& store) {
   if (store.GetErrCode() == errors::kNone.code) return;
 
   // A start-up step may fail and still leave every table there.
-  const Failure failure = libraryFailure(store);
+  Failure failure = libraryFailure(store);
   Json::Value count;
-  if (store.DBGetRowCount(count) == 0) throw failure;
+  if (store.DBGetRowCount(count) == 0) throw std::move(failure);
   store.SetErrCode(errors::kNone.code);
 }
 
