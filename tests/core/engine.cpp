@@ -44,7 +44,7 @@ WaitingState waiting;
 constexpr long long kNanoseconds = 1000000000;
 
 /// What the C library calls its functions for this program's time_t.
-#ifdef __USE_TIME_BITS64
+#if __TIMESIZE == 32 && defined(__USE_TIME_BITS64)
 constexpr char kClockGettime[] = "__clock_gettime64";
 constexpr char kNanosleep[] = "__nanosleep64";
 #else
