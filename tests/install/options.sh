@@ -37,7 +37,8 @@ case $subject in
     hide_cli11
     hide_nettle
     if configured all; then fail "configured without CLI11 and nettle"; fi
-    for word in CLI11 libcli11-dev nettle-dev KELDOAUTH_TOOLS=OFF KELDOAUTH_SERVICE=OFF; do
+    for word in CLI11 libcli11-dev nettle-dev 'for KELDOAUTH_TOOLS, -DKELDOAUTH_TOOLS=OFF' \
+      KELDOAUTH_SERVICE=OFF 'for the stand-ins'; do
       grep -q -- "$word" all.log || fail "not a word of $word: $(<all.log)"
     done
     # The same of what flags take away; and the folder is good for another try.
