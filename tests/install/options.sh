@@ -92,6 +92,7 @@ case $subject in
     cmake --build found >/dev/null
     export PKG_CONFIG_PATH=$lib/pkgconfig
     # It writes a blank within a path as a shell would take it.
+    flags=()
     eval "flags=($(pkg-config --cflags --libs keldoauth))"
     g++ -std=c++17 "$here/consumer.cpp" "${flags[@]}" -o consumer
     eval "flags=($(pkg-config --cflags --libs keldoauth-grants keldoauth))"
