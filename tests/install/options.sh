@@ -91,6 +91,7 @@ case $subject in
     cmake -S "$here/find_package" -B found -G Ninja -DCMAKE_PREFIX_PATH="$work/a folder" >/dev/null
     cmake --build found >/dev/null
     export PKG_CONFIG_PATH=$lib/pkgconfig
+    flags=()
     # It writes a blank within a path as a shell would take it.
     flags=()
     eval "flags=($(pkg-config --cflags --libs keldoauth))"
