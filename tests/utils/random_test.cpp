@@ -15,6 +15,7 @@
 #include <set>
 #include <system_error>
 #include <thread>
+#include <utility>
 
 #include "tests/support/allocations.h"
 #include "tests/support/world.h"
@@ -336,6 +337,17 @@ TEST_F(RandomTest, FailingCallPassesToTheCaller) {
 
 TEST_F(RandomTest, SourceThatDeliversNothingIsAFailure) {
   Kernel::scriptGetrandom([](char* /*buffer*/, std::size_t /*size*/) -> ssize_t { return 0; });
+  EXPECT_EQ(errorOfRandomStr(), EIO);
+}
+
+TEST_F(RandomTest, NothingIsAFailureWhateverErrnoSaid) {
+  bool isFirst = true;
+  Kernel::scriptGetrandom([&](char* buffer, std::size_t size) -> ssize_t {
+    errno = EINTR;
+    if (std::exchange(isFirst, false)) return 0;
+    std::fill_n(buffer, size, 'x');
+    return static_cast<ssize_t>(size);
+  });
   EXPECT_EQ(errorOfRandomStr(), EIO);
 }
 
