@@ -1,6 +1,7 @@
 #include "service/people/child.h"
 
 #include <fcntl.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -63,6 +64,20 @@ TEST_F(ChildTest, NoDescriptorOfOursGoesAlong) {
   close(leaky);
   // 10 and above, one after the other, are the shell's own.
   EXPECT_THAT(read("descriptors"), ::testing::MatchesRegex("0\n1\n(1.\n)*2\n"));
+}
+
+/// Whoever starts the service may open them first and lower the limit then.
+TEST_F(ChildTest, DescriptorsAboveTheLimitDoNotGoAlongEither) {
+  const int high = fcntl(STDERR_FILENO, F_DUPFD, 400);
+  rlimit before{};
+  getrlimit(RLIMIT_NOFILE, &before);
+  const rlimit lower{300, before.rlim_max};
+  setrlimit(RLIMIT_NOFILE, &lower);
+  const std::optional<int> status =
+      run("[ -e /proc/$$/fd/0 ] && [ ! -e /proc/$$/fd/" + std::to_string(high) + " ]");
+  setrlimit(RLIMIT_NOFILE, &before);
+  close(high);
+  EXPECT_EQ(status, 0);
 }
 
 TEST_F(ChildTest, WorksWithoutStandardDescriptors) {
