@@ -73,7 +73,7 @@ class Surroundings {
     posix_spawn_file_actions_init(&files_);
     posix_spawnattr_init(&signals_);
     isMade_ = posix_spawn_file_actions_adddup2(&files_, input, STDIN_FILENO) == 0 &&
-              addNull(STDOUT_FILENO) && addNull(STDERR_FILENO) && addClosings() && addSignals();
+              addNull(STDOUT_FILENO) && addNull(STDERR_FILENO) && closeOthers() && addSignals();
   }
   ~Surroundings() {
     posix_spawn_file_actions_destroy(&files_);
@@ -100,15 +100,13 @@ class Surroundings {
   }
 
   /// Ours close themselves; those of the web server may not.
-  bool addClosings() {
+  static bool closeOthers() {
     const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir("/proc/self/fd"), closedir);
     if (!open) return false;
     while (const dirent* entry = readdir(open.get())) {
       const int descriptor = static_cast<int>(std::strtol(entry->d_name, nullptr, 10));
-      if (descriptor > STDERR_FILENO &&
-          posix_spawn_file_actions_addclose(&files_, descriptor) != 0) {
-        return false;
-      }
+      // An action would be refused for those above a limit that was lowered since.
+      if (descriptor > STDERR_FILENO) fcntl(descriptor, F_SETFD, FD_CLOEXEC);
     }
     return true;
   }
