@@ -31,11 +31,12 @@ long long timesIn(std::string_view rest) {
   return counted(times) == rest ? times : 0;
 }
 
-/// Where the count of an entry begins: behind its detail, when it has one.
+/// Where the count of an entry begins: behind its detail, when it has one. An
+/// entry that only begins so has no count, wherever it is looked for.
 std::size_t countAt(std::string_view text, std::size_t subject, bool hasDetail) {
   if (!hasDetail) return subject;
   const std::size_t end = text.rfind(']');
-  return end == std::string_view::npos || end < subject ? text.size() : end + 1;
+  return end == std::string_view::npos ? 0 : end + 1;
 }
 
 /// Entries of the subject, newest first. The log's time is the database's.

@@ -124,6 +124,15 @@ TEST_F(AuditTest, OtherProgramsEntriesAreRead) {
   EXPECT_THAT(entries(), ElementsAre("Application registed[O'Frame]"));
 }
 
+TEST_F(AuditTest, OtherProgramsEntriesAreNeverCountedOn) {
+  KELDOAUTHSERVER::OAUTHDBLog(names::kLogTable).Add("Application registered itself at last");
+  NewApplication application{ApplicationName("One"), {kAddress}, kScope};
+  application.registersItself = true;
+  ASSERT_TRUE(grants().applications.add(application, Actor("One")));
+  EXPECT_THAT(entries(), ElementsAre("Application registered itself at last",
+                                     testing::StartsWith("Application registered itself[One ")));
+}
+
 TEST_F(AuditTest, ALogThatRotatesAndFailsTakesTheOperationAlong) {
   add();
   writeSettings(R"({"log_max": 1})");
