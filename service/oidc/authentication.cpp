@@ -84,13 +84,13 @@ bool isForAnother(const Settings& settings, const Request& request,
 }
 
 bool mustSignInAgain(const Settings& settings, const Request& request, const Parameters& given,
-                     const AuthorizationRequest& asked) {
+                     const AuthorizationRequest& asked, bool isAnothers) {
   if (settings.signIn == SignIn::kWebServer) return false;
   if (const auto since = timeIn(settings, asked, given.value(kMark))) {
     return request.authTime < *since;
   }
-  return asked.prompt.login || (asked.maxAge && now() - request.authTime > *asked.maxAge) ||
-         isForAnother(settings, request, asked);
+  return asked.prompt.login || isAnothers ||
+         (asked.maxAge && now() - request.authTime > *asked.maxAge);
 }
 
 Answer signInAgain(const Settings& settings, const Request& request,

@@ -29,9 +29,9 @@ bool isForAnother(const Settings& settings, const Request& request,
 /// Whether the user who is signed in has to show the password once more: for
 /// prompt=login, because it was shown more than max_age ago, or to become whom the
 /// application means. Never where the web server asks, which does it with every
-/// request.
+/// request. `isAnothers`: as isForAnother said.
 bool mustSignInAgain(const Settings& settings, const Request& request, const Parameters& given,
-                     const AuthorizationRequest& asked);
+                     const AuthorizationRequest& asked, bool isAnothers);
 
 /// To the sign-in page and back here. The way back carries a mark of this moment
 /// and this request under a key of the service: whoever comes with it and has

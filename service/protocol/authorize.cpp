@@ -127,8 +127,9 @@ Answer askWho(const Settings& settings, const Request& request, const Parameters
 void requireFresh(const Context& context, const Request& request, const Parameters& given,
                   AuthorizationRequest& asked) {
   if (isDecision(request, given)) return;
-  if (!mustSignInAgain(context.settings, request, given, asked)) {
-    if (isForAnother(context.settings, request, asked)) {
+  const bool isAnothers = isForAnother(context.settings, request, asked);
+  if (!mustSignInAgain(context.settings, request, given, asked, isAnothers)) {
+    if (isAnothers) {
       refuse(context, request, asked, "login_required", "Somebody else is signed in");
     }
     // With a session it has been done, and the page has nothing to add.
